@@ -1,0 +1,36 @@
+# The two commands a new machine needs: `make demo` and `make test`.
+PRESET ?= release
+JOBS ?= $(shell nproc)
+
+.PHONY: deps build test test-asan test-tsan demo bench format clean
+
+deps:
+	@scripts/setup-deps
+
+build: deps
+	@cmake --preset $(PRESET) >/dev/null
+	@cmake --build --preset $(PRESET) -j $(JOBS)
+
+test: build
+	@ctest --preset $(PRESET) -j $(JOBS)
+
+test-asan:
+	@$(MAKE) --no-print-directory test PRESET=asan
+
+# Only the suites with threads; ThreadSanitizer slows everything else for nothing.
+test-tsan: deps
+	@cmake --preset tsan >/dev/null
+	@cmake --build --preset tsan -j $(JOBS)
+	@ctest --preset tsan -j $(JOBS) -L threads
+
+demo: build
+	@scripts/demo build/$(PRESET)
+
+bench: build
+	@scripts/run-benchmarks build/$(PRESET)
+
+format:
+	@git ls-files '*.c' '*.cpp' '*.h' | xargs clang-format -i
+
+clean:
+	rm -rf build

@@ -1,0 +1,11 @@
+# Sanitizer builds, chosen by KIV_SANITIZE (set by the asan and tsan presets).
+set(KIV_SANITIZE "" CACHE STRING "Sanitizers: empty, address (ASan+UBSan) or thread")
+if(KIV_SANITIZE STREQUAL "address")
+  add_compile_options(-fsanitize=address,undefined -fno-omit-frame-pointer -fno-sanitize-recover=undefined)
+  add_link_options(-fsanitize=address,undefined)
+elseif(KIV_SANITIZE STREQUAL "thread")
+  add_compile_options(-fsanitize=thread -fno-omit-frame-pointer)
+  add_link_options(-fsanitize=thread)
+elseif(NOT KIV_SANITIZE STREQUAL "")
+  message(FATAL_ERROR "Unknown KIV_SANITIZE value '${KIV_SANITIZE}'")
+endif()

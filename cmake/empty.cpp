@@ -1,0 +1,1 @@
+// Keeps the shared library target non-empty before the bindings exist.

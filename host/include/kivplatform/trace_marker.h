@@ -1,0 +1,18 @@
+// The system trace marker. On a device this is the atrace marker; on a host it
+// is the ftrace marker when writable, else the file named by KIV_TRACE_FILE.
+#ifndef KIVPLATFORM_TRACE_MARKER_H
+#define KIVPLATFORM_TRACE_MARKER_H
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+// File descriptor to write trace records to, or -1 when tracing is off.
+// Resolved once per process.
+int KivPlatform_traceMarkerFd(void);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

@@ -1,0 +1,33 @@
+// Captures what the library logs through VF_LogMsg, for exact-line checks.
+#ifndef KIV_TESTS_LOG_CAPTURE_H
+#define KIV_TESTS_LOG_CAPTURE_H
+
+#include <string>
+#include <vector>
+
+struct LoggedLine {
+    int level;
+    std::string text;
+};
+
+// Installs a capturing VF_LogMsg for its lifetime and restores the previous one.
+class LogCapture {
+public:
+    LogCapture();
+    ~LogCapture();
+
+    std::vector<LoggedLine> lines() const;
+    std::vector<std::string> texts() const;
+    bool contains(const std::string& text) const;
+    bool contains(int level, const std::string& text) const;
+    size_t count(const std::string& text) const;
+    void clear();
+
+    LogCapture(const LogCapture&) = delete;
+    LogCapture& operator=(const LogCapture&) = delete;
+
+private:
+    void* mPrevious;
+};
+
+#endif
