@@ -1,0 +1,42 @@
+// The two EGL operations that differ between a device and a Linux host:
+// a window surface on an ANativeWindow and an EGL image over a native buffer.
+// A device uses the plain EGL calls (eglCreateWindowSurface,
+// EGL_NATIVE_BUFFER_ANDROID); a host has no native windows or buffers in its
+// EGL, so it renders into an off-screen surface of the window's size whose
+// swap queues the frame into the window, and makes images from the buffer's
+// mirror texture. Nothing else in core/ knows which side it runs on.
+#ifndef CORE_EGL_EGLNATIVESEAM_H
+#define CORE_EGL_EGLNATIVESEAM_H
+
+#include <EGL/egl.h>
+#include <EGL/eglext.h>
+
+struct ANativeWindow;
+namespace android {
+class GraphicBuffer;
+}
+
+class EglNativeSeam {
+public:
+    // The implementation linked into this build.
+    static EglNativeSeam& get();
+
+    virtual ~EglNativeSeam() = default;
+
+    // Called before the first eglGetDisplay (a headless host selects its EGL
+    // platform here).
+    virtual void prepareDisplay() = 0;
+
+    virtual EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config,
+                                           ANativeWindow* window, const EGLint* attribs) = 0;
+    virtual EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) = 0;
+    virtual EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) = 0;
+
+    // An EGL image over the buffer's pixels, usable as an external texture or
+    // a renderbuffer; EGL_NO_IMAGE_KHR on failure (eglGetError tells why).
+    virtual EGLImageKHR createNativeBufferImage(EGLDisplay display,
+                                                android::GraphicBuffer* buffer) = 0;
+    virtual EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) = 0;
+};
+
+#endif
