@@ -1,1 +1,165 @@
+// Logging entry, level table, timing probe lines and trace markers.
+#include <android/log.h>
 #include <gtest/gtest.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <fstream>
+#include <regex>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "support/log_capture.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+std::string readFile(const std::string& path) {
+    std::ifstream in(path, std::ios::binary);
+    std::stringstream ss;
+    ss << in.rdbuf();
+    return ss.str();
+}
+
+struct SentMessage {
+    int priority;
+    std::string tag;
+    std::string message;
+};
+std::vector<SentMessage> gSent;
+
+void recordLogger(const struct __android_logger_data* data, const char* message) {
+    gSent.push_back({data->priority, data->tag != nullptr ? data->tag : "", message});
+}
+
+bool matches(const std::string& text, const char* pattern) {
+    return std::regex_match(text, std::regex(pattern));
+}
+
+}  // namespace
+
+TEST(VcLog, LevelTable) {
+    EXPECT_STREQ("[V]", VF_LogLabel(0));
+    EXPECT_STREQ("[D]", VF_LogLabel(1));
+    EXPECT_STREQ("[I]", VF_LogLabel(2));
+    EXPECT_STREQ("[W]", VF_LogLabel(3));
+    EXPECT_STREQ("[E]", VF_LogLabel(4));
+    EXPECT_STREQ("[V]", VF_LogLabel(5));
+    EXPECT_STREQ("[V]", VF_LogLabel(7));
+    const int expected[] = {3, 3, 4, 5, 6, 3, 3};
+    for (int level = 0; level < 7; ++level) EXPECT_EQ(expected[level], VF_LogPriority(level));
+}
+
+TEST(VcLog, DefaultIsAndroidAndPrintsLabelThenMessage) {
+    EXPECT_EQ(reinterpret_cast<void*>(AndroidLogMsg), reinterpret_cast<void*>(VF_LogMsg));
+    __android_log_set_logger(recordLogger);
+    __android_log_set_minimum_priority(ANDROID_LOG_VERBOSE);
+    gSent.clear();
+
+    testing::internal::CaptureStdout();
+    AndroidLogMsg(7, "value %d of %s", 42, "x");
+    AndroidLogMsg(VF_LOG_ERROR, "broken");
+    AndroidLogMsg(VF_LOG_INFO, "info");
+    AndroidLogMsg(VF_LOG_WARNING, "warn");
+    AndroidLogMsg(VF_LOG_VERBOSE, "verbose");
+    EXPECT_EQ("[V] value 42 of x\n[E] broken\n[I] info\n[W] warn\n[V] verbose\n",
+              testing::internal::GetCapturedStdout());
+
+    ASSERT_EQ(5u, gSent.size());
+    const int priorities[] = {ANDROID_LOG_DEBUG, ANDROID_LOG_ERROR, ANDROID_LOG_INFO,
+                              ANDROID_LOG_WARN, ANDROID_LOG_DEBUG};
+    const char* messages[] = {"value 42 of x", "broken", "info", "warn", "verbose"};
+    for (size_t i = 0; i < gSent.size(); ++i) {
+        EXPECT_EQ(priorities[i], gSent[i].priority) << i;
+        EXPECT_EQ("kivcamera", gSent[i].tag);
+        EXPECT_EQ(messages[i], gSent[i].message);
+    }
+
+    gSent.clear();
+    testing::internal::CaptureStdout();
+    DefaultLogMsg(VF_LOG_WARNING, "only %s", "stdout");
+    EXPECT_EQ("[W] only stdout\n", testing::internal::GetCapturedStdout());
+    EXPECT_TRUE(gSent.empty());
+    __android_log_set_logger(__android_log_stderr_logger);
+}
+
+TEST(VcLog, TimeStatLines) {
+    LogCapture log;
+    {
+        TimeStat probe("decode", true);
+        EXPECT_EQ(nullptr, probe.mTag);
+        EXPECT_EQ(-1, probe.mLine);
+        // Pretend the probe started 4.2 ms ago.
+        probe.mStartTime -= 4200;
+    }
+    {
+        TimeStat probe("tagA", "encode", 77, true);
+        probe.mStartTime -= 12700;
+    }
+    {
+        TimeStat probe("tagB", "edge", 5, false);
+        probe.mStartTime -= 4990;  // still under the 5000 µs threshold
+    }
+    auto lines = log.lines();
+    ASSERT_EQ(5u, lines.size());
+    EXPECT_EQ("[kivcamera] decode: Entry", lines[0].text);
+    EXPECT_TRUE(matches(lines[1].text, R"(\[\(null\)\] decode\(-1\): Exit \(4\.2\d\dms\))"))
+        << lines[1].text;
+    EXPECT_EQ("[tagA] encode:77: Entry", lines[2].text);
+    EXPECT_EQ("[tagA] encode(77): Exit (12ms)", lines[3].text);
+    EXPECT_TRUE(matches(lines[4].text, R"(\[tagB\] edge\(5\): Exit \(4\.9\d\dms\))"))
+        << lines[4].text;
+    for (const auto& l : lines) EXPECT_EQ(VF_LOG_DEBUG, l.level);
+}
+
+TEST(VcLog, TimeStatStampAndElapsed) {
+    LogCapture log;
+    {
+        TimeStat probe(nullptr, false);  // a probe named null logs nothing at all
+        probe.mStartTime -= 3000;
+        int32_t us = probe();
+        EXPECT_GE(us, 3000);
+        EXPECT_LT(us, 3000 + 1000000);
+        EXPECT_EQ(probe.mStopTime - probe.mStartTime, us);
+    }
+    EXPECT_TRUE(log.lines().empty());
+    {
+        TimeStat probe("jpeg", false);
+        probe.mStartTime -= 25400;
+        probe.TimeStamp("encoded");
+    }
+    auto lines = log.lines();
+    ASSERT_EQ(2u, lines.size());
+    EXPECT_EQ("[jpeg] encoded: 25ms", lines[0].text);
+    EXPECT_EQ("[(null)] jpeg(-1): Exit (25ms)", lines[1].text);
+}
+
+TEST(VcLog, TraceMarkersGoToTheTraceFile) {
+    if (access("/sys/kernel/tracing/trace_marker", W_OK) == 0 ||
+        access("/sys/kernel/debug/tracing/trace_marker", W_OK) == 0) {
+        GTEST_SKIP() << "the ftrace marker is writable here and takes precedence";
+    }
+    char path[] = "/tmp/kiv_trace_XXXXXX";
+    int fd = mkstemp(path);
+    ASSERT_GE(fd, 0);
+    close(fd);
+    // The marker is resolved once per process, at the first trace call.
+    setenv("KIV_TRACE_FILE", path, 1);
+    VF_TraceBegin("KI-render");
+    VF_TraceEnd();
+    {
+        VFTraceSection section("KI-onDrawFrame");
+    }
+    std::string longName(3000, 'n');
+    VF_TraceBegin(longName.c_str());
+
+    std::string expected = "B|" + std::to_string(getpid()) + "|KI-render" + "E" + "B|" +
+                           std::to_string(getpid()) + "|KI-onDrawFrame" + "E";
+    std::string all = readFile(path);
+    ASSERT_GE(all.size(), expected.size());
+    EXPECT_EQ(expected, all.substr(0, expected.size()));
+    // Records are formatted into a 1024-byte buffer: long names are cut.
+    EXPECT_EQ(1023u, all.size() - expected.size());
+    unlink(path);
+}
