@@ -1,0 +1,88 @@
+// The buffered processor: an EGL context on a 1x1 pbuffer, the current effect,
+// and one synchronous draw per call. Each call builds the GL program with the
+// current effect, draws into a buffer-backed framebuffer, reads the result
+// back and tears the program down again, so nothing but the context survives
+// between calls and a setEffect between calls needs no further step.
+//
+// Native clients that work on raw pixel buffers call doProcessRGBA and
+// doProcessNV21 directly (VFilterBufferedProcessor::create() returns this
+// class). All calls on the thread that called initialize().
+#ifndef KIV_CORE_VFILTERBUFFEREDPROCESSORIMPL_H
+#define KIV_CORE_VFILTERBUFFEREDPROCESSORIMPL_H
+
+#include <pthread.h>
+#include <stdint.h>
+#include <utils/StrongPointer.h>
+
+#include "core/VFilterBufferedProcessor.h"
+
+class EglEnvironment;
+class EglWindowSurface;
+class EglProgram;
+class KivBuiltInFilterCatalog;
+class KivFilter;
+
+// The thread that owns GL work of the current pipeline (shared with the live
+// render manager); 0 when none.
+extern pthread_t gOpenGLManagerThread;
+
+class VFilterBufferedProcessorImpl : public VFilterBufferedProcessor {
+public:
+    // Records the calling thread in gOpenGLManagerThread; no GL work.
+    VFilterBufferedProcessorImpl();
+    // Clears gOpenGLManagerThread; frees nothing on the GPU (release() first).
+    ~VFilterBufferedProcessorImpl() override;
+
+    int release() override;
+    int initialize() override;
+    int setEffect(int id) override;
+    int setEffect(const char* name) override;
+    int setEffectParameter(const char* parameter) override;
+    jintArray processBuffer(JNIEnv* env, jintArray input, int width, int height) override;
+    jobject processBitmap(JNIEnv* env, jobject bitmap) override;
+    void processFile(JNIEnv* env, jstring inputPath, jstring outputPath) override;
+    jobject processImage(JNIEnv* env, jobject jpegBuffer, int size) override;
+
+    // Runs the current effect over width x height pixels of `input` in
+    // `format` (VC_FORMAT_BGRA, anything else is taken as VC_FORMAT_RGBA) and
+    // writes the same format to `output` (width * height * 4 bytes).
+    // -3 for a null buffer, -7 when the context or the program or the target
+    // cannot be made; 0 otherwise, also when the draw or the read-back failed
+    // (logged; the output is then left untouched).
+    int doProcessRGBA(const unsigned char* input, int width, int height, unsigned char* output,
+                      int format);
+    // Runs the current effect over an NV21 picture and writes RGBA. Odd sizes
+    // are rounded up to even: `output` must hold (w+1 if odd) x (h+1 if odd) x 4
+    // bytes, and for odd sizes `input` must hold width*height luma bytes
+    // followed by a chroma block of paddedWidth*paddedHeight/2 bytes (copied
+    // as one block, so its layout is right only for even widths).
+    // Status codes as doProcessRGBA.
+    int doProcessNV21(const unsigned char* input, int width, int height, unsigned char* output);
+
+    // Makes the context current and builds the program with the current effect
+    // (and, on msm8974, enables 8K textures). 0 or -7.
+    int bindGLEnvironment();
+    // Undoes bindGLEnvironment(): releases the program and the shader
+    // compiler and makes no context current. 0.
+    int unbindGLEnvironment();
+
+    // The effect selected now (owned), or null before the first setEffect.
+    KivFilter* getEffect() const { return mFilter; }
+
+    VFilterBufferedProcessorImpl(const VFilterBufferedProcessorImpl&) = delete;
+    VFilterBufferedProcessorImpl& operator=(const VFilterBufferedProcessorImpl&) = delete;
+
+private:
+    int initializeGL();
+    int releaseFromGL();
+    void deleteEffect();
+
+    android::sp<EglEnvironment> mEglEnv;
+    android::sp<EglWindowSurface> mSurface;
+    android::sp<EglProgram> mProgram;
+    android::sp<KivBuiltInFilterCatalog> mCatalog;
+    KivFilter* mFilter;
+    int32_t mMaxTextureSize;
+};
+
+#endif
