@@ -21,26 +21,16 @@ struct ErrorName {
 };
 
 const ErrorName kErrorNames[] = {
-    {0x0000, "GL_NO_ERROR"},
-    {0x0500, "GL_INVALID_ENUM"},
-    {0x0501, "GL_INVALID_VALUE"},
-    {0x0502, "GL_INVALID_OPERATION"},
-    {0x0505, "GL_OUT_OF_MEMORY"},
-    {0x0506, "GL_INVALID_FRAMEBUFFER_OPERATION"},
-    {0x3000, "EGL_SUCCESS"},
-    {0x3001, "EGL_NOT_INITIALIZED"},
-    {0x3002, "EGL_BAD_ACCESS"},
-    {0x3003, "EGL_BAD_ALLOC"},
-    {0x3004, "EGL_BAD_ATTRIBUTE"},
-    {0x3005, "EGL_BAD_CONFIG"},
-    {0x3006, "EGL_BAD_CONTEXT"},
-    {0x3007, "EGL_BAD_CURRENT_SURFACE"},
-    {0x3008, "EGL_BAD_DISPLAY"},
-    {0x3009, "EGL_BAD_MATCH"},
-    {0x300A, "EGL_BAD_NATIVE_PIXMAP"},
-    {0x300B, "EGL_BAD_NATIVE_WINDOW"},
-    {0x300C, "EGL_BAD_PARAMETER"},
-    {0x300D, "EGL_BAD_SURFACE"},
+    {0x0000, "GL_NO_ERROR"},           {0x0500, "GL_INVALID_ENUM"},
+    {0x0501, "GL_INVALID_VALUE"},      {0x0502, "GL_INVALID_OPERATION"},
+    {0x0505, "GL_OUT_OF_MEMORY"},      {0x0506, "GL_INVALID_FRAMEBUFFER_OPERATION"},
+    {0x3000, "EGL_SUCCESS"},           {0x3001, "EGL_NOT_INITIALIZED"},
+    {0x3002, "EGL_BAD_ACCESS"},        {0x3003, "EGL_BAD_ALLOC"},
+    {0x3004, "EGL_BAD_ATTRIBUTE"},     {0x3005, "EGL_BAD_CONFIG"},
+    {0x3006, "EGL_BAD_CONTEXT"},       {0x3007, "EGL_BAD_CURRENT_SURFACE"},
+    {0x3008, "EGL_BAD_DISPLAY"},       {0x3009, "EGL_BAD_MATCH"},
+    {0x300A, "EGL_BAD_NATIVE_PIXMAP"}, {0x300B, "EGL_BAD_NATIVE_WINDOW"},
+    {0x300C, "EGL_BAD_PARAMETER"},     {0x300D, "EGL_BAD_SURFACE"},
     {0x300E, "EGL_CONTEXT_LOST"},
 };
 
@@ -118,4 +108,9 @@ int EglClear_glErrors(const char* source, int line) {
         ++count;
     }
     return count;
+}
+
+int EglClear_errors(const char* source, int line) {
+    int count = EglClear_eglErrors(source, line);
+    return count + EglClear_glErrors(source, line);
 }

@@ -50,6 +50,7 @@ bool EglCheck_eglBool(EGLBoolean value, const char* statement, const char* sourc
 // errors were pending.
 int EglClear_eglErrors(const char* source, int line);
 int EglClear_glErrors(const char* source, int line);
+int EglClear_errors(const char* source, int line);
 
 // Log function of the GL side. Lines go through VF_LogMsg (so a program that
 // replaces it sees them); with the default Android sink they carry the tag
@@ -61,7 +62,6 @@ void EglLog(int level, const char* format, ...) __attribute__((format(printf, 2,
 #define EGL_CHECK_BOOL(stmt) EglCheck_eglBool((stmt), #stmt, VC_SOURCE, __LINE__)
 #define EGL_CLEAR_ERRORS() EglClear_eglErrors(VC_SOURCE, __LINE__)
 #define GL_CLEAR_ERRORS() EglClear_glErrors(VC_SOURCE, __LINE__)
-#define EGL_GL_CLEAR_ERRORS() \
-    (EglClear_eglErrors(VC_SOURCE, __LINE__) + EglClear_glErrors(VC_SOURCE, __LINE__))
+#define EGL_GL_CLEAR_ERRORS() EglClear_errors(VC_SOURCE, __LINE__)
 
 #endif

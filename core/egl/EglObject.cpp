@@ -6,18 +6,26 @@ EglObject::EglObject(int width, int height) : mWidth(width), mHeight(height) {
     pthread_mutex_init(&mMutex, nullptr);
 }
 
-EglObject::~EglObject() { pthread_mutex_destroy(&mMutex); }
+EglObject::~EglObject() {
+    pthread_mutex_destroy(&mMutex);
+}
 
 void EglObject::setSize(int width, int height) {
     mWidth = width;
     mHeight = height;
 }
 
-int EglObject::getWidth() { return mWidth; }
+int EglObject::getWidth() {
+    return mWidth;
+}
 
-int EglObject::getHeight() { return mHeight; }
+int EglObject::getHeight() {
+    return mHeight;
+}
 
-int EglObject::onDrawFrame() { return 0; }
+int EglObject::onDrawFrame() {
+    return 0;
+}
 
 int EglObject::initialize() {
     pthread_mutex_lock(&mMutex);

@@ -1,0 +1,124 @@
+// Draws one frame with the current effect: owns a GL program (EglShader)
+// built from the fixed quad vertex shader and the effect's fragment shader,
+// the camera and viewport geometry, the texture-unit budget handed to
+// effects, and a recycler for GL objects dropped by effects. When an effect
+// fails to build or to draw, a pass-through shader takes over so that the
+// output is never left undefined.
+//
+// GL work happens only in initialize(), onDrawFrame() and release(), on the
+// thread that has the context current. setFilter and the geometry setters
+// may be called from any thread; they take effect at the next frame.
+#ifndef CORE_EGL_EGLPROGRAM_H
+#define CORE_EGL_EGLPROGRAM_H
+
+#include <utils/Mutex.h>
+#include <utils/RefBase.h>
+
+#include "core/egl/EglRecycler.h"
+#include "core/egl/EglShader.h"
+
+class KivFilter;
+
+class EglProgram : public virtual android::RefBase {
+public:
+    // Texture coordinates of the camera input for the four strip vertices.
+    enum GeometryType {
+        GEOMETRY_VFLIP = 0,
+        GEOMETRY_NORMAL = 1,
+        GEOMETRY_ROTATE_180 = 2,
+        GEOMETRY_HFLIP = 3,
+    };
+
+    // The quad as a triangle strip: (-1,-1,0) (1,-1,0) (-1,1,0) (1,1,0).
+    static const float kVertices[12];
+    // Indexed by GeometryType.
+    static const float kTexCoords[4][8];
+
+    static const char kBaseFragmentCode[];
+    static const char kBaseFragmentCode2[];
+    static const char kDefaultFragmentShader[];
+    static const char kDefaultFragmentShader2D[];
+
+    EglProgram();
+    virtual ~EglProgram();
+
+    // cameraMode 20..29 means two camera inputs. With defaultOnly the program
+    // draws a 2D texture through the pass-through shader and ignores effects.
+    int initialize(int cameraMode, bool defaultOnly);
+    void release();
+
+    // The program never deletes an effect; the replaced one gets releaseGL().
+    void setFilter(KivFilter* filter);
+
+    int setCameraGeometry(int width, int height, int third, int fourth);
+    int setPreviewGeometry(int width, int height, bool flip);
+    void setCameraGeometryType(GeometryType type, int camera);
+    GeometryType getCameraGeometryType(int camera = 0) const;
+
+    const char* getBaseFragmentCode() const;
+    // Compiles an effect's fragment code; complete=false wraps it in the base
+    // template. Shader name, 0 on failure.
+    unsigned int loadFragmentShader(const char* code, bool complete);
+    // Attaches and links; 0 or the failing code.
+    int bindFragmentShader(unsigned int id);
+
+    void resetAvailableTextures();
+    // Units 0 and 1 belong to texSampler and texSampler2; the first unit
+    // handed out after a reset is 2. -5 when the budget is spent.
+    int getNextAvailableTexture();
+
+    unsigned int getProgramID() const;
+
+    int onDrawFrame();
+
+    // For effects: whether the program binds the quad and draws itself.
+    void setDrawFlag(bool draw) { mDrawFlag = draw; }
+    bool getDrawFlag() const { return mDrawFlag; }
+
+    int getCameraMode() const { return mCameraMode; }
+    int getCameraWidth() const { return mCameraWidth; }
+    int getCameraHeight() const { return mCameraHeight; }
+    int getCameraWidth2() const { return mCameraWidth2; }
+    int getCameraHeight2() const { return mCameraHeight2; }
+    int getPreviewWidth() const { return mPreviewWidth; }
+    int getPreviewHeight() const { return mPreviewHeight; }
+    bool getPreviewFlip() const { return mPreviewFlip; }
+    int getMaxAvailableTextures() const { return mMaxAvailableTextures; }
+    KivFilter* getFilter() const { return mFilter; }
+    const android::sp<EglShader>& getShader() const { return mShader; }
+    const android::sp<EglRecycler>& getRecycler() const { return mRecycler; }
+
+    EglProgram(const EglProgram&) = delete;
+    EglProgram& operator=(const EglProgram&) = delete;
+
+private:
+    int initialize_l(int cameraMode, bool defaultOnly);
+    void release_l();
+    int loadEffectShader();
+    int loadDefaultShader();
+    int initShaderIndexer();
+    bool isDualCamera() const { return mCameraMode / 10 == 2; }
+
+    android::sp<EglRecycler> mRecycler;
+    android::sp<EglShader> mShader;
+    int mNextTexture;
+    int mMaxAvailableTextures;
+    KivFilter* mFilter;
+    int mCameraMode;
+    int mCameraWidth;
+    int mCameraHeight;
+    int mCameraWidth2;
+    int mCameraHeight2;
+    GeometryType mCamera0GeometryType;
+    GeometryType mCamera1GeometryType;
+    int mPreviewWidth;
+    int mPreviewHeight;
+    bool mDefaultOnly;
+    bool mPreviewFlip;
+    bool mReloadNeeded;
+    bool mNameIndexReady;
+    bool mDrawFlag;
+    android::Mutex mLock;
+};
+
+#endif
