@@ -3,6 +3,7 @@
 #include "core/KivFilter.h"
 
 // Effect headers: one include per effect family.
+#include "core/filters/sce/fixedLooks.h"
 
 namespace {
 
@@ -10,6 +11,20 @@ namespace {
 // yield null and processors fall back to 400.
 const KivFilterFactory::Entry kEffects[] = {
     {0, -1, nullptr},  // placeholder: serves no id (firstId > lastId)
+    // Fixed single-pass looks.
+    {400, 400, KivFilterFactory::make<NoEffect>},
+    {401, 401, KivFilterFactory::make<Sepia>},
+    {402, 402, KivFilterFactory::make<Grayscale>},
+    {403, 403, KivFilterFactory::make<Negative>},
+    {408, 408, KivFilterFactory::make<FadedColor>},
+    {410, 410, KivFilterFactory::make<Comic>},
+    {412, 412, KivFilterFactory::make<GothicNoir>},
+    {415, 415, KivFilterFactory::make<Rainbow>},
+    {416, 416, KivFilterFactory::make<InstagramNashville>},
+    {422, 422, KivFilterFactory::make<Vignette>},
+    {440, 440, KivFilterFactory::make<BW>},
+    {442, 442, KivFilterFactory::make<Posterize>},
+    {443, 443, KivFilterFactory::make<ThermalVision>},
 };
 
 }  // namespace

@@ -1,0 +1,25 @@
+#include "core/filters/sce/fixedLooks.h"
+
+const char* Comic::getFragmentShader() const {
+    return "vec4 doEffect() { vec4 color = texture2D(texSampler, v_texcoord); "
+           "float Y = dot(color.rgb, vec3(0.299, 0.587, 0.114)); "
+           "float U = dot(color.rgb, vec3(-0.147, -0.28886, 0.436)) * 0.8; "
+           "float V = dot(color.rgb, vec3(0.615, -0.515, -0.1)) * 0.8; float stepsize = 0.002; "
+           "float neighbor_color[3]; vec2 grad_xy; "
+           "neighbor_color[0] = dot(vec3(0.299, 0.587, 0.114), texture2D(texSampler, "
+           "vec2((v_texcoord.x - stepsize), (v_texcoord.y - stepsize))).rgb); "
+           "neighbor_color[1] = dot(vec3(0.299, 0.587, 0.114), texture2D(texSampler, "
+           "vec2(v_texcoord.x, (v_texcoord.y - stepsize))).rgb); "
+           "neighbor_color[2] = dot(vec3(0.299, 0.587, 0.114), texture2D(texSampler, "
+           "vec2((v_texcoord.x - stepsize), v_texcoord.y)).rgb); "
+           "grad_xy.x = ((neighbor_color[0] - neighbor_color[1]) + (neighbor_color[2] - Y)) / 2.0; "
+           "grad_xy.y = ((neighbor_color[0] - neighbor_color[2]) + (neighbor_color[1] - Y)) / 2.0; "
+           "float edge = length(grad_xy); "
+           "Y = (Y + neighbor_color[0] + neighbor_color[1] + neighbor_color[2]) / 4.0; "
+           "float wrinkle_factor = abs(neighbor_color[2] - Y); "
+           "Y = max((floor(Y * 6.0) / 6.0) - 6.0 * wrinkle_factor, 0.0); "
+           "float textureIntensity = dot(vec3(0.299, 0.587, 0.114), vec3(0.738)); "
+           "Y = (Y + textureIntensity / 4.0) * textureIntensity; color.r = Y + 1.14 * V; "
+           "color.g = dot(vec3(Y, U, V), vec3(1.0, -0.39, -0.58)); color.b = Y + 2.0 * U; "
+           "color.rgb = color.rgb * step(edge, 0.08); return color; }";
+}
