@@ -71,7 +71,7 @@ void dump(const std::vector<Entry>& entries) {
                 break;
             default:
                 VF_LogMsg(VF_LOG_ERROR, "OptionsRegister[%02d]: '%s' 0x%08x INVALID TYPE (%d)",
-                          index, o->name, o->key, static_cast<int>(o->type));
+                          index, o->name, o->key, o->type);
                 break;
         }
     }
@@ -118,7 +118,7 @@ extern "C" int VCOption_RegisterNew(VCOption_t* option) {
                 option->name != nullptr && strcmp(o->name, option->name) == 0) {
                 option->key = o->key;
                 VF_LogMsg(VF_LOG_DEBUG, "DEBUG: Duplicate option found: '%s' with type %d. Key = %d",
-                          option->name, static_cast<int>(option->type),
+                          option->name, option->type,
                           static_cast<int>(option->key));
                 return 1;
             }
@@ -222,17 +222,25 @@ extern "C" float VCOption_ParseStringF(const char* paramString, const char* name
     return result;
 }
 
+namespace {
+
+// strncpy of at most 255 characters with the 256th forced to the terminator.
+void copyName(char* dst, const char* src) {
+    size_t n = strnlen(src, 255);
+    memmove(dst, src, n);
+    dst[n] = '\0';
+}
+
+}  // namespace
+
 void swap(int* keyA, int* keyB, char* nameA, char* nameB) {
     int key = *keyA;
     *keyA = *keyB;
     *keyB = key;
     char name[256];
-    strncpy(name, nameA, 256);
-    name[255] = '\0';
-    strncpy(nameA, nameB, 256);
-    nameA[255] = '\0';
-    strncpy(nameB, name, 256);
-    nameB[255] = '\0';
+    copyName(name, nameA);
+    copyName(nameA, nameB);
+    copyName(nameB, name);
 }
 
 void sort(int* keys, char (*names)[256], int lo, int hi) {

@@ -39,7 +39,7 @@ typedef struct {
 typedef struct {
     uint32_t key;  // 0 until registered
     const char* name;
-    VCOptionType_t type;
+    int32_t type;  // a VCOptionType_t; stored as a plain word so that any code survives a dump
     VCOptionValue_t min;
     VCOptionValue_t max;
     const VCOptionEnum_t* enumValues;
