@@ -1,0 +1,117 @@
+#include "support/gl_context.h"
+
+#include <stdlib.h>
+
+#include "core/egl/EglEnvironment.h"
+#include "core/egl/EglWindowSurface.h"
+
+GlContext::GlContext() : mOk(false) {
+    // Test programs may run outside ctest, which sets this for them.
+    setenv("EGL_PLATFORM", "surfaceless", 0);
+    mEnv = new EglEnvironment();
+    if (mEnv->initialize() != 0) return;
+    mSurface = new EglWindowSurface(mEnv);
+    if (mSurface->initialize() != 0) return;
+    if (mSurface->bindSurface() != 0) return;
+    mOk = true;
+}
+
+GlContext::~GlContext() { release(); }
+
+void GlContext::release() {
+    if (mSurface != nullptr) {
+        mSurface->unbindSurface();
+        mSurface->release();
+        mSurface.clear();
+    }
+    if (mEnv != nullptr) {
+        mEnv->release();
+        mEnv.clear();
+    }
+    mOk = false;
+}
+
+GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels) {
+    GLuint texture = 0;
+    glGenTextures(1, &texture);
+    glBindTexture(GL_TEXTURE_2D, texture);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_NEAREST);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_NEAREST);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    glPixelStorei(GL_UNPACK_ALIGNMENT, 1);
+    glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE, pixels);
+    glBindTexture(GL_TEXTURE_2D, 0);
+    return texture;
+}
+
+bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
+                                GlExternalTexture* out) {
+    auto createImage =
+        reinterpret_cast<PFNEGLCREATEIMAGEKHRPROC>(eglGetProcAddress("eglCreateImageKHR"));
+    auto targetTexture = reinterpret_cast<PFNGLEGLIMAGETARGETTEXTURE2DOESPROC>(
+        eglGetProcAddress("glEGLImageTargetTexture2DOES"));
+    if (createImage == nullptr || targetTexture == nullptr) return false;
+
+    out->storage = GlTest_makeTexture2D(width, height, pixels);
+    const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_NONE};
+    out->image = createImage(eglGetCurrentDisplay(), eglGetCurrentContext(),
+                             EGL_GL_TEXTURE_2D_KHR,
+                             reinterpret_cast<EGLClientBuffer>(static_cast<uintptr_t>(out->storage)),
+                             attribs);
+    if (out->image == EGL_NO_IMAGE_KHR) return false;
+    glGenTextures(1, &out->external);
+    glBindTexture(GL_TEXTURE_EXTERNAL_OES, out->external);
+    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_NEAREST);
+    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_NEAREST);
+    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    targetTexture(GL_TEXTURE_EXTERNAL_OES, static_cast<GLeglImageOES>(out->image));
+    glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
+    return glGetError() == GL_NO_ERROR;
+}
+
+void GlTest_deleteExternalTexture(GlExternalTexture* texture) {
+    auto destroyImage =
+        reinterpret_cast<PFNEGLDESTROYIMAGEKHRPROC>(eglGetProcAddress("eglDestroyImageKHR"));
+    if (texture->external != 0) glDeleteTextures(1, &texture->external);
+    if (texture->storage != 0) glDeleteTextures(1, &texture->storage);
+    if (texture->image != EGL_NO_IMAGE_KHR && destroyImage != nullptr) {
+        destroyImage(eglGetCurrentDisplay(), texture->image);
+    }
+    *texture = GlExternalTexture();
+}
+
+bool GlTest_makeTarget(int width, int height, GlTarget* out) {
+    out->width = width;
+    out->height = height;
+    out->texture = GlTest_makeTexture2D(width, height, nullptr);
+    glGenFramebuffers(1, &out->framebuffer);
+    glBindFramebuffer(GL_FRAMEBUFFER, out->framebuffer);
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, out->texture, 0);
+    return glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+}
+
+void GlTest_deleteTarget(GlTarget* target) {
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    if (target->framebuffer != 0) glDeleteFramebuffers(1, &target->framebuffer);
+    if (target->texture != 0) glDeleteTextures(1, &target->texture);
+    *target = GlTarget();
+}
+
+std::vector<uint8_t> GlTest_readPixels(int width, int height) {
+    std::vector<uint8_t> pixels(static_cast<size_t>(width) * height * 4);
+    glPixelStorei(GL_PACK_ALIGNMENT, 1);
+    glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, pixels.data());
+    return pixels;
+}
+
+void GlContextTest::SetUp() {
+    mGl = new GlContext();
+    ASSERT_TRUE(mGl->ok()) << "no EGL context (Mesa llvmpipe, EGL_PLATFORM=surfaceless)";
+}
+
+void GlContextTest::TearDown() {
+    delete mGl;
+    mGl = nullptr;
+}

@@ -1,0 +1,80 @@
+// A real GL context for tests: an EglEnvironment with a bound 1x1 pbuffer
+// EglWindowSurface (Mesa llvmpipe on a headless host), and small plain-GL
+// helpers to make input textures and render targets and read them back.
+#ifndef KIV_TESTS_GL_CONTEXT_H
+#define KIV_TESTS_GL_CONTEXT_H
+
+#include <EGL/egl.h>
+#include <EGL/eglext.h>
+#include <GLES2/gl2.h>
+#include <GLES2/gl2ext.h>
+#include <gtest/gtest.h>
+#include <utils/StrongPointer.h>
+
+#include <cstdint>
+#include <vector>
+
+class EglEnvironment;
+class EglWindowSurface;
+
+// Owns the environment and the surface; current on the constructing thread
+// from construction until destruction (or release()).
+class GlContext {
+public:
+    GlContext();
+    ~GlContext();
+
+    // True when the environment and the surface came up and are bound.
+    bool ok() const { return mOk; }
+    // Unbinds and releases the surface, then the environment. Idempotent.
+    void release();
+
+    const android::sp<EglEnvironment>& env() const { return mEnv; }
+    const android::sp<EglWindowSurface>& surface() const { return mSurface; }
+
+    GlContext(const GlContext&) = delete;
+    GlContext& operator=(const GlContext&) = delete;
+
+private:
+    android::sp<EglEnvironment> mEnv;
+    android::sp<EglWindowSurface> mSurface;
+    bool mOk;
+};
+
+// A 2D RGBA texture of width x height (nearest filtering, clamped) holding
+// pixels (tightly packed rows, first row at t = 0); pixels may be null.
+GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels);
+
+// An external (GL_TEXTURE_EXTERNAL_OES) texture whose storage is a 2D RGBA
+// texture with the given pixels, shared through an EGLImageKHR. Release with
+// GlTest_deleteExternalTexture.
+struct GlExternalTexture {
+    GLuint external = 0;
+    GLuint storage = 0;
+    EGLImageKHR image = EGL_NO_IMAGE_KHR;
+};
+bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
+                                GlExternalTexture* out);
+void GlTest_deleteExternalTexture(GlExternalTexture* texture);
+
+// An RGBA framebuffer of width x height (texture colour attachment), bound.
+struct GlTarget {
+    GLuint framebuffer = 0;
+    GLuint texture = 0;
+    int width = 0;
+    int height = 0;
+};
+bool GlTest_makeTarget(int width, int height, GlTarget* out);
+void GlTest_deleteTarget(GlTarget* target);
+// Reads the bound framebuffer; row 0 is the bottom row (GL order).
+std::vector<uint8_t> GlTest_readPixels(int width, int height);
+
+// Fixture: a context per test; fails the test at once when it cannot be made.
+class GlContextTest : public ::testing::Test {
+protected:
+    void SetUp() override;
+    void TearDown() override;
+    GlContext* mGl = nullptr;
+};
+
+#endif
