@@ -1,0 +1,57 @@
+// Codec back ends shared by the JPEG, PNG and file functions of the image core.
+#ifndef VCCORE_VC_IMAGE_CODEC_H
+#define VCCORE_VC_IMAGE_CODEC_H
+
+#include <stddef.h>
+#include <stdint.h>
+
+#include <memory>
+
+#include "vccore/vc_image.h"
+
+// The platform's fast JPEG codec, opened at run time when installed.
+#define VC_FAST_JPEG_LIBRARY "libkivjpeginterface.so"
+#define VC_FAST_JPEG_ENCODE "fastJpegEncode"
+#define VC_FAST_JPEG_DECODE "fastJpegDecode"
+
+extern "C" {
+// A malloc'ed JPEG stream (length through `length`) or null.
+typedef unsigned char* (*VCFastJpegEncode_t)(const unsigned char* pixels, uint32_t size, int width,
+                                             int height, uint32_t format, uint32_t* length,
+                                             int quality);
+// Malloc'ed pixels in `format` (width and height through the pointers) or null.
+typedef unsigned char* (*VCFastJpegDecode_t)(const unsigned char* bytes, uint32_t length,
+                                             int* width, int* height, uint32_t format);
+}
+
+// TurboJPEG settings of the general codec; the benchmark uses the same ones.
+// Decoding stops at the first warning, so truncated and corrupt streams fail
+// instead of yielding grey-filled pictures, and scan counts are bounded.
+#define VC_JPEG_DECODE_FLAGS (TJFLAG_STOPONWARNING | TJFLAG_LIMITSCANS)
+#define VC_JPEG_ENCODE_FLAGS 0
+#define VC_JPEG_SUBSAMPLING TJSAMP_420
+
+// One decoding of a compressed picture by the general decoders: the header
+// first, then straight-alpha RGBA pixels (stride width·4). Nothing is logged.
+class VCPictureReader {
+public:
+    virtual ~VCPictureReader() = default;
+    virtual bool readHeader(int* width, int* height) = 0;
+    // Only after a successful readHeader; rgba holds width·height·4 bytes.
+    virtual bool readRgba(unsigned char* rgba) = 0;
+};
+
+// A reader for JPEG or PNG data, null for anything else.
+std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length);
+std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length);
+std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, size_t length);
+
+// Encodes with TurboJPEG: a new "JPEG" image, or null (not logged). The
+// caller has checked the image, its pixels and the quality (1…100).
+VCImage* VCJpeg_encode(const VCImage* image, int quality);
+
+// Writes premultiplied RGBA pixels to a PNG file with straight alpha; false
+// on any failure (not logged).
+bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height);
+
+#endif

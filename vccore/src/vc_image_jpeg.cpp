@@ -1,0 +1,167 @@
+// JPEG encoding and decoding of image records: the platform's fast codec when
+// it is installed, the general codecs otherwise.
+#include <dlfcn.h>
+#include <stdlib.h>
+
+#include "vc_image_codec.h"
+#include "vc_image_layout.h"
+#include "vccore/vc_convert.h"
+#include "vccore/vc_file.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+// The fast codec is opened for one call and closed right after it, so that
+// nothing of it stays mapped between pictures.
+class FastCodec {
+public:
+    FastCodec() : mHandle(dlopen(VC_FAST_JPEG_LIBRARY, RTLD_NOW | RTLD_LOCAL)) {}
+    ~FastCodec() {
+        if (mHandle != nullptr) dlclose(mHandle);
+    }
+    void* entry(const char* name) const {
+        return mHandle != nullptr ? dlsym(mHandle, name) : nullptr;
+    }
+    bool present() const { return mHandle != nullptr; }
+
+    FastCodec(const FastCodec&) = delete;
+    FastCodec& operator=(const FastCodec&) = delete;
+
+private:
+    void* mHandle;
+};
+
+// Null when the fast codec refuses the picture.
+VCImage* encodeWithFastCodec(VCFastJpegEncode_t encode, const VCImage* image, int quality) {
+    uint32_t length = 0;
+    unsigned char* stream = encode(image->data, VCImage_size(image), image->width, image->height,
+                                   image->format, &length, quality);
+    if (stream == nullptr) return nullptr;
+    if (length == 0) {
+        free(stream);
+        return nullptr;
+    }
+    VCImage* out = VCImage_createEmpty(image->width, image->height, VC_FORMAT_JPEG);
+    out->data = stream;
+    out->size = length;
+    return out;
+}
+
+bool decodeWithFastCodec(VCImage* image, const unsigned char* bytes, int length) {
+    FastCodec codec;
+    auto decode = reinterpret_cast<VCFastJpegDecode_t>(codec.entry(VC_FAST_JPEG_DECODE));
+    if (decode == nullptr) return false;
+    int width = 0;
+    int height = 0;
+    unsigned char* pixels =
+        decode(bytes, static_cast<uint32_t>(length), &width, &height, image->format);
+    if (pixels == nullptr) return false;
+    if (width < 1 || height < 1) {
+        free(pixels);
+        return false;
+    }
+    VCImage_deallocate(image);
+    image->data = pixels;
+    image->width = width;
+    image->height = height;
+    return true;
+}
+
+// The general decoders write straight-alpha RGBA; other formats go through a
+// temporary RGBA picture and the converter.
+int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
+    std::unique_ptr<VCPictureReader> reader =
+        VCPictureReader_create(bytes, static_cast<size_t>(length));
+    int width = 0;
+    int height = 0;
+    if (reader == nullptr || !reader->readHeader(&width, &height))
+        return VC_REPORT(VC_ERROR_CODEC_FAILED);
+    // A picture the record cannot describe is refused before anything is allocated.
+    uint32_t rgbaSize = VCImage_requiredSize(width, height, VC_FORMAT_RGBA);
+    if (rgbaSize == 0) return VC_REPORT(VC_ERROR_CODEC_FAILED);
+    // An existing buffer is measured with the geometry it was made for.
+    uint32_t required = VCImage_requiredSize(width, height, image->format);
+    if (image->data != nullptr && required != 0 && VCImage_size(image) < required)
+        return VC_REPORT(VC_ERROR_INVALID_SIZE);
+
+    int oldWidth = image->width;
+    int oldHeight = image->height;
+    bool hadBuffer = image->data != nullptr;
+    image->width = width;
+    image->height = height;
+    int rc = 0;
+    if (!hadBuffer) {
+        int allocated = VCImage_allocate(image);
+        if (allocated < 0) rc = allocated;
+    }
+    VCImage* rgba = nullptr;
+    bool inPlace = image->format == VC_FORMAT_RGBA;
+    if (rc == 0) {
+        rgba = inPlace ? VCImage_createWrap(image->data, width, height, VC_FORMAT_RGBA,
+                                            static_cast<int>(rgbaSize), 0)
+                       : VCImage_createNew(width, height, VC_FORMAT_RGBA);
+        if (rgba == nullptr) rc = VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    }
+    if (rc == 0 && !reader->readRgba(rgba->data)) rc = VC_REPORT(VC_ERROR_CODEC_FAILED);
+    if (rc == 0 && !inPlace) rc = VCImage_convert(rgba, image);
+    VCImage_destroy(rgba);
+    if (rc != 0) {
+        // A failed decoding leaves the record as it was; only the pixels of a
+        // buffer it already had may have been written.
+        if (!hadBuffer) VCImage_deallocate(image);
+        image->width = oldWidth;
+        image->height = oldHeight;
+    }
+    return rc;
+}
+
+bool startsWith(const unsigned char* bytes, size_t length, const unsigned char* prefix,
+                size_t count) {
+    if (length < count) return false;
+    for (size_t i = 0; i < count; ++i)
+        if (bytes[i] != prefix[i]) return false;
+    return true;
+}
+
+const unsigned char kJpegStart[] = {0xFF, 0xD8};
+const unsigned char kPngSignature[] = {0x89, 'P', 'N', 'G', '\r', '\n', 0x1A, '\n'};
+
+}  // namespace
+
+std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length) {
+    if (startsWith(bytes, length, kJpegStart, sizeof(kJpegStart)))
+        return VCJpegReader_create(bytes, length);
+    if (startsWith(bytes, length, kPngSignature, sizeof(kPngSignature)))
+        return VCPngReader_create(bytes, length);
+    return nullptr;
+}
+
+extern "C" VCImage* VCImage_encodeToJpeg(const VCImage* image, int quality) {
+    if (image == nullptr || image->data == nullptr) return nullptr;
+    if (quality < 1 || quality > 100) quality = 85;
+    VCImage* out = nullptr;
+    if (image->width > 0 && image->height > 0 && image->format != 0) {
+        FastCodec codec;
+        if (codec.present()) {
+            auto encode = reinterpret_cast<VCFastJpegEncode_t>(codec.entry(VC_FAST_JPEG_ENCODE));
+            if (encode != nullptr) out = encodeWithFastCodec(encode, image, quality);
+        } else {
+            out = VCJpeg_encode(image, quality);
+        }
+    }
+    if (out == nullptr)
+        VF_LogMsg(VF_LOG_ERROR, "Encoding failed (%dx%d %4.4s)", image->width, image->height,
+                  reinterpret_cast<const char*>(&image->format));
+    return out;
+}
+
+extern "C" int VCImage_decodeFromJpeg(VCImage* image, const unsigned char* bytes, int length) {
+    if (image == nullptr || bytes == nullptr || length == 0)
+        return VC_REPORT(VC_ERROR_NULL_PARAM);
+    if (length < 0) return VC_REPORT(VC_ERROR_INVALID_PARAM);
+    if (image->format != 0 &&
+        startsWith(bytes, static_cast<size_t>(length), kJpegStart, sizeof(kJpegStart)) &&
+        decodeWithFastCodec(image, bytes, length))
+        return 0;
+    return decodeGeneral(image, bytes, length);
+}

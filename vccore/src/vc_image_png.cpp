@@ -1,0 +1,164 @@
+// PNG through libpng: the general decoder for PNG data and the PNG file writer.
+//
+// libpng reports errors by longjmp back to the setjmp of the calling
+// function, so the functions that call into it keep no objects with
+// destructors of their own: everything they own lives in members or in a
+// state record that is cleaned up once control is back.
+#include <png.h>
+#include <stdio.h>
+#include <stdlib.h>
+
+#include "vc_image_codec.h"
+
+namespace {
+
+[[noreturn]] void onPngError(png_structp png, png_const_charp) { png_longjmp(png, 1); }
+
+// Warnings (bad ancillary chunks and the like) do not stop a picture.
+void onPngWarning(png_structp, png_const_charp) {}
+
+struct MemorySource {
+    const unsigned char* bytes;
+    size_t length;
+    size_t position;
+};
+
+void readFromMemory(png_structp png, png_bytep out, png_size_t count) {
+    MemorySource* source = static_cast<MemorySource*>(png_get_io_ptr(png));
+    if (count > source->length - source->position) png_error(png, "truncated");
+    const unsigned char* from = source->bytes + source->position;
+    for (png_size_t i = 0; i < count; ++i) out[i] = from[i];
+    source->position += count;
+}
+
+class PngReader : public VCPictureReader {
+public:
+    PngReader(const unsigned char* bytes, size_t length) : mSource{bytes, length, 0} {
+        mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
+        if (mPng != nullptr) mInfo = png_create_info_struct(mPng);
+    }
+    ~PngReader() override {
+        if (mPng != nullptr) png_destroy_read_struct(&mPng, mInfo != nullptr ? &mInfo : nullptr,
+                                                     nullptr);
+        free(mRows);
+    }
+
+    bool readHeader(int* width, int* height) override {
+        if (mPng == nullptr || mInfo == nullptr) return false;
+        if (setjmp(png_jmpbuf(mPng))) return false;
+        png_set_read_fn(mPng, &mSource, readFromMemory);
+        png_read_info(mPng, mInfo);
+        // Every colour type and depth is brought to 8-bit straight-alpha RGBA.
+        int colorType = png_get_color_type(mPng, mInfo);
+        int depth = png_get_bit_depth(mPng, mInfo);
+        bool transparency = png_get_valid(mPng, mInfo, PNG_INFO_tRNS) != 0;
+        if (colorType == PNG_COLOR_TYPE_PALETTE) png_set_palette_to_rgb(mPng);
+        if (colorType == PNG_COLOR_TYPE_GRAY && depth < 8) png_set_expand_gray_1_2_4_to_8(mPng);
+        if (transparency) png_set_tRNS_to_alpha(mPng);
+        if (depth == 16) png_set_strip_16(mPng);
+        if (colorType == PNG_COLOR_TYPE_GRAY || colorType == PNG_COLOR_TYPE_GRAY_ALPHA)
+            png_set_gray_to_rgb(mPng);
+        if ((colorType & PNG_COLOR_MASK_ALPHA) == 0 && !transparency)
+            png_set_add_alpha(mPng, 0xFF, PNG_FILLER_AFTER);
+        png_set_interlace_handling(mPng);
+        png_read_update_info(mPng, mInfo);
+        mWidth = png_get_image_width(mPng, mInfo);
+        mHeight = png_get_image_height(mPng, mInfo);
+        // libpng keeps sizes below 2^31; the row size proves the transforms took.
+        if (mWidth == 0 || mHeight == 0 ||
+            png_get_rowbytes(mPng, mInfo) != static_cast<size_t>(mWidth) * 4)
+            return false;
+        *width = static_cast<int>(mWidth);
+        *height = static_cast<int>(mHeight);
+        return true;
+    }
+
+    bool readRgba(unsigned char* rgba) override {
+        mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * mHeight));
+        if (mRows == nullptr) return false;
+        size_t stride = static_cast<size_t>(mWidth) * 4;
+        for (png_uint_32 y = 0; y < mHeight; ++y) mRows[y] = rgba + y * stride;
+        if (setjmp(png_jmpbuf(mPng))) return false;
+        png_read_image(mPng, mRows);
+        return true;
+    }
+
+    PngReader(const PngReader&) = delete;
+    PngReader& operator=(const PngReader&) = delete;
+
+private:
+    MemorySource mSource;
+    png_structp mPng = nullptr;
+    png_infop mInfo = nullptr;
+    png_bytep* mRows = nullptr;
+    png_uint_32 mWidth = 0;
+    png_uint_32 mHeight = 0;
+};
+
+struct PngWriteState {
+    FILE* file;
+    png_structp png;
+    png_infop info;
+    unsigned char* row;
+};
+
+// Straight alpha from premultiplied: c·255/a rounded, capped at 255; fully
+// transparent pixels carry no colour.
+void unpremultiplyRow(const unsigned char* from, unsigned char* to, png_uint_32 width) {
+    for (png_uint_32 x = 0; x < width; ++x, from += 4, to += 4) {
+        unsigned a = from[3];
+        to[3] = static_cast<unsigned char>(a);
+        if (a == 255) {
+            to[0] = from[0];
+            to[1] = from[1];
+            to[2] = from[2];
+            continue;
+        }
+        for (int c = 0; c < 3; ++c) {
+            unsigned v = a == 0 ? 0 : (from[c] * 255u + a / 2) / a;
+            to[c] = static_cast<unsigned char>(v > 255 ? 255 : v);
+        }
+    }
+}
+
+bool writeRows(PngWriteState* state, const unsigned char* rgba, png_uint_32 width,
+               png_uint_32 height) {
+    if (setjmp(png_jmpbuf(state->png))) return false;
+    png_init_io(state->png, state->file);
+    png_set_IHDR(state->png, state->info, width, height, 8, PNG_COLOR_TYPE_RGB_ALPHA,
+                 PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
+    png_write_info(state->png, state->info);
+    size_t stride = static_cast<size_t>(width) * 4;
+    for (png_uint_32 y = 0; y < height; ++y) {
+        unpremultiplyRow(rgba + y * stride, state->row, width);
+        png_write_row(state->png, state->row);
+    }
+    png_write_end(state->png, nullptr);
+    return true;
+}
+
+}  // namespace
+
+std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, size_t length) {
+    return std::unique_ptr<VCPictureReader>(new PngReader(bytes, length));
+}
+
+bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height) {
+    if (path == nullptr || rgba == nullptr || width < 1 || height < 1) return false;
+    PngWriteState state = {nullptr, nullptr, nullptr, nullptr};
+    state.row = static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4));
+    state.png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
+    if (state.png != nullptr) state.info = png_create_info_struct(state.png);
+    if (state.row != nullptr && state.info != nullptr) state.file = fopen(path, "wb");
+    bool ok = state.file != nullptr &&
+              writeRows(&state, rgba, static_cast<png_uint_32>(width),
+                        static_cast<png_uint_32>(height));
+    if (state.file != nullptr) {
+        if (fflush(state.file) != 0 || ferror(state.file)) ok = false;
+        if (fclose(state.file) != 0) ok = false;
+    }
+    if (state.png != nullptr)
+        png_destroy_write_struct(&state.png, state.info != nullptr ? &state.info : nullptr);
+    free(state.row);
+    return ok;
+}
