@@ -10,7 +10,6 @@ namespace {
 // One row per effect class: {first id, last id, builder}. Ids without a row
 // yield null and processors fall back to 400.
 const KivFilterFactory::Entry kEffects[] = {
-    {0, -1, nullptr},  // placeholder: serves no id (firstId > lastId)
     // Fixed single-pass looks.
     {400, 400, KivFilterFactory::make<NoEffect>},
     {401, 401, KivFilterFactory::make<Sepia>},
