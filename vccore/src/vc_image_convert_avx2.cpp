@@ -1,0 +1,83 @@
+// AVX2 instantiation of the vector conversion kernels; built with -mavx2 and
+// only entered after a run-time check of the CPU.
+#if defined(__x86_64__)
+#include <immintrin.h>
+#include <stddef.h>
+
+#include "vc_image_convert_fast.h"
+#include "vc_image_layout.h"
+
+namespace {
+
+struct Avx2 {
+    using V = __m256i;
+    static V zero() { return _mm256_setzero_si256(); }
+    static V load(const uint8_t* p) { return _mm256_loadu_si256(reinterpret_cast<const V*>(p)); }
+    static void store(uint8_t* p, V v) { _mm256_storeu_si256(reinterpret_cast<V*>(p), v); }
+    static void storeHalf(uint8_t* p, V v) {
+        // Quadwords 0 and 2 hold the bytes of the two 128-bit lanes.
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(p),
+                         _mm256_castsi256_si128(_mm256_permute4x64_epi64(v, 0x08)));
+    }
+    static V set1_8(int v) { return _mm256_set1_epi8(static_cast<char>(v)); }
+    static V set1_16(int v) { return _mm256_set1_epi16(static_cast<short>(v)); }
+    static V set1_32(int v) { return _mm256_set1_epi32(v); }
+    static V pair16(int lo, int hi) {
+        return _mm256_set1_epi32(static_cast<int>((static_cast<uint32_t>(hi) << 16) |
+                                                  static_cast<uint16_t>(lo)));
+    }
+    static V add16(V a, V b) { return _mm256_add_epi16(a, b); }
+    static V sub16(V a, V b) { return _mm256_sub_epi16(a, b); }
+    static V add32(V a, V b) { return _mm256_add_epi32(a, b); }
+    static V sub32(V a, V b) { return _mm256_sub_epi32(a, b); }
+    static V and_(V a, V b) { return _mm256_and_si256(a, b); }
+    static V or_(V a, V b) { return _mm256_or_si256(a, b); }
+    static V srai32(V a, int n) { return _mm256_srai_epi32(a, n); }
+    static V slli32(V a, int n) { return _mm256_slli_epi32(a, n); }
+    static V slli16(V a, int n) { return _mm256_slli_epi16(a, n); }
+    static V srl32(V a, int n) { return _mm256_srl_epi32(a, _mm_cvtsi32_si128(n)); }
+    static V sll32(V a, int n) { return _mm256_sll_epi32(a, _mm_cvtsi32_si128(n)); }
+    static V madd16(V a, V b) { return _mm256_madd_epi16(a, b); }
+    static V packs32(V a, V b) { return _mm256_packs_epi32(a, b); }
+    static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }
+    static V unpacklo8(V a, V b) { return _mm256_unpacklo_epi8(a, b); }
+    static V unpackhi8(V a, V b) { return _mm256_unpackhi_epi8(a, b); }
+    static V unpacklo16(V a, V b) { return _mm256_unpacklo_epi16(a, b); }
+    static V unpackhi16(V a, V b) { return _mm256_unpackhi_epi16(a, b); }
+    static bool anyEq32(V a, V b) {
+        return _mm256_movemask_epi8(_mm256_cmpeq_epi32(a, b)) != 0;
+    }
+    // The two lane-wise packs leave 4-byte groups in the order 0 2 4 6 1 3 5 7.
+    static V fixPackOrder(V v) {
+        return _mm256_permutevar8x32_epi32(v, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));
+    }
+    static V interleave(const uint8_t* u, const uint8_t* v) {
+        const __m128i uu = _mm_loadu_si128(reinterpret_cast<const __m128i*>(u));
+        const __m128i vv = _mm_loadu_si128(reinterpret_cast<const __m128i*>(v));
+        return _mm256_set_m128i(_mm_unpackhi_epi8(uu, vv), _mm_unpacklo_epi8(uu, vv));
+    }
+    // Lane-wise unpacks give pixels 0-3|16-19, 4-7|20-23, 8-11|24-27, 12-15|28-31.
+    static void store4(uint8_t* p, V b0, V b1, V b2, V b3) {
+        const V t0 = _mm256_unpacklo_epi8(b0, b1);
+        const V t1 = _mm256_unpackhi_epi8(b0, b1);
+        const V t2 = _mm256_unpacklo_epi8(b2, b3);
+        const V t3 = _mm256_unpackhi_epi8(b2, b3);
+        const V q0 = _mm256_unpacklo_epi16(t0, t2);
+        const V q1 = _mm256_unpackhi_epi16(t0, t2);
+        const V q2 = _mm256_unpacklo_epi16(t1, t3);
+        const V q3 = _mm256_unpackhi_epi16(t1, t3);
+        store(p, _mm256_permute2x128_si256(q0, q1, 0x20));
+        store(p + 32, _mm256_permute2x128_si256(q2, q3, 0x20));
+        store(p + 64, _mm256_permute2x128_si256(q0, q1, 0x31));
+        store(p + 96, _mm256_permute2x128_si256(q2, q3, 0x31));
+    }
+};
+
+#include "vc_image_convert_kernels.h"
+
+}  // namespace
+
+bool VCConvert_avx2(const VCImage* source, VCImage* destination) {
+    return Kernels<Avx2>::convert(source, destination);
+}
+#endif

@@ -1,0 +1,59 @@
+// Run-time choice of the vector conversion paths.
+#include <atomic>
+
+#include "vc_image_convert_fast.h"
+
+#if defined(__x86_64__)
+bool VCConvert_sse2(const VCImage* source, VCImage* destination);
+bool VCConvert_avx2(const VCImage* source, VCImage* destination);
+#endif
+
+namespace {
+
+int detectLevel() {
+#if defined(__x86_64__)
+    __builtin_cpu_init();
+    if (__builtin_cpu_supports("avx2")) return kVCConvertAvx2;
+    return kVCConvertSse2;
+#else
+    // No vector paths yet on other architectures (NEON included): the
+    // reference loops run there.
+    return kVCConvertScalar;
+#endif
+}
+
+std::atomic<int> gLevel{-1};
+
+}  // namespace
+
+int VCConvert_cpuLevel(void) {
+    static const int level = detectLevel();
+    return level;
+}
+
+int VCConvert_level(void) {
+    int level = gLevel.load();
+    if (level < 0) {
+        level = VCConvert_cpuLevel();
+        gLevel.store(level);
+    }
+    return level;
+}
+
+int VCConvert_setLevel(int level) {
+    const int cpu = VCConvert_cpuLevel();
+    if (level < kVCConvertScalar) level = kVCConvertScalar;
+    if (level > cpu) level = cpu;
+    gLevel.store(level);
+    return level;
+}
+
+bool VCConvert_fast(const VCImage* source, VCImage* destination) {
+    switch (VCConvert_level()) {
+#if defined(__x86_64__)
+        case kVCConvertAvx2: return VCConvert_avx2(source, destination);
+        case kVCConvertSse2: return VCConvert_sse2(source, destination);
+#endif
+        default: return false;
+    }
+}
