@@ -1,0 +1,101 @@
+#include "args.h"
+
+#include <errno.h>
+#include <stdlib.h>
+
+namespace kivcli {
+
+std::string ParsedArgs::get(const char* name, const std::string& fallback) const {
+    auto it = values.find(name);
+    return it == values.end() ? fallback : it->second;
+}
+
+namespace {
+
+const OptionSpec* findShort(const OptionSpec* specs, size_t count, char c) {
+    for (size_t i = 0; i < count; i++) {
+        if (specs[i].shortName != 0 && specs[i].shortName == c) return &specs[i];
+    }
+    return nullptr;
+}
+
+const OptionSpec* findLong(const OptionSpec* specs, size_t count, const std::string& name) {
+    for (size_t i = 0; i < count; i++) {
+        if (name == specs[i].longName) return &specs[i];
+    }
+    return nullptr;
+}
+
+}  // namespace
+
+bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t count,
+               ParsedArgs* out, std::string* error) {
+    bool optionsEnded = false;
+    for (int i = first; i < argc; i++) {
+        std::string arg = argv[i];
+        if (optionsEnded || arg.size() < 2 || arg[0] != '-') {
+            out->positionals.push_back(arg);
+            continue;
+        }
+        if (arg == "--") {
+            optionsEnded = true;
+            continue;
+        }
+        const OptionSpec* spec = nullptr;
+        std::string value;
+        bool inlineValue = false;
+        if (arg[1] == '-') {
+            std::string name = arg.substr(2);
+            size_t eq = name.find('=');
+            if (eq != std::string::npos) {
+                value = name.substr(eq + 1);
+                name = name.substr(0, eq);
+                inlineValue = true;
+            }
+            spec = findLong(specs, count, name);
+            if (spec == nullptr) {
+                *error = "unknown option '--" + name + "'";
+                return false;
+            }
+            if (inlineValue && !spec->takesValue) {
+                *error = "option '--" + name + "' takes no value";
+                return false;
+            }
+        } else {
+            spec = findShort(specs, count, arg[1]);
+            if (spec == nullptr) {
+                *error = "unknown option '" + arg.substr(0, 2) + "'";
+                return false;
+            }
+            if (arg.size() > 2) {
+                if (!spec->takesValue) {
+                    *error = "option '-" + std::string(1, arg[1]) + "' takes no value";
+                    return false;
+                }
+                value = arg.substr(2);
+                inlineValue = true;
+            }
+        }
+        if (spec->takesValue && !inlineValue) {
+            if (i + 1 >= argc) {
+                *error = "option '--" + std::string(spec->longName) + "' needs a value";
+                return false;
+            }
+            value = argv[++i];
+        }
+        out->values[spec->longName] = value;
+    }
+    return true;
+}
+
+bool parseInt(const std::string& text, int min, int max, int* value) {
+    if (text.empty()) return false;
+    errno = 0;
+    char* end = nullptr;
+    long v = strtol(text.c_str(), &end, 10);
+    if (errno != 0 || end == text.c_str() || *end != '\0' || v < min || v > max) return false;
+    *value = static_cast<int>(v);
+    return true;
+}
+
+}  // namespace kivcli

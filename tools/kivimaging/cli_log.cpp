@@ -1,0 +1,51 @@
+#include "cli_log.h"
+
+#include <stdarg.h>
+#include <stdio.h>
+
+#include <atomic>
+
+#include <android/log.h>
+
+#include "vccore/vc_log.h"
+
+namespace kivcli {
+namespace {
+
+std::atomic<int> gErrors{0};
+bool gVerbose = false;
+
+void coreLog(int level, const char* format, ...) __attribute__((format(printf, 2, 3)));
+
+void coreLog(int level, const char* format, ...) {
+    if (level >= VF_LOG_ERROR) gErrors++;
+    if (!gVerbose) return;
+    char line[2048];
+    va_list args;
+    va_start(args, format);
+    vsnprintf(line, sizeof(line), format, args);
+    va_end(args);
+    fprintf(stderr, "%s %s\n", VF_LogLabel(level), line);
+}
+
+void androidLog(const struct __android_logger_data* data, const char* message) {
+    if (data->priority >= ANDROID_LOG_ERROR) gErrors++;
+    if (!gVerbose) return;
+    fprintf(stderr, "[%s] %s\n", data->tag != nullptr ? data->tag : "", message);
+}
+
+}  // namespace
+
+void cliLogSetup(bool verbose) {
+    gVerbose = verbose;
+    VF_LogMsg = coreLog;
+    __android_log_set_logger(androidLog);
+    // Below this priority the Android log drops lines before any logger sees them.
+    __android_log_set_minimum_priority(verbose ? ANDROID_LOG_VERBOSE : ANDROID_LOG_ERROR);
+}
+
+int cliLogErrorCount() {
+    return gErrors.load();
+}
+
+}  // namespace kivcli

@@ -1,0 +1,171 @@
+#include <errno.h>
+#include <limits.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <set>
+
+#include "args.h"
+#include "cli.h"
+#include "cli_log.h"
+#include "effects.h"
+#include "image_io.h"
+#include "progress.h"
+#include "runner.h"
+
+namespace kivcli {
+namespace {
+
+const char kHelp[] =
+    "Usage: kivimaging apply -e EFFECT [-p PARAMETERS] [-q QUALITY] INPUT... -o OUTPUT\n"
+    "\n"
+    "Applies one effect to JPEG or PNG pictures on the GPU.\n"
+    "\n"
+    "  -e, --effect EFFECT      an effect id (403), a class name (Negative, any case)\n"
+    "                           or a filter-library name (\"package,libname.so\");\n"
+    "                           'kivimaging effects' lists them\n"
+    "  -p, --parameter TEXT     option string for adjustable effects, e.g. \"intensity=50\"\n"
+    "  -o, --output PATH        the output file for one input; a folder for several\n"
+    "                           inputs (created when missing), where each result keeps\n"
+    "                           its input's file name\n"
+    "  -q, --quality N          JPEG quality 1-100 (default 98)\n"
+    "  -v, --verbose            show the library's log on standard error\n"
+    "\n"
+    "The output format follows the extension: .png, .jpg or .jpeg. A progress bar\n"
+    "is shown when standard output is a terminal.\n"
+    "Exit status: 0 all written, 1 a picture could not be read, processed or\n"
+    "written (the others are still done), 2 bad arguments.\n";
+
+const OptionSpec kOptions[] = {
+    {'h', "help", false},     {'v', "verbose", false}, {'e', "effect", true},
+    {'p', "parameter", true}, {'o', "output", true},   {'q', "quality", true},
+};
+
+bool isDirectory(const std::string& path) {
+    struct stat st;
+    return stat(path.c_str(), &st) == 0 && S_ISDIR(st.st_mode);
+}
+
+std::string baseName(const std::string& path) {
+    size_t slash = path.find_last_of('/');
+    return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+std::string joinPath(const std::string& dir, const std::string& name) {
+    if (!dir.empty() && dir.back() == '/') return dir + name;
+    return dir + "/" + name;
+}
+
+std::string canonical(const std::string& path) {
+    char buf[PATH_MAX];
+    return realpath(path.c_str(), buf) != nullptr ? std::string(buf) : path;
+}
+
+// One job per input: where its result goes.
+struct Job {
+    std::string input;
+    std::string output;
+};
+
+int planJobs(const std::vector<std::string>& inputs, const std::string& output,
+             std::vector<Job>* jobs) {
+    bool intoFolder = inputs.size() > 1 || isDirectory(output);
+    if (!intoFolder) {
+        if (!imageWritableFormat(output)) {
+            return usageError("apply", "the output name must end in .png, .jpg or .jpeg");
+        }
+        jobs->push_back({inputs[0], output});
+        return kExitOk;
+    }
+    struct stat st;
+    if (stat(output.c_str(), &st) == 0 && !S_ISDIR(st.st_mode)) {
+        return usageError("apply", "with several inputs the output must be a folder, and '" +
+                                       output + "' is a file");
+    }
+    std::set<std::string> names;
+    for (const std::string& in : inputs) {
+        std::string name = baseName(in);
+        if (!imageWritableFormat(name)) name += ".png";
+        if (!names.insert(name).second) {
+            return usageError("apply", "two inputs would both be written to '" + name + "'");
+        }
+        jobs->push_back({in, joinPath(output, name)});
+    }
+    return kExitOk;
+}
+
+}  // namespace
+
+int cmdApply(int argc, char** argv) {
+    ParsedArgs args;
+    std::string error;
+    if (!parseArgs(argc, argv, 1, kOptions, sizeof(kOptions) / sizeof(kOptions[0]), &args,
+                   &error)) {
+        return usageError("apply", error);
+    }
+    if (args.has("help")) {
+        fputs(kHelp, stdout);
+        return kExitOk;
+    }
+    if (!args.has("effect")) return usageError("apply", "no effect given (-e)");
+    if (args.positionals.empty()) return usageError("apply", "no input file given");
+    std::string output = args.get("output");
+    if (output.empty()) return usageError("apply", "no output given (-o)");
+    int quality = kDefaultJpegQuality;
+    if (args.has("quality") && !parseInt(args.get("quality"), 1, 100, &quality)) {
+        return usageError("apply", "--quality must be a number from 1 to 100");
+    }
+    cliLogSetup(args.has("verbose"));
+
+    EffectChoice effect;
+    if (!effectResolve(args.get("effect"), &effect, &error)) return usageError("apply", error);
+
+    std::vector<Job> jobs;
+    int rc = planJobs(args.positionals, output, &jobs);
+    if (rc != kExitOk) return rc;
+    for (const Job& job : jobs) {
+        if (canonical(job.input) == canonical(job.output)) {
+            return usageError("apply", "'" + job.input + "' would be overwritten by its result");
+        }
+    }
+    if (jobs.size() > 1 && !isDirectory(output) && mkdir(output.c_str(), 0777) != 0) {
+        return failure("cannot create the folder '" + output + "': " + strerror(errno));
+    }
+
+    EffectRunner runner;
+    if (!runner.open(&error) || !runner.select(effect, args.get("parameter"), &error)) {
+        return failure(error);
+    }
+
+    int written = 0;
+    ProgressBar bar(stdout, static_cast<int>(jobs.size()), jobs.size() > 1 && isatty(1));
+    for (size_t i = 0; i < jobs.size(); i++) {
+        const Job& job = jobs[i];
+        bar.update(static_cast<int>(i), baseName(job.input).c_str());
+        ImageHolder input(imageLoadRgba(job.input, &error));
+        ImageHolder result(input.get() != nullptr ? runner.run(input.get(), &error) : nullptr);
+        if (result.get() == nullptr || !imageSave(result.get(), job.output, quality, &error)) {
+            bar.finish();
+            failure(result.get() == nullptr && input.get() != nullptr
+                        ? "'" + job.input + "': " + error
+                        : error);
+            continue;
+        }
+        written++;
+    }
+    bar.update(static_cast<int>(jobs.size()), "");
+    bar.finish();
+
+    if (jobs.size() == 1) {
+        if (written == 1) printf("%s: %s\n", effect.label.c_str(), jobs[0].output.c_str());
+    } else {
+        printf("%s: %d of %zu pictures written to %s\n", effect.label.c_str(), written, jobs.size(),
+               output.c_str());
+    }
+    return written == static_cast<int>(jobs.size()) ? kExitOk : kExitFailure;
+}
+
+}  // namespace kivcli
