@@ -1,0 +1,134 @@
+// Fixtures shared by the JPEG, PNG and file suites: test pictures, PNG
+// streams written straight through libpng, temporary directories.
+#ifndef KIV_TESTS_JPEG_TEST_UTIL_H
+#define KIV_TESTS_JPEG_TEST_UTIL_H
+
+#include <png.h>
+#include <stdint.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <regex>
+#include <string>
+#include <vector>
+
+#include "support/log_capture.h"
+#include "vccore/vc_image.h"
+
+namespace jpegtest {
+
+using Bytes = std::vector<unsigned char>;
+
+// A smooth picture with some texture, like a camera frame: R, G, B, A at (x, y).
+inline void gradientPixel(int x, int y, int w, int h, unsigned char* p) {
+    p[0] = static_cast<unsigned char>(x * 255 / (w > 1 ? w - 1 : 1));
+    p[1] = static_cast<unsigned char>(y * 255 / (h > 1 ? h - 1 : 1));
+    p[2] = static_cast<unsigned char>((x + y) * 2 % 256 < 128 ? 64 : 192);
+    p[3] = 255;
+}
+
+// An owning RGBA picture of gradientPixel.
+inline VCImage* makeRgba(int w, int h) {
+    VCImage* image = VCImage_createNew(w, h, VC_FORMAT_RGBA);
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x) gradientPixel(x, y, w, h, image->data + (y * w + x) * 4);
+    return image;
+}
+
+inline bool isErrorLine(const std::string& text, const char* name, int code) {
+    std::regex pattern(std::string("^") + name + " \\(" + std::to_string(code) +
+                       "\\): vccore/src/vc_image:[0-9]+$");
+    return std::regex_match(text, pattern);
+}
+
+// Number of error-level lines reporting `code` under the image core's source name.
+inline int countErrors(const LogCapture& log, const char* name, int code) {
+    int n = 0;
+    for (const LoggedLine& line : log.lines())
+        if (line.level == 4 && isErrorLine(line.text, name, code)) ++n;
+    return n;
+}
+
+class TempDir {
+public:
+    TempDir() {
+        char pattern[] = "/tmp/kiv_jpeg_XXXXXX";
+        mPath = mkdtemp(pattern);
+    }
+    ~TempDir() {
+        std::string command = "rm -rf '" + mPath + "'";
+        if (system(command.c_str()) != 0) fprintf(stderr, "could not remove %s\n", mPath.c_str());
+    }
+    std::string file(const std::string& name) const { return mPath + "/" + name; }
+    const std::string& path() const { return mPath; }
+
+private:
+    std::string mPath;
+};
+
+inline Bytes readFile(const std::string& path) {
+    Bytes out;
+    FILE* f = fopen(path.c_str(), "rb");
+    if (f == nullptr) return out;
+    unsigned char buffer[65536];
+    size_t n;
+    while ((n = fread(buffer, 1, sizeof(buffer), f)) > 0) out.insert(out.end(), buffer, buffer + n);
+    fclose(f);
+    return out;
+}
+
+inline void writeFile(const std::string& path, const Bytes& bytes) {
+    FILE* f = fopen(path.c_str(), "wb");
+    if (f == nullptr) return;
+    if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
+    fclose(f);
+}
+
+inline bool fileExists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+
+// A PNG stream written directly with libpng. `rows` holds the samples as the
+// colour type and depth lay them out (16-bit samples big-endian).
+struct PngSpec {
+    int width = 1;
+    int height = 1;
+    int colorType = PNG_COLOR_TYPE_RGB_ALPHA;
+    int bitDepth = 8;
+    bool interlaced = false;
+    Bytes samples;
+    std::vector<png_color> palette;
+    Bytes paletteAlpha;
+};
+
+inline void appendToVector(png_structp png, png_bytep data, png_size_t length) {
+    Bytes* out = static_cast<Bytes*>(png_get_io_ptr(png));
+    out->insert(out->end(), data, data + length);
+}
+
+inline Bytes makePng(const PngSpec& spec) {
+    Bytes out;
+    png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+    png_infop info = png_create_info_struct(png);
+    png_set_write_fn(png, &out, appendToVector, nullptr);
+    png_set_IHDR(png, info, spec.width, spec.height, spec.bitDepth, spec.colorType,
+                 spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
+                 PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
+    if (!spec.palette.empty())
+        png_set_PLTE(png, info, spec.palette.data(), static_cast<int>(spec.palette.size()));
+    if (!spec.paletteAlpha.empty())
+        png_set_tRNS(png, info, spec.paletteAlpha.data(), static_cast<int>(spec.paletteAlpha.size()),
+                     nullptr);
+    png_write_info(png, info);
+    size_t stride = spec.samples.size() / spec.height;
+    std::vector<png_bytep> rows(spec.height);
+    for (int y = 0; y < spec.height; ++y)
+        rows[y] = const_cast<png_bytep>(spec.samples.data()) + y * stride;
+    png_write_image(png, rows.data());
+    png_write_end(png, nullptr);
+    png_destroy_write_struct(&png, &info);
+    return out;
+}
+
+}  // namespace jpegtest
+
+#endif
