@@ -1,6 +1,5 @@
 // JPEG and PNG coding of image records through the general codecs
 // (TurboJPEG, libpng), with the platform's fast codec absent.
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <string.h>
 #include <turbojpeg.h>
@@ -15,12 +14,6 @@
 using namespace jpegtest;
 
 namespace {
-
-bool fastCodecInstalled() {
-    void* handle = dlopen("libkivjpeginterface.so", RTLD_NOW);
-    if (handle != nullptr) dlclose(handle);
-    return handle != nullptr;
-}
 
 #define REQUIRE_GENERAL_CODECS()                                                 \
     if (fastCodecInstalled()) GTEST_SKIP() << "the fast codec is installed here"

@@ -3,6 +3,7 @@
 #ifndef KIV_TESTS_JPEG_TEST_UTIL_H
 #define KIV_TESTS_JPEG_TEST_UTIL_H
 
+#include <dlfcn.h>
 #include <png.h>
 #include <stdint.h>
 #include <stdio.h>
@@ -19,6 +20,13 @@
 namespace jpegtest {
 
 using Bytes = std::vector<unsigned char>;
+
+// Whether the platform's fast JPEG codec can be opened in this process.
+inline bool fastCodecInstalled() {
+    void* handle = dlopen("libkivjpeginterface.so", RTLD_NOW);
+    if (handle != nullptr) dlclose(handle);
+    return handle != nullptr;
+}
 
 // A smooth picture with some texture, like a camera frame: R, G, B, A at (x, y).
 inline void gradientPixel(int x, int y, int w, int h, unsigned char* p) {
