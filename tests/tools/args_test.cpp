@@ -6,7 +6,6 @@
 #include <vector>
 
 #include "args.h"
-#include "cli.h"
 #include "progress.h"
 
 namespace {

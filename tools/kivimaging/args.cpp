@@ -98,4 +98,11 @@ bool parseInt(const std::string& text, int min, int max, int* value) {
     return true;
 }
 
+bool parseSize(const std::string& text, int min, int max, int* width, int* height) {
+    size_t x = text.find_first_of("xX");
+    if (x == std::string::npos) return false;
+    return parseInt(text.substr(0, x), min, max, width) &&
+           parseInt(text.substr(x + 1), min, max, height);
+}
+
 }  // namespace kivcli

@@ -33,6 +33,9 @@ bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t
 // A whole decimal integer within [min, max]; false otherwise.
 bool parseInt(const std::string& text, int min, int max, int* value);
 
+// "WxH" with both sides within [min, max].
+bool parseSize(const std::string& text, int min, int max, int* width, int* height);
+
 }  // namespace kivcli
 
 #endif

@@ -23,9 +23,6 @@ int usageError(const char* command, const std::string& message);
 // "kivimaging: <message>" on standard error; returns kExitFailure.
 int failure(const std::string& message);
 
-// "WxH" with both sides within [min, max].
-bool parseSize(const std::string& text, int min, int max, int* width, int* height);
-
 }  // namespace kivcli
 
 #endif
