@@ -72,7 +72,7 @@ struct Job {
 
 int planJobs(const std::vector<std::string>& inputs, const std::string& output,
              std::vector<Job>* jobs) {
-    bool intoFolder = inputs.size() > 1 || isDirectory(output);
+    bool intoFolder = inputs.size() > 1 || isDirectory(output) || output.back() == '/';
     if (!intoFolder) {
         if (!imageWritableFormat(output)) {
             return usageError("apply", "the output name must end in .png, .jpg or .jpeg");
@@ -131,7 +131,8 @@ int cmdApply(int argc, char** argv) {
             return usageError("apply", "'" + job.input + "' would be overwritten by its result");
         }
     }
-    if (jobs.size() > 1 && !isDirectory(output) && mkdir(output.c_str(), 0777) != 0) {
+    bool intoFolder = jobs.size() > 1 || output.back() == '/' || isDirectory(output);
+    if (intoFolder && !isDirectory(output) && mkdir(output.c_str(), 0777) != 0) {
         return failure("cannot create the folder '" + output + "': " + strerror(errno));
     }
 
