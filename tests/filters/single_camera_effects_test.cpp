@@ -1,0 +1,250 @@
+// The fixed single-pass looks: what the factory builds for their ids, and what
+// each renders through EglProgram on llvmpipe compared with the independent
+// CPU statement of its math (tests/support/look_reference).
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "core/KivImaging.h"
+#include "core/egl/EglProgram.h"
+#include "core/egl/EglRecycler.h"
+#include "core/filters/sce/fixedLooks.h"
+#include "core/filters/sce/singleCameraEffects.h"
+#include "support/gl_context.h"
+#include "support/log_capture.h"
+#include "support/look_reference.h"
+
+namespace {
+
+// A member that keeps the base snippet.
+class BaseSnippetEffect : public SingleCameraEffects {
+public:
+    int getFilterType() const override { return 4242; }
+};
+
+// A member with a snippet of its own choosing.
+class CustomSnippetEffect : public SingleCameraEffects {
+public:
+    explicit CustomSnippetEffect(const char* code) : mCode(code) {}
+    int getFilterType() const override { return 4243; }
+    const char* getFragmentShader() const override { return mCode; }
+
+private:
+    const char* mCode;
+};
+
+struct Rendered {
+    std::vector<uint8_t> pixels;
+    int drawResult = -100;
+};
+
+// Draws `effect` (may be null) over `picture` into a picture-sized target with
+// the identity texture mapping and reads it back (row 0 = picture row 0).
+Rendered renderWithProgram(KivFilter* effect, const lookref::Picture& picture) {
+    Rendered out;
+    const int w = picture.width(), h = picture.height();
+    GlExternalTexture texture;
+    if (!GlTest_makeExternalTexture(w, h, picture.rgba().data(), &texture)) return out;
+    glActiveTexture(GL_TEXTURE0);
+    glBindTexture(GL_TEXTURE_EXTERNAL_OES, texture.external);
+    // Filtering as the library's external images use it.
+    glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+    glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+    GlTarget target;
+    if (GlTest_makeTarget(w, h, &target)) {
+        android::sp<EglProgram> program = new EglProgram();
+        program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+        if (effect != nullptr) program->setFilter(effect);
+        if (program->initialize(10, false) == 0) {
+            program->setCameraGeometry(w, h, 0, 0);
+            program->setPreviewGeometry(w, h, false);
+            glClearColor(0, 0, 0, 1);
+            glClear(GL_COLOR_BUFFER_BIT);
+            out.drawResult = program->onDrawFrame();
+            out.pixels = GlTest_readPixels(w, h);
+        }
+        program->release();
+        if (effect != nullptr) effect->releaseGL(*program->getRecycler());
+        GlTest_deleteTarget(&target);
+    }
+    glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
+    GlTest_deleteExternalTexture(&texture);
+    return out;
+}
+
+// Per-pixel comparison with the reference: pixels near a hard threshold of the
+// look are skipped, counted, and must stay rare.
+void expectMatches(int look, const lookref::Picture& picture, const std::vector<uint8_t>& actual,
+                   int tolerance) {
+    std::vector<bool> nearThreshold;
+    std::vector<uint8_t> expected = lookref::render(look, picture, &nearThreshold);
+    ASSERT_EQ(expected.size(), actual.size()) << "look " << look;
+    size_t skipped = 0, bad = 0;
+    std::string firstBad;
+    for (size_t i = 0; i < nearThreshold.size(); ++i) {
+        if (nearThreshold[i]) {
+            ++skipped;
+            continue;
+        }
+        for (int ch = 0; ch < 4; ++ch) {
+            int d = std::abs(int(expected[i * 4 + ch]) - int(actual[i * 4 + ch]));
+            if (d > tolerance) {
+                if (bad++ == 0) {
+                    firstBad = "pixel " + std::to_string(i % picture.width()) + "," +
+                               std::to_string(i / picture.width()) + " ch " + std::to_string(ch) +
+                               " expected " + std::to_string(expected[i * 4 + ch]) + " got " +
+                               std::to_string(actual[i * 4 + ch]);
+                }
+                break;
+            }
+        }
+    }
+    EXPECT_EQ(0u, bad) << "look " << look << ": " << bad << " pixels off, first " << firstBad;
+    EXPECT_LT(skipped * 20, nearThreshold.size())
+        << "look " << look << ": too many ambiguous pixels";
+}
+
+}  // namespace
+
+TEST(SingleCameraEffects, FactoryBuildsEachLookWithItsTypeAndNoOptions) {
+    for (int id : lookref::lookIds()) {
+        KivFilter* f = KivImaging_create(id, nullptr);
+        ASSERT_NE(nullptr, f) << id;
+        auto* sce = dynamic_cast<SingleCameraEffects*>(f);
+        ASSERT_NE(nullptr, sce) << id;
+        EXPECT_EQ(id, f->getFilterType());
+        EXPECT_EQ(id, KivImaging_getValue(f, 105, -9));
+        EXPECT_EQ(0, KivImaging_getOptionsCount(f));
+        EXPECT_EQ(nullptr, f->listOptions());
+        const char* code = sce->getFragmentShader();
+        ASSERT_NE(nullptr, code);
+        EXPECT_NE(nullptr, strstr(code, "vec4 doEffect()")) << id;
+        // Only the pass-through look uses the base snippet.
+        EXPECT_EQ(id == 400, std::string(code) == SingleCameraEffects::kPassThroughShader) << id;
+        KivImaging_destroy(f);
+    }
+    // Ids around the family that name nothing.
+    for (int id : {404, 405, 407, 409, 413, 418, 421, 423, 437, 439}) {
+        KivFilter* f = KivImaging_create(id, nullptr);
+        EXPECT_EQ(nullptr, f) << id;
+        KivImaging_destroy(f);
+    }
+    BaseSnippetEffect base;
+    EXPECT_STREQ("vec4 doEffect() { return texture2D(texSampler, v_texcoord); }",
+                 base.getFragmentShader());
+}
+
+TEST_F(GlContextTest, EveryLookMatchesItsCpuStatement) {
+    // Odd sizes on purpose: no symmetry can hide a row or column mix-up.
+    const int w = 61, h = 47;
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
+    for (int id : lookref::lookIds()) {
+        KivFilter* f = KivImaging_create(id, nullptr);
+        ASSERT_NE(nullptr, f);
+        LogCapture log;
+        Rendered r = renderWithProgram(f, picture);
+        EXPECT_EQ(0, r.drawResult) << id;
+        // The effect's own shader was used, not the default fallback.
+        EXPECT_FALSE(log.contains("GL Error: failed to load effect shader. Loading default."))
+            << id;
+        expectMatches(id, picture, r.pixels, 2);
+        KivImaging_destroy(f);
+    }
+}
+
+TEST_F(GlContextTest, EdgeValuesOfTheQuantisingLooks) {
+    // White, black, and greys around the band limits.
+    std::vector<uint8_t> px = {255, 255, 255, 255, 0,   0,   0,   255, 76,  77,  76,  255,
+                               77,  77,  77,  255, 204, 204, 205, 255, 127, 127, 128, 255};
+    lookref::Picture picture(6, 1, px);
+    {
+        Posterize posterize;
+        Rendered r = renderWithProgram(&posterize, picture);
+        ASSERT_EQ(24u, r.pixels.size());
+        // floor(1.0 * 4) / 3 = 4/3, clamped by the target.
+        for (int ch = 0; ch < 3; ++ch) EXPECT_EQ(255, r.pixels[ch]);
+        for (int ch = 0; ch < 3; ++ch) EXPECT_EQ(0, r.pixels[4 + ch]);
+    }
+    {
+        BW bw;
+        Rendered r = renderWithProgram(&bw, picture);
+        ASSERT_EQ(24u, r.pixels.size());
+        const int expectedGrey[6] = {0, 0, 0, 255, 0, 255};  // 229/765 < 0.3 <= 231/765
+        for (int i = 0; i < 6; ++i) {
+            EXPECT_EQ(expectedGrey[i], r.pixels[i * 4]) << i;
+            EXPECT_EQ(255, r.pixels[i * 4 + 3]) << i;
+        }
+    }
+    {
+        ThermalVision thermal;
+        Rendered r = renderWithProgram(&thermal, picture);
+        ASSERT_EQ(24u, r.pixels.size());
+        // White is the red end, black the blue end.
+        EXPECT_EQ(255, r.pixels[0]);
+        EXPECT_EQ(0, r.pixels[1]);
+        EXPECT_EQ(0, r.pixels[2]);
+        EXPECT_EQ(0, r.pixels[4]);
+        EXPECT_EQ(255, r.pixels[6]);
+        // Mean 382/765 is just below the middle: nearly pure yellow, from the blue side.
+        EXPECT_NEAR(254, r.pixels[20], 1);
+        EXPECT_NEAR(254, r.pixels[21], 1);
+        EXPECT_NEAR(1, r.pixels[22], 1);
+    }
+}
+
+TEST_F(GlContextTest, BaseClassDrawsThePassThroughSnippet) {
+    const int w = 16, h = 8;
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
+    BaseSnippetEffect effect;
+    Rendered r = renderWithProgram(&effect, picture);
+    EXPECT_EQ(0, r.drawResult);
+    // The snippet keeps alpha; the program's default shader would force 1.
+    EXPECT_EQ(picture.rgba(), r.pixels);
+    EXPECT_EQ(0, effect.onDrawFrame(*android::sp<EglProgram>(new EglProgram())));
+}
+
+TEST_F(GlContextTest, BrokenSnippetsReportAndFallBackToTheDefaultShader) {
+    const int w = 8, h = 4;
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
+    std::vector<uint8_t> opaque = picture.rgba();
+    for (size_t i = 3; i < opaque.size(); i += 4) opaque[i] = 255;
+    {
+        CustomSnippetEffect effect("vec4 doEffect() { return undefined_thing; }");
+        LogCapture log;
+        Rendered r = renderWithProgram(&effect, picture);
+        EXPECT_TRUE(log.contains(4, "SingleEffect: could not load this shader"));
+        size_t reports = 0;
+        for (const std::string& line : log.texts())
+            if (line.rfind("VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:", 0) == 0)
+                ++reports;
+        EXPECT_EQ(1u, reports);
+        EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
+        EXPECT_EQ(opaque, r.pixels);
+    }
+    {
+        // Compiles alone, but reads a varying the vertex shader never writes.
+        CustomSnippetEffect effect(
+            "varying highp vec2 v_missing; vec4 doEffect() { return vec4(v_missing, 0.0, 1.0); }");
+        LogCapture log;
+        Rendered r = renderWithProgram(&effect, picture);
+        EXPECT_FALSE(log.contains("SingleEffect: could not load this shader"));
+        bool linkLine = false;
+        for (const std::string& line : log.texts())
+            linkLine |= line.rfind("SingleEffect: failed to link this shader: ", 0) == 0;
+        EXPECT_TRUE(linkLine);
+        EXPECT_EQ(opaque, r.pixels);
+    }
+}
+
+TEST(SingleCameraEffects, GLSideHasNothingToRelease) {
+    Sepia sepia;
+    android::sp<EglRecycler> recycler = new EglRecycler();
+    EXPECT_EQ(0, sepia.releaseGL(*recycler));
+    EXPECT_EQ(VC_ERROR_UNSUPPORTED, sepia.doEffect());
+    EXPECT_TRUE(sepia.isGLPreviewSupported());
+    EXPECT_TRUE(sepia.isGLPictureSupported());
+}

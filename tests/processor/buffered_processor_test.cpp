@@ -1,0 +1,326 @@
+// The buffered processor end to end on llvmpipe: every fixed look through the
+// RGBA, BGRA and NV21 paths compared with the CPU statement of its math, the
+// effect fallbacks, status codes, log lines, and GL objects and memory over
+// many calls.
+#include <gtest/gtest.h>
+
+#include <EGL/egl.h>
+#include <GLES2/gl2.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "core/KivFilter.h"
+#include "core/VFilterBufferedProcessor.h"
+#include "core/VFilterBufferedProcessorImpl.h"
+#include "support/log_capture.h"
+#include "support/look_reference.h"
+#include "vccore/vc_convert.h"
+#include "vccore/vc_image.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+// Compares a rendered RGBA picture with the reference of `look` over `picture`;
+// pixels at a hard threshold of the look are skipped but must stay rare.
+void expectLook(int look, const lookref::Picture& picture, const uint8_t* actual, int tolerance,
+                const char* path) {
+    std::vector<bool> nearThreshold;
+    std::vector<uint8_t> expected = lookref::render(look, picture, &nearThreshold);
+    size_t skipped = 0, bad = 0;
+    std::string first;
+    for (size_t i = 0; i < nearThreshold.size(); ++i) {
+        if (nearThreshold[i]) {
+            ++skipped;
+            continue;
+        }
+        for (int ch = 0; ch < 4; ++ch) {
+            if (std::abs(int(expected[i * 4 + ch]) - int(actual[i * 4 + ch])) > tolerance) {
+                if (bad++ == 0)
+                    first = std::to_string(i % picture.width()) + "," +
+                            std::to_string(i / picture.width()) + " ch" + std::to_string(ch) +
+                            " want " + std::to_string(expected[i * 4 + ch]) + " got " +
+                            std::to_string(actual[i * 4 + ch]);
+                break;
+            }
+        }
+    }
+    EXPECT_EQ(0u, bad) << path << " look " << look << ": first bad pixel " << first;
+    EXPECT_LT(skipped * 20, nearThreshold.size()) << path << " look " << look;
+}
+
+std::vector<uint8_t> swapRB(const std::vector<uint8_t>& in) {
+    std::vector<uint8_t> out(in);
+    for (size_t i = 0; i < out.size(); i += 4) std::swap(out[i], out[i + 2]);
+    return out;
+}
+
+// An NV21 picture with smooth content, and the RGBA the image core makes of it
+// (the input the effect's shader samples).
+struct Nv21Picture {
+    int width, height;
+    std::vector<uint8_t> nv21;
+    std::vector<uint8_t> rgba;
+};
+
+Nv21Picture makeNv21(int width, int height) {
+    Nv21Picture p{width, height, {}, {}};
+    std::vector<uint8_t> rgba = lookref::makeTestPicture(width, height, true);
+    VCImage* src = VCImage_createWrap(rgba.data(), width, height, VC_FORMAT_RGBA, 0, 0);
+    VCImage* yuv = VCImage_createNew(width, height, VC_FORMAT_NV21);
+    VCImage* back = VCImage_createNew(width, height, VC_FORMAT_RGBA);
+    EXPECT_EQ(0, VCImage_convert(src, yuv));
+    EXPECT_EQ(0, VCImage_convert(yuv, back));
+    p.nv21.assign(yuv->data, yuv->data + VCImage_size(yuv));
+    p.rgba.assign(back->data, back->data + VCImage_size(back));
+    VCImage_destroy(src);
+    VCImage_destroy(yuv);
+    VCImage_destroy(back);
+    return p;
+}
+
+class BufferedProcessorTest : public ::testing::Test {
+protected:
+    void SetUp() override {
+        mProcessor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
+        ASSERT_NE(nullptr, mProcessor);
+        ASSERT_EQ(0, mProcessor->initialize());
+    }
+    void TearDown() override {
+        if (mProcessor != nullptr) {
+            mProcessor->release();
+            BufferedProcessor_Destroy(mProcessor);
+        }
+    }
+    VFilterBufferedProcessorImpl* mProcessor = nullptr;
+};
+
+}  // namespace
+
+TEST(BufferedProcessorApi, VersionCreateDestroyAndThreadRecord) {
+    EXPECT_EQ(3, BufferedProcessor_GetVersion());
+    LogCapture log;
+    VFilterBufferedProcessor* p = BufferedProcessor_Create();
+    ASSERT_NE(nullptr, p);
+    EXPECT_NE(nullptr, dynamic_cast<VFilterBufferedProcessorImpl*>(p));
+    EXPECT_TRUE(pthread_equal(pthread_self(), gOpenGLManagerThread));
+    BufferedProcessor_Destroy(p);
+    EXPECT_EQ(0u, static_cast<unsigned long>(gOpenGLManagerThread));
+    BufferedProcessor_Destroy(nullptr);
+    std::vector<std::string> want = {"EGL: BufferedProcessor_Create",
+                                     "EGL: BufferedProcessor_Destroy",
+                                     "EGL: BufferedProcessor_Destroy"};
+    EXPECT_EQ(want, log.texts());
+}
+
+TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
+    VFilterBufferedProcessorImpl p;
+    LogCapture log;
+    EXPECT_EQ(0, p.setEffectParameter("intensity=3"));  // nothing held: nothing happens
+    EXPECT_EQ(nullptr, p.getEffect());
+    EXPECT_EQ(0, p.setEffect(401));
+    ASSERT_NE(nullptr, p.getEffect());
+    EXPECT_EQ(401, p.getEffect()->getFilterType());
+    for (int unknown : {-1, 0, 404, 509, 1999, 123456}) {
+        EXPECT_EQ(0, p.setEffect(unknown));
+        ASSERT_NE(nullptr, p.getEffect());
+        EXPECT_EQ(400, p.getEffect()->getFilterType()) << unknown;
+    }
+    EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
+    ASSERT_NE(nullptr, p.getEffect());
+    EXPECT_EQ(400, p.getEffect()->getFilterType());
+    EXPECT_EQ(0, p.setEffect(static_cast<const char*>(nullptr)));
+    ASSERT_NE(nullptr, p.getEffect());
+    EXPECT_EQ(400, p.getEffect()->getFilterType());
+    EXPECT_EQ(0, p.setEffect(443));
+    EXPECT_EQ(0, p.setEffectParameter("intensity=3"));
+    EXPECT_EQ(443, p.getEffect()->getFilterType());
+    EXPECT_TRUE(log.contains(1, "virtual int VFilterBufferedProcessorImpl::setEffect(int) : 401"));
+    EXPECT_TRUE(log.contains(1,
+                             "virtual int VFilterBufferedProcessorImpl::setEffect(const char*) "
+                             ": no.such.package,libnothing.so"));
+    EXPECT_TRUE(log.contains(1,
+                             "virtual int VFilterBufferedProcessorImpl::setEffectParameter("
+                             "const char*) : intensity=3"));
+    EXPECT_EQ(0, p.release());
+}
+
+TEST(BufferedProcessorApi, StatusCodesWithoutContextOrBuffers) {
+    VFilterBufferedProcessorImpl p;
+    std::vector<uint8_t> in(16 * 4, 7), out(16 * 4, 0xAB);
+    LogCapture log;
+    EXPECT_EQ(-3, p.doProcessRGBA(nullptr, 4, 4, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(-3, p.doProcessRGBA(in.data(), 4, 4, nullptr, VC_FORMAT_BGRA));
+    EXPECT_EQ(-3, p.doProcessNV21(nullptr, 4, 4, out.data()));
+    EXPECT_EQ(-3, p.doProcessNV21(in.data(), 4, 4, nullptr));
+    // Never initialised: no surface to bind.
+    EXPECT_EQ(-7, p.doProcessRGBA(in.data(), 4, 4, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(-7, p.doProcessNV21(in.data(), 4, 4, out.data()));
+    EXPECT_EQ(std::vector<uint8_t>(16 * 4, 0xAB), out);
+    size_t invalidState = 0;
+    for (const std::string& l : log.texts())
+        if (l.rfind("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:", 0) == 0)
+            ++invalidState;
+    // bindGLEnvironment's line and the caller's own, for each call.
+    EXPECT_EQ(4u, invalidState);
+}
+
+TEST_F(BufferedProcessorTest, EveryLookThroughRgbaAndBgra) {
+    const int w = 64, h = 48;
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
+    std::vector<uint8_t> bgraIn = swapRB(picture.rgba());
+    for (int id : lookref::lookIds()) {
+        ASSERT_EQ(0, mProcessor->setEffect(id));
+        std::vector<uint8_t> out(w * h * 4, 0x5A);
+        ASSERT_EQ(
+            0, mProcessor->doProcessRGBA(picture.rgba().data(), w, h, out.data(), VC_FORMAT_RGBA));
+        expectLook(id, picture, out.data(), 2, "RGBA");
+        std::vector<uint8_t> bgraOut(w * h * 4, 0x5A);
+        ASSERT_EQ(0,
+                  mProcessor->doProcessRGBA(bgraIn.data(), w, h, bgraOut.data(), VC_FORMAT_BGRA));
+        expectLook(id, picture, swapRB(bgraOut).data(), 2, "BGRA");
+    }
+}
+
+TEST_F(BufferedProcessorTest, EveryLookThroughNv21EvenAndOddHeight) {
+    // 64x47 is padded to 64x48: with an even width the chroma block keeps its
+    // layout, so the padded picture is exact except for the added last row.
+    for (int h : {48, 47}) {
+        const int w = 64;
+        Nv21Picture even = makeNv21(w, 48);
+        std::vector<uint8_t> input(even.nv21);
+        if (h == 47) {
+            // 47 luma rows followed by the 24 chroma rows of the 48-row picture.
+            input.erase(input.begin() + w * 47, input.begin() + w * 48);
+        }
+        lookref::Picture picture(w, 48, even.rgba);
+        for (int id : lookref::lookIds()) {
+            ASSERT_EQ(0, mProcessor->setEffect(id));
+            std::vector<uint8_t> out(w * 48 * 4, 0x5A);
+            ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
+            if (h == 48) {
+                expectLook(id, picture, out.data(), 2, "NV21");
+            } else {
+                // Rows 0..45 see the same neighbourhood as in the full picture
+                // (the looks reach one texel up at most; the last row changed).
+                std::vector<bool> near;
+                std::vector<uint8_t> want = lookref::render(id, picture, &near);
+                size_t bad = 0;
+                for (size_t i = 0; i < size_t(w) * 46; ++i)
+                    for (int ch = 0; ch < 4 && !near[i]; ++ch)
+                        if (std::abs(int(want[i * 4 + ch]) - int(out[i * 4 + ch])) > 2) {
+                            ++bad;
+                            break;
+                        }
+                EXPECT_EQ(0u, bad) << "odd-height NV21, look " << id;
+            }
+        }
+    }
+}
+
+TEST_F(BufferedProcessorTest, OddNv21SizesArePaddedToEven) {
+    const int w = 101, h = 75, pw = 102, ph = 76;
+    // Luma rows of 101 bytes, then the chroma block the processor copies as is.
+    std::vector<uint8_t> input(w * h + pw * ph / 2, 128);
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x) input[y * w + x] = static_cast<uint8_t>(16 + (x * 2 + y) % 200);
+    // Guard bytes after the padded picture must survive.
+    std::vector<uint8_t> out(pw * ph * 4 + 64, 0xEE);
+    ASSERT_EQ(0, mProcessor->setEffect(400));
+    LogCapture log;
+    ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
+    for (size_t i = pw * ph * 4; i < out.size(); ++i) ASSERT_EQ(0xEE, out[i]) << i;
+    // Every padded pixel was written (opaque from the pass-through look).
+    for (int i = 0; i < pw * ph; ++i) ASSERT_EQ(255, out[i * 4 + 3]) << i;
+    // Neutral chroma: a pixel's grey is its luma (full range) in the first rows.
+    for (int x = 0; x < w; ++x) EXPECT_NEAR(input[x], out[x * 4 + 1], 2) << x;
+    EXPECT_TRUE(log.contains(1,
+                             "int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned "
+                             "char*, int, int, unsigned char*)"));
+}
+
+TEST_F(BufferedProcessorTest, LogsTheDrawAndItsSignature) {
+    std::vector<uint8_t> in(8 * 8 * 4, 100), out(8 * 8 * 4);
+    mProcessor->setEffect(403);
+    LogCapture log;
+    ASSERT_EQ(0, mProcessor->doProcessRGBA(in.data(), 8, 8, out.data(), VC_FORMAT_RGBA));
+    EXPECT_TRUE(log.contains(1,
+                             "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned "
+                             "char*, int, int, unsigned char*, int)"));
+    EXPECT_EQ(1u, log.count("EGL: Synchronously waiting for rendering..."));
+    EXPECT_EQ(155, out[0]);
+    EXPECT_EQ(100, out[3]);
+    // No 8K switch off msm8974.
+    for (const std::string& l : log.texts()) EXPECT_EQ(std::string::npos, l.find("8K_TEXTURES"));
+}
+
+TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
+    // Wider than any texture llvmpipe can hold: the buffer-backed images cannot
+    // be made, so nothing is drawn or read back.
+    GLint maxSize = 0;
+    ASSERT_EQ(0, mProcessor->bindGLEnvironment());
+    glGetIntegerv(GL_MAX_TEXTURE_SIZE, &maxSize);
+    mProcessor->unbindGLEnvironment();
+    ASSERT_GT(maxSize, 0);
+    const int w = maxSize * 2, h = 1;
+    std::vector<uint8_t> in(size_t(w) * 4, 9), out(size_t(w) * 4, 0xC3);
+    mProcessor->setEffect(403);
+    LogCapture log;
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(std::vector<uint8_t>(size_t(w) * 4, 0xC3), out);
+    EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
+    // The processor is still usable afterwards.
+    std::vector<uint8_t> small(4 * 4 * 4, 10), smallOut(4 * 4 * 4);
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(small.data(), 4, 4, smallOut.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(245, smallOut[0]);
+}
+
+namespace {
+
+// Live GL objects among the first `range` names of each kind.
+int liveGlObjects(int range) {
+    int n = 0;
+    for (GLuint name = 1; name <= GLuint(range); ++name) {
+        n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name) +
+             glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
+    }
+    return n;
+}
+
+}  // namespace
+
+TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
+    const int w = 16, h = 12;
+    std::vector<uint8_t> rgba = lookref::makeTestPicture(w, h, false);
+    Nv21Picture nv21 = makeNv21(w, h);
+    std::vector<uint8_t> out(w * h * 4);
+    const std::vector<int>& ids = lookref::lookIds();
+    auto run = [&](int i) {
+        mProcessor->setEffect(ids[i % ids.size()]);
+        if (i % 3 == 0) mProcessor->setEffect("com.morvane.unknown,libnone.so");
+        int r = (i % 2) ? mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(),
+                                                    i % 4 == 1 ? VC_FORMAT_BGRA : VC_FORMAT_RGBA)
+                        : mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data());
+        ASSERT_EQ(0, r) << i;
+    };
+    // Quiet: a thousand draws log a great deal.
+    LogCapture quiet;
+    for (int i = 0; i < 20; ++i) run(i);
+    ASSERT_EQ(0, mProcessor->bindGLEnvironment());
+    const int before = liveGlObjects(4096);
+    mProcessor->unbindGLEnvironment();
+    for (int i = 20; i < 1020; ++i) {
+        run(i);
+        if (HasFatalFailure()) return;
+    }
+    ASSERT_EQ(0, mProcessor->bindGLEnvironment());
+    const int after = liveGlObjects(4096);
+    mProcessor->unbindGLEnvironment();
+    // Only bindGLEnvironment's own program (and its shaders) is alive each time.
+    EXPECT_EQ(before, after);
+    EXPECT_LE(after, 3);
+    // Not current after a call: the context is bound only around each draw.
+    EXPECT_EQ(EGL_NO_CONTEXT, eglGetCurrentContext());
+}
