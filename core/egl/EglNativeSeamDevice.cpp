@@ -1,0 +1,49 @@
+// The device side of the EGL seam: Android's EGL takes native windows and
+// buffers directly.
+#ifdef __ANDROID__
+
+#include "core/egl/EglNativeSeam.h"
+
+#include <system/window.h>
+#include <ui/GraphicBuffer.h>
+
+namespace {
+
+class DeviceEglNativeSeam : public EglNativeSeam {
+public:
+    void prepareDisplay() override {}
+
+    EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config, ANativeWindow* window,
+                                   const EGLint* attribs) override {
+        return eglCreateWindowSurface(display, config, window, attribs);
+    }
+
+    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) override {
+        return eglSwapBuffers(display, surface);
+    }
+
+    EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) override {
+        return eglDestroySurface(display, surface);
+    }
+
+    EGLImageKHR createNativeBufferImage(EGLDisplay display,
+                                        android::GraphicBuffer* buffer) override {
+        if (buffer == nullptr) return EGL_NO_IMAGE_KHR;
+        const EGLint attribs[] = {EGL_IMAGE_PRESERVED_KHR, EGL_TRUE, EGL_NONE};
+        return eglCreateImageKHR(display, EGL_NO_CONTEXT, EGL_NATIVE_BUFFER_ANDROID,
+                                 (EGLClientBuffer)buffer->getNativeBuffer(), attribs);
+    }
+
+    EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) override {
+        return eglDestroyImageKHR(display, image);
+    }
+};
+
+}  // namespace
+
+EglNativeSeam& EglNativeSeam::get() {
+    static DeviceEglNativeSeam* seam = new DeviceEglNativeSeam();
+    return *seam;
+}
+
+#endif

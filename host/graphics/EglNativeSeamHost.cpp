@@ -1,0 +1,148 @@
+// The host side of the EGL seam: Mesa has no Android windows or buffers, so
+// a window surface is an off-screen pbuffer of the window's size whose swap
+// copies the frame into a buffer of the window and queues it, and a native
+// buffer's image is made from the buffer's GPU mirror texture.
+#include <map>
+#include <mutex>
+#include <vector>
+
+#include <GLES2/gl2.h>
+#include <system/window.h>
+#include <ui/GraphicBuffer.h>
+
+#include "../../core/egl/EglNativeSeam.h"
+#include "HostGl.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+using android::GraphicBuffer;
+using android::sp;
+
+class HostEglNativeSeam : public EglNativeSeam {
+public:
+    void prepareDisplay() override { android::HostGl::prepareDisplay(); }
+
+    EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config, ANativeWindow* window,
+                                   const EGLint* /*attribs*/) override {
+        if (window == nullptr) return EGL_NO_SURFACE;
+        int width = 0;
+        int height = 0;
+        if (window->query(window, NATIVE_WINDOW_WIDTH, &width) != 0 ||
+            window->query(window, NATIVE_WINDOW_HEIGHT, &height) != 0 || width < 1 || height < 1) {
+            VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: window without a size");
+            return EGL_NO_SURFACE;
+        }
+        if (native_window_api_connect(window, NATIVE_WINDOW_API_EGL) != 0) {
+            VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: window already connected");
+            return EGL_NO_SURFACE;
+        }
+        const EGLint attribs[] = {EGL_WIDTH, width, EGL_HEIGHT, height, EGL_NONE};
+        EGLSurface surface = eglCreatePbufferSurface(display, config, attribs);
+        if (surface == EGL_NO_SURFACE) {
+            native_window_api_disconnect(window, NATIVE_WINDOW_API_EGL);
+            return EGL_NO_SURFACE;
+        }
+        std::lock_guard<std::mutex> guard(mLock);
+        mWindows[surface] = {window, width, height};
+        return surface;
+    }
+
+    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) override {
+        WindowSurface target;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(surface);
+            if (found == mWindows.end()) return eglSwapBuffers(display, surface);
+            target = found->second;
+        }
+        // The frame is read from the surface, so it has to be the current one.
+        if (eglGetCurrentSurface(EGL_DRAW) != surface) {
+            VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: swap of a surface that is not current");
+            return EGL_FALSE;
+        }
+        std::vector<unsigned char> frame((size_t)target.width * target.height * 4);
+        GLint framebuffer = 0;
+        GLint alignment = 4;
+        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &framebuffer);
+        glGetIntegerv(GL_PACK_ALIGNMENT, &alignment);
+        glBindFramebuffer(GL_FRAMEBUFFER, 0);
+        glPixelStorei(GL_PACK_ALIGNMENT, 4);
+        glReadPixels(0, 0, target.width, target.height, GL_RGBA, GL_UNSIGNED_BYTE, frame.data());
+        glPixelStorei(GL_PACK_ALIGNMENT, alignment);
+        glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)framebuffer);
+
+        ANativeWindow* window = target.window.get();
+        ANativeWindowBuffer* native = nullptr;
+        int fence = -1;
+        if (window->dequeueBuffer(window, &native, &fence) != 0 || native == nullptr) {
+            VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: no buffer to swap into");
+            return EGL_FALSE;
+        }
+        // Window memory is top row first; GL rows start at the bottom.
+        GraphicBuffer* buffer = GraphicBuffer::from(native);
+        if (buffer->writeRgbaFrame(frame.data(), target.width, target.height, true) != 0) {
+            window->cancelBuffer(window, native, -1);
+            return EGL_FALSE;
+        }
+        return window->queueBuffer(window, native, -1) == 0 ? EGL_TRUE : EGL_FALSE;
+    }
+
+    EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) override {
+        sp<ANativeWindow> window;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(surface);
+            if (found != mWindows.end()) {
+                window = found->second.window;
+                mWindows.erase(found);
+            }
+        }
+        if (window != nullptr) native_window_api_disconnect(window.get(), NATIVE_WINDOW_API_EGL);
+        return eglDestroySurface(display, surface);
+    }
+
+    EGLImageKHR createNativeBufferImage(EGLDisplay display, GraphicBuffer* buffer) override {
+        if (buffer == nullptr) return EGL_NO_IMAGE_KHR;
+        EGLImageKHR image = buffer->createEglImage(display);
+        if (image == EGL_NO_IMAGE_KHR) return image;
+        std::lock_guard<std::mutex> guard(mLock);
+        mImages[image] = buffer;  // the image keeps its buffer alive, as on a device
+        return image;
+    }
+
+    EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) override {
+        static const auto destroy =
+            (PFNEGLDESTROYIMAGEKHRPROC)eglGetProcAddress("eglDestroyImageKHR");
+        EGLBoolean result = destroy(display, image);
+        sp<GraphicBuffer> buffer;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mImages.find(image);
+            if (found != mImages.end()) {
+                buffer = found->second;
+                mImages.erase(found);
+            }
+        }
+        if (buffer != nullptr) buffer->onEglImageDestroyed();
+        return result;
+    }
+
+private:
+    struct WindowSurface {
+        sp<ANativeWindow> window;
+        int width = 0;
+        int height = 0;
+    };
+
+    std::mutex mLock;
+    std::map<EGLSurface, WindowSurface> mWindows;
+    std::map<EGLImageKHR, sp<GraphicBuffer>> mImages;
+};
+
+}  // namespace
+
+EglNativeSeam& EglNativeSeam::get() {
+    static HostEglNativeSeam* seam = new HostEglNativeSeam();
+    return *seam;
+}

@@ -1,0 +1,64 @@
+// The host graphics context: one OpenGL ES 2 context of the host layer,
+// on the default EGL display, that owns the GPU mirrors of every
+// GraphicBuffer. Any thread may borrow it for a moment (run()), so buffers
+// can be synchronised from threads that have no context of their own.
+#ifndef KIV_HOST_GRAPHICS_HOSTGL_H
+#define KIV_HOST_GRAPHICS_HOSTGL_H
+
+#include <functional>
+#include <mutex>
+
+#include <EGL/egl.h>
+#include <EGL/eglext.h>
+#include <GLES2/gl2.h>
+#include <GLES2/gl2ext.h>
+
+namespace android {
+
+class HostGl {
+public:
+    static HostGl& get();
+
+    // Selects the headless EGL platform unless the environment chose one.
+    static void prepareDisplay();
+
+    // Keeps the context (and a reference on the display) alive while at
+    // least one user holds it. acquire() creates it on first use; false when
+    // EGL cannot give one.
+    bool acquire();
+    void release();
+
+    // Runs `work` with the context current on the calling thread, under the
+    // context's lock. A context already current on the thread is fenced
+    // before (so its pending GL work is done) and restored after; `work` is
+    // fenced before the caller's context resumes. False when the context
+    // could not be made current or `work` returned false.
+    bool run(const std::function<bool()>& work);
+
+    // Valid while acquired.
+    EGLDisplay display() const { return mDisplay; }
+    EGLContext context() const { return mContext; }
+
+    // Framebuffer of the context, for readbacks (made on first use, in run()).
+    GLuint framebuffer_l();
+
+private:
+    HostGl();
+    bool create_l();
+    void destroy_l();
+    void fenceCurrent(EGLDisplay display);
+
+    std::mutex mLock;
+    int mUsers;
+    EGLDisplay mDisplay;
+    EGLContext mContext;
+    EGLSurface mSurface;
+    GLuint mFramebuffer;
+    PFNEGLCREATESYNCKHRPROC mCreateSync;
+    PFNEGLCLIENTWAITSYNCKHRPROC mClientWaitSync;
+    PFNEGLDESTROYSYNCKHRPROC mDestroySync;
+};
+
+}  // namespace android
+
+#endif

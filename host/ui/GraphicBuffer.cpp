@@ -1,0 +1,427 @@
+#include <ui/GraphicBuffer.h>
+
+#include <stdlib.h>
+#include <string.h>
+
+#include <vector>
+
+#include "../graphics/HostGl.h"
+#include "vccore/vc_convert.h"
+#include "vccore/vc_image.h"
+#include "vccore/vc_log.h"
+
+namespace android {
+
+namespace {
+
+// Layout of the CPU copy for a pixel format; 0 when the host cannot hold it.
+uint32_t fourccOf(PixelFormat format) {
+    switch (format) {
+        case HAL_PIXEL_FORMAT_RGBA_8888:
+        case HAL_PIXEL_FORMAT_RGBX_8888:
+        case HAL_PIXEL_FORMAT_IMPLEMENTATION_DEFINED:  // an RGBA buffer on the host
+            return VC_FORMAT_RGBA;
+        case HAL_PIXEL_FORMAT_BGRA_8888:
+            return VC_FORMAT_BGRA;
+        case HAL_PIXEL_FORMAT_YCrCb_420_SP:
+        case HAL_PIXEL_FORMAT_VENDOR_YCrCb_420_SP:
+            return VC_FORMAT_NV21;
+        case HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP:
+            return VC_FORMAT_NV12;
+        case HAL_PIXEL_FORMAT_YV12:
+            return VC_FORMAT_YV12;
+        default:
+            return 0;
+    }
+}
+
+bool isYuv(uint32_t fourcc) {
+    return fourcc == VC_FORMAT_NV21 || fourcc == VC_FORMAT_NV12 || fourcc == VC_FORMAT_YV12;
+}
+
+// Rows of each plane in the CPU copy: `rows` rows of `bytes` bytes, `pitch`
+// bytes apart, starting at `offset`.
+struct Plane {
+    size_t offset;
+    size_t pitch;
+    size_t bytes;
+    size_t rows;
+};
+
+// The planes of a buffer whose rows are `stride` pixels apart; with
+// stride == width they are exactly the compact image-core layout.
+int planesOf(uint32_t fourcc, size_t width, size_t height, size_t stride, Plane* planes) {
+    if (!isYuv(fourcc)) {
+        planes[0] = {0, stride * 4, width * 4, height};
+        return 1;
+    }
+    size_t luma = stride * height;
+    planes[0] = {0, stride, width, height};
+    if (fourcc != VC_FORMAT_YV12) {
+        planes[1] = {luma, stride, width, height / 2};
+        return 2;
+    }
+    size_t chroma = (stride / 2) * (height / 2);
+    planes[1] = {luma, stride / 2, width / 2, height / 2};
+    planes[2] = {luma + chroma, stride / 2, width / 2, height / 2};
+    return 3;
+}
+
+size_t bytesOf(uint32_t fourcc, size_t height, size_t stride) {
+    if (!isYuv(fourcc)) return stride * height * 4;
+    return stride * height + stride * (height / 2);
+}
+
+// Copies plane by plane between two layouts of the same image.
+void restride(const unsigned char* src, const Plane* srcPlanes, unsigned char* dst,
+              const Plane* dstPlanes, int count) {
+    for (int p = 0; p < count; ++p) {
+        for (size_t row = 0; row < srcPlanes[p].rows; ++row) {
+            memcpy(dst + dstPlanes[p].offset + row * dstPlanes[p].pitch,
+                   src + srcPlanes[p].offset + row * srcPlanes[p].pitch, srcPlanes[p].bytes);
+        }
+    }
+}
+
+}  // namespace
+
+GraphicBuffer::GraphicBuffer()
+    : mRequestorName("<Unknown>"),
+      mInitCheck(NO_INIT),
+      mFourcc(0),
+      mData(nullptr),
+      mDataSize(0),
+      mLockUsage(0),
+      mMirrorTexture(0),
+      mImageCount(0),
+      mGpuDirty(false),
+      mUploadCount(0),
+      mReadbackCount(0) {
+    init(0, 0, 0, 0, 0);
+}
+
+GraphicBuffer::GraphicBuffer(uint32_t inWidth, uint32_t inHeight, PixelFormat inFormat,
+                             uint32_t inUsage, std::string requestorName)
+    : GraphicBuffer() {
+    mRequestorName = std::move(requestorName);
+    init(inWidth, inHeight, inFormat, inUsage, inWidth);
+}
+
+GraphicBuffer::GraphicBuffer(uint32_t inWidth, uint32_t inHeight, PixelFormat inFormat,
+                             uint32_t inUsage, uint32_t inStride, std::string requestorName)
+    : GraphicBuffer() {
+    mRequestorName = std::move(requestorName);
+    init(inWidth, inHeight, inFormat, inUsage, inStride);
+}
+
+void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage,
+                         uint32_t inStride) {
+    common.incRef = incRef;
+    common.decRef = decRef;
+    width = (int)w;
+    height = (int)h;
+    stride = (int)inStride;
+    format = f;
+    usage = inUsage;
+    usage_deprecated = (int)inUsage;
+    layerCount = 1;
+    handle = nullptr;
+    if (w == 0 && h == 0) return;  // the empty buffer
+
+    mFourcc = fourccOf(f);
+    // 4:2:0 layouts need even sizes; planar chroma rows need an even stride.
+    bool bad = mFourcc == 0 || w == 0 || h == 0 || w > 16384 || h > 16384 || inStride < w ||
+               inStride > 16384 || (isYuv(mFourcc) && ((w | h | inStride) & 1) != 0);
+    if (bad) {
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot allocate %ux%u format %d (stride %u)", w, h,
+                  f, inStride);
+        mInitCheck = BAD_VALUE;
+        return;
+    }
+    mDataSize = bytesOf(mFourcc, h, inStride);
+    mData = static_cast<unsigned char*>(calloc(1, mDataSize));
+    if (mData == nullptr) {
+        mInitCheck = NO_MEMORY;
+        return;
+    }
+    mInitCheck = NO_ERROR;
+}
+
+GraphicBuffer::~GraphicBuffer() {
+    if (mMirrorTexture != 0) {
+        GLuint texture = mMirrorTexture;
+        HostGl::get().run([texture] {
+            glDeleteTextures(1, &texture);
+            return true;
+        });
+        HostGl::get().release();
+    }
+    free(mData);
+}
+
+void GraphicBuffer::incRef(android_native_base_t* base) {
+    GraphicBuffer* self = static_cast<GraphicBuffer*>(reinterpret_cast<ANativeWindowBuffer*>(base));
+    self->incStrong(self);
+}
+
+void GraphicBuffer::decRef(android_native_base_t* base) {
+    GraphicBuffer* self = static_cast<GraphicBuffer*>(reinterpret_cast<ANativeWindowBuffer*>(base));
+    self->decStrong(self);
+}
+
+ANativeWindowBuffer* GraphicBuffer::getNativeBuffer() const {
+    return const_cast<GraphicBuffer*>(this);
+}
+
+GraphicBuffer* GraphicBuffer::from(ANativeWindowBuffer* buffer) {
+    return buffer == nullptr ? nullptr : static_cast<GraphicBuffer*>(buffer);
+}
+
+status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
+    if (mInitCheck != NO_ERROR) return NO_INIT;
+    if ((inUsage & USAGE_SOFTWARE_MASK) == 0) return BAD_VALUE;
+    if (mLockUsage != 0) return INVALID_OPERATION;
+    // GPU rendering into the mirror reaches the CPU copy here.
+    if (mMirrorTexture != 0 && (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty)) {
+        if (!readback_l()) return UNKNOWN_ERROR;
+        mGpuDirty = false;
+    }
+    mLockUsage = inUsage;
+    return NO_ERROR;
+}
+
+status_t GraphicBuffer::lock(uint32_t inUsage, void** vaddr) {
+    if (vaddr == nullptr) return BAD_VALUE;
+    std::lock_guard<std::mutex> guard(mLock);
+    status_t status = lockCommon_l(inUsage);
+    *vaddr = status == NO_ERROR ? mData : nullptr;
+    return status;
+}
+
+status_t GraphicBuffer::lockYCbCr(uint32_t inUsage, android_ycbcr* ycbcr) {
+    if (ycbcr == nullptr) return BAD_VALUE;
+    std::lock_guard<std::mutex> guard(mLock);
+    if (mInitCheck == NO_ERROR && !isYuv(mFourcc)) return BAD_VALUE;
+    status_t status = lockCommon_l(inUsage);
+    if (status != NO_ERROR) return status;
+    memset(ycbcr, 0, sizeof(*ycbcr));
+    unsigned char* chroma = mData + (size_t)stride * height;
+    ycbcr->y = mData;
+    ycbcr->ystride = stride;
+    if (mFourcc == VC_FORMAT_YV12) {
+        ycbcr->cstride = stride / 2;
+        ycbcr->chroma_step = 1;
+        ycbcr->cr = chroma;
+        ycbcr->cb = chroma + (size_t)(stride / 2) * (height / 2);
+    } else {
+        ycbcr->cstride = stride;
+        ycbcr->chroma_step = 2;
+        ycbcr->cb = mFourcc == VC_FORMAT_NV12 ? chroma : chroma + 1;
+        ycbcr->cr = mFourcc == VC_FORMAT_NV12 ? chroma + 1 : chroma;
+    }
+    return NO_ERROR;
+}
+
+status_t GraphicBuffer::unlock() {
+    std::lock_guard<std::mutex> guard(mLock);
+    if (mLockUsage == 0) return INVALID_OPERATION;
+    bool wrote = (mLockUsage & USAGE_SW_WRITE_MASK) != 0;
+    mLockUsage = 0;
+    // CPU writes reach the GPU before its next use.
+    if (wrote && mMirrorTexture != 0 && !upload_l()) return UNKNOWN_ERROR;
+    return NO_ERROR;
+}
+
+bool GraphicBuffer::toRgba_l(unsigned char* rgba) const {
+    Plane own[3];
+    Plane compact[3];
+    int count = planesOf(mFourcc, width, height, stride, own);
+    planesOf(mFourcc, width, height, width, compact);
+    if (mFourcc == VC_FORMAT_RGBA) {
+        restride(mData, own, rgba, compact, count);
+        return true;
+    }
+    std::vector<unsigned char> packed;
+    unsigned char* source = mData;
+    if (stride != width) {
+        packed.resize(bytesOf(mFourcc, height, width));
+        restride(mData, own, packed.data(), compact, count);
+        source = packed.data();
+    }
+    VCImage* in = VCImage_createWrap(source, width, height, mFourcc, 0, 0);
+    VCImage* out = VCImage_createWrap(rgba, width, height, VC_FORMAT_RGBA, 0, 0);
+    int result =
+        (in != nullptr && out != nullptr) ? VCImage_convert(in, out) : VC_ERROR_ALLOC_FAILED;
+    VCImage_destroy(in);
+    VCImage_destroy(out);
+    if (result != 0) {
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot convert %4.4s to RGBA (%d)",
+                  (const char*)&mFourcc, result);
+    }
+    return result == 0;
+}
+
+bool GraphicBuffer::fromRgba_l(const unsigned char* rgba) {
+    Plane own[3];
+    Plane compact[3];
+    int count = planesOf(mFourcc, width, height, stride, own);
+    planesOf(mFourcc, width, height, width, compact);
+    if (mFourcc == VC_FORMAT_RGBA) {
+        restride(rgba, compact, mData, own, count);
+        return true;
+    }
+    std::vector<unsigned char> packed(bytesOf(mFourcc, height, width));
+    VCImage* in =
+        VCImage_createWrap(const_cast<unsigned char*>(rgba), width, height, VC_FORMAT_RGBA, 0, 0);
+    VCImage* out = VCImage_createWrap(packed.data(), width, height, mFourcc, 0, 0);
+    int result =
+        (in != nullptr && out != nullptr) ? VCImage_convert(in, out) : VC_ERROR_ALLOC_FAILED;
+    VCImage_destroy(in);
+    VCImage_destroy(out);
+    if (result != 0) {
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot convert RGBA to %4.4s (%d)",
+                  (const char*)&mFourcc, result);
+        return false;
+    }
+    restride(packed.data(), compact, mData, own, count);
+    return true;
+}
+
+bool GraphicBuffer::ensureMirror_l() {
+    if (mMirrorTexture != 0) return true;
+    if (!HostGl::get().acquire()) return false;
+    std::vector<unsigned char> rgba((size_t)width * height * 4);
+    if (!toRgba_l(rgba.data())) {
+        HostGl::get().release();
+        return false;
+    }
+    GLuint texture = 0;
+    bool ok = HostGl::get().run([&] {
+        glGenTextures(1, &texture);
+        glBindTexture(GL_TEXTURE_2D, texture);
+        // Level 0 only: the texture must be complete to become an EGL image.
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+        glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
+        glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE,
+                     rgba.data());
+        glBindTexture(GL_TEXTURE_2D, 0);
+        GLenum error = glGetError();
+        if (error != GL_NO_ERROR) {
+            VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed (0x%04x)", width,
+                      height, error);
+            glDeleteTextures(1, &texture);
+            return false;
+        }
+        return true;
+    });
+    if (!ok) {
+        HostGl::get().release();
+        return false;
+    }
+    mMirrorTexture = texture;
+    return true;
+}
+
+bool GraphicBuffer::upload_l() {
+    std::vector<unsigned char> rgba((size_t)width * height * 4);
+    if (!toRgba_l(rgba.data())) return false;
+    GLuint texture = mMirrorTexture;
+    bool ok = HostGl::get().run([&] {
+        glBindTexture(GL_TEXTURE_2D, texture);
+        glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
+        glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE,
+                        rgba.data());
+        glBindTexture(GL_TEXTURE_2D, 0);
+        return glGetError() == GL_NO_ERROR;
+    });
+    if (ok) ++mUploadCount;
+    return ok;
+}
+
+bool GraphicBuffer::readback_l() {
+    std::vector<unsigned char> rgba((size_t)width * height * 4);
+    GLuint texture = mMirrorTexture;
+    bool ok = HostGl::get().run([&] {
+        HostGl& gl = HostGl::get();
+        glBindFramebuffer(GL_FRAMEBUFFER, gl.framebuffer_l());
+        glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, texture, 0);
+        bool complete = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+        if (complete) {
+            glPixelStorei(GL_PACK_ALIGNMENT, 4);
+            glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, rgba.data());
+        }
+        glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, 0, 0);
+        glBindFramebuffer(GL_FRAMEBUFFER, 0);
+        return complete && glGetError() == GL_NO_ERROR;
+    });
+    if (!ok) {
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot read the GPU copy back");
+        return false;
+    }
+    ++mReadbackCount;
+    return fromRgba_l(rgba.data());
+}
+
+EGLImageKHR GraphicBuffer::createEglImage(EGLDisplay display) {
+    std::lock_guard<std::mutex> guard(mLock);
+    if (mInitCheck != NO_ERROR || !ensureMirror_l()) return EGL_NO_IMAGE_KHR;
+    HostGl& gl = HostGl::get();
+    if (display != gl.display()) {
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: EGL image asked for another display");
+        return EGL_NO_IMAGE_KHR;
+    }
+    static const auto createImage =
+        (PFNEGLCREATEIMAGEKHRPROC)eglGetProcAddress("eglCreateImageKHR");
+    const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_IMAGE_PRESERVED_KHR, EGL_TRUE,
+                              EGL_NONE};
+    EGLImageKHR image = EGL_NO_IMAGE_KHR;
+    GLuint texture = mMirrorTexture;
+    gl.run([&] {
+        image = createImage(gl.display(), gl.context(), EGL_GL_TEXTURE_2D_KHR,
+                            (EGLClientBuffer)(uintptr_t)texture, attribs);
+        return image != EGL_NO_IMAGE_KHR;
+    });
+    if (image != EGL_NO_IMAGE_KHR) ++mImageCount;
+    return image;
+}
+
+void GraphicBuffer::onEglImageDestroyed() {
+    std::lock_guard<std::mutex> guard(mLock);
+    if (mImageCount > 0) --mImageCount;
+    // What was rendered through the image is still to be read back.
+    if ((usage & USAGE_HW_RENDER) != 0) mGpuDirty = true;
+}
+
+status_t GraphicBuffer::writeRgbaFrame(const unsigned char* rgba, uint32_t frameWidth,
+                                       uint32_t frameHeight, bool bottomUp) {
+    if (rgba == nullptr) return BAD_VALUE;
+    void* ignored = nullptr;
+    status_t status = lock(USAGE_SW_READ_OFTEN | USAGE_SW_WRITE_OFTEN, &ignored);
+    if (status != NO_ERROR) return status;
+    {
+        std::lock_guard<std::mutex> guard(mLock);
+        size_t w = (size_t)width;
+        size_t h = (size_t)height;
+        std::vector<unsigned char> full(w * h * 4);
+        bool ok = mFourcc == VC_FORMAT_RGBA || toRgba_l(full.data());
+        if (mFourcc == VC_FORMAT_RGBA) {
+            for (size_t row = 0; row < h; ++row) {
+                memcpy(&full[row * w * 4], mData + row * stride * 4, w * 4);
+            }
+        }
+        size_t copyWidth = frameWidth < w ? frameWidth : w;
+        size_t copyHeight = frameHeight < h ? frameHeight : h;
+        for (size_t row = 0; ok && row < copyHeight; ++row) {
+            size_t source = bottomUp ? frameHeight - 1 - row : row;
+            memcpy(&full[row * w * 4], rgba + source * frameWidth * 4, copyWidth * 4);
+        }
+        if (!ok || !fromRgba_l(full.data())) status = UNKNOWN_ERROR;
+    }
+    status_t unlocked = unlock();
+    return status != NO_ERROR ? status : unlocked;
+}
+
+}  // namespace android
