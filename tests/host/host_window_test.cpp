@@ -1,0 +1,171 @@
+// The host window (slots, FIFO, dropping, perform/query) and the host EGL
+// window surface whose swap queues the rendered frame into it.
+#include <gui/HostWindow.h>
+
+#include <android/native_window.h>
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "core/egl/EglEnvironment.h"
+#include "core/egl/EglNativeSeam.h"
+#include "support/gl_context.h"
+
+using android::GraphicBuffer;
+using android::HostWindow;
+using android::sp;
+
+namespace {
+
+ANativeWindowBuffer* dequeue(ANativeWindow* window) {
+    ANativeWindowBuffer* buffer = nullptr;
+    int fence = 0;
+    if (window->dequeueBuffer(window, &buffer, &fence) != 0) return nullptr;
+    EXPECT_EQ(fence, -1);
+    return buffer;
+}
+
+TEST(HostWindowTest, SlotsQueueInOrderAndDropTheOldestWhenFull) {
+    sp<HostWindow> window = new HostWindow(64, 32);
+    ANativeWindow* anw = window.get();
+    EXPECT_EQ(ANativeWindow_getWidth(anw), 64);
+    EXPECT_EQ(ANativeWindow_getHeight(anw), 32);
+    EXPECT_EQ(ANativeWindow_getFormat(anw), HAL_PIXEL_FORMAT_RGBA_8888);
+    EXPECT_EQ(window->getBufferCount(), 3);
+
+    sp<GraphicBuffer> none;
+    EXPECT_EQ(window->acquireFrame(&none, nullptr, nullptr), android::WOULD_BLOCK);
+
+    ANativeWindowBuffer* a = dequeue(anw);
+    ANativeWindowBuffer* b = dequeue(anw);
+    ASSERT_NE(a, nullptr);
+    ASSERT_NE(b, nullptr);
+    EXPECT_NE(a, b);
+    EXPECT_EQ(a->width, 64);
+    EXPECT_EQ(a->height, 32);
+    EXPECT_EQ(anw->queueBuffer(anw, b, -1), 0);
+    EXPECT_EQ(anw->queueBuffer(anw, b, -1), android::BAD_VALUE);  // not dequeued any more
+    EXPECT_EQ(anw->queueBuffer(anw, a, -1), 0);
+
+    sp<GraphicBuffer> first;
+    uint64_t number = 0;
+    ASSERT_EQ(window->acquireFrame(&first, &number, nullptr), android::NO_ERROR);
+    EXPECT_EQ(first->getNativeBuffer(), b);
+    EXPECT_EQ(number, 1u);
+
+    // Slots: b acquired, a queued, one free. Two more dequeues: the free
+    // one, then the queued frame's slot is taken and that frame dropped.
+    ANativeWindowBuffer* c = dequeue(anw);
+    ANativeWindowBuffer* d = dequeue(anw);
+    ASSERT_NE(c, nullptr);
+    ASSERT_EQ(d, a);
+    EXPECT_EQ(window->droppedTotal(), 1u);
+    EXPECT_EQ(dequeue(anw), nullptr);  // everything is out
+    EXPECT_EQ(anw->cancelBuffer(anw, d, -1), 0);
+    EXPECT_EQ(anw->queueBuffer(anw, c, -1), 0);
+    EXPECT_EQ(window->releaseFrame(first), android::NO_ERROR);
+    EXPECT_EQ(window->releaseFrame(first), android::BAD_VALUE);
+    sp<GraphicBuffer> second;
+    ASSERT_EQ(window->acquireFrame(&second, &number, nullptr), android::NO_ERROR);
+    EXPECT_EQ(second->getNativeBuffer(), c);
+    EXPECT_EQ(number, 3u);
+    EXPECT_EQ(window->queuedTotal(), 3u);
+}
+
+TEST(HostWindowTest, PerformChangesGeometryCountUsageAndConnection) {
+    sp<HostWindow> window = new HostWindow(16, 16);
+    ANativeWindow* anw = window.get();
+    EXPECT_EQ(native_window_set_buffer_count(anw, 5), 0);
+    EXPECT_EQ(window->getBufferCount(), 5);
+    EXPECT_EQ(native_window_set_buffer_count(anw, 9), android::BAD_VALUE);
+    EXPECT_EQ(anw->perform(anw, NATIVE_WINDOW_SET_USAGE, 0x08002030), 0);
+    EXPECT_EQ(window->getConsumerUsage(), 0x08002030u);
+
+    EXPECT_EQ(ANativeWindow_setBuffersGeometry(anw, 40, 20, HAL_PIXEL_FORMAT_YCrCb_420_SP), 0);
+    EXPECT_EQ(ANativeWindow_getWidth(anw), 40);
+    EXPECT_EQ(ANativeWindow_getFormat(anw), HAL_PIXEL_FORMAT_YCrCb_420_SP);
+    ANativeWindowBuffer* buffer = dequeue(anw);
+    ASSERT_NE(buffer, nullptr);
+    EXPECT_EQ(buffer->width, 40);
+    EXPECT_EQ(buffer->format, HAL_PIXEL_FORMAT_YCrCb_420_SP);
+    EXPECT_EQ(buffer->usage, 0x08002030u);
+    // The count cannot change while a buffer is out.
+    EXPECT_EQ(native_window_set_buffer_count(anw, 3), android::INVALID_OPERATION);
+    EXPECT_EQ(anw->cancelBuffer(anw, buffer, -1), 0);
+    EXPECT_EQ(ANativeWindow_setBuffersGeometry(anw, 0, 0, 0), 0);
+    EXPECT_EQ(ANativeWindow_getWidth(anw), 16);  // back to the default
+
+    EXPECT_EQ(native_window_api_connect(anw, NATIVE_WINDOW_API_EGL), 0);
+    EXPECT_EQ(native_window_api_connect(anw, NATIVE_WINDOW_API_CPU), android::BAD_VALUE);
+    EXPECT_EQ(native_window_api_disconnect(anw, NATIVE_WINDOW_API_EGL), 0);
+
+    // sp<ANativeWindow> counts on the window itself.
+    {
+        sp<ANativeWindow> plain = anw;
+        EXPECT_EQ(window->getStrongCount(), 2);
+    }
+    EXPECT_EQ(window->getStrongCount(), 1);
+}
+
+class HostWindowSurfaceTest : public GlContextTest {};
+
+TEST_F(HostWindowSurfaceTest, SwapQueuesTheRenderedFrameTopRowFirst) {
+    const int w = 12;
+    const int h = 8;
+    sp<HostWindow> window = new HostWindow(w, h);
+    EGLDisplay display = mGl->env()->getEGLDisplay();
+    EglNativeSeam& seam = EglNativeSeam::get();
+    EGLSurface surface =
+        seam.createWindowSurface(display, mGl->env()->getEGLConfig(), window.get(), nullptr);
+    ASSERT_NE(surface, EGL_NO_SURFACE);
+    EXPECT_EQ(window->getConnectedApi(), NATIVE_WINDOW_API_EGL);
+    EGLint width = 0;
+    eglQuerySurface(display, surface, EGL_WIDTH, &width);
+    EXPECT_EQ(width, w);
+
+    // Swapping a surface that is not current fails and queues nothing.
+    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_FALSE));
+    EXPECT_EQ(window->queuedTotal(), 0u);
+
+    EGLSurface previousDraw = eglGetCurrentSurface(EGL_DRAW);
+    ASSERT_TRUE(eglMakeCurrent(display, surface, surface, mGl->env()->getEGLContext()));
+    glViewport(0, 0, w, h);
+    glClearColor(0.0f, 0.0f, 1.0f, 1.0f);  // blue top half
+    glClear(GL_COLOR_BUFFER_BIT);
+    glEnable(GL_SCISSOR_TEST);
+    glScissor(0, 0, w, h / 2);  // GL's lower half is red
+    glClearColor(1.0f, 0.0f, 0.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    glDisable(GL_SCISSOR_TEST);
+    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
+    glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
+
+    sp<GraphicBuffer> frame;
+    uint64_t number = 0;
+    ASSERT_EQ(window->acquireFrame(&frame, &number, nullptr), android::NO_ERROR);
+    EXPECT_EQ(number, 1u);
+    void* address = nullptr;
+    ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
+    const uint8_t* rows = static_cast<uint8_t*>(address);
+    for (int y = 0; y < h; ++y) {
+        const uint8_t* p = rows + (size_t)y * frame->getStride() * 4;
+        bool top = y < h / 2;
+        EXPECT_EQ(p[0], top ? 0 : 255) << "row " << y;
+        EXPECT_EQ(p[2], top ? 255 : 0) << "row " << y;
+    }
+    frame->unlock();
+    window->releaseFrame(frame);
+    ASSERT_EQ(window->acquireFrame(&frame, &number, nullptr), android::NO_ERROR);
+    EXPECT_EQ(number, 2u);
+    ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
+    EXPECT_EQ(static_cast<uint8_t*>(address)[1], 255);
+    frame->unlock();
+
+    ASSERT_TRUE(eglMakeCurrent(display, previousDraw, previousDraw, mGl->env()->getEGLContext()));
+    EXPECT_EQ(seam.destroySurface(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
+    EXPECT_EQ(window->getConnectedApi(), 0);
+}
+
+}  // namespace
