@@ -67,19 +67,37 @@ bool holds(const VCImage* image, uint64_t needed) {
     return image->size == 0 || image->size >= needed;
 }
 
-int encodePacked(tjhandle turbo, const VCImage* image, int pixelFormat, int quality,
-                 unsigned char** jpeg, unsigned long* jpegSize) {
+// Where the stream goes: a malloc'ed buffer of the worst-case size that the
+// record adopts as it is, or (when that cannot be had) one grown by TurboJPEG.
+struct Output {
+    unsigned char* jpeg = nullptr;
+    unsigned long size = 0;
+    int flags = VC_JPEG_ENCODE_FLAGS;
+    bool ours = false;
+
+    void reserve(int width, int height, int subsampling) {
+        unsigned long capacity = tjBufSize(width, height, subsampling);
+        if (capacity == static_cast<unsigned long>(-1)) return;
+        jpeg = static_cast<unsigned char*>(malloc(capacity));
+        if (jpeg == nullptr) return;
+        size = capacity;
+        flags |= TJFLAG_NOREALLOC;
+        ours = true;
+    }
+};
+
+int encodePacked(tjhandle turbo, const VCImage* image, int pixelFormat, int quality, Output* out) {
     if (!holds(image, VCImage_requiredSize(image->width, image->height, image->format))) return -1;
     int subsampling = pixelFormat == TJPF_GRAY ? TJSAMP_GRAY : VC_JPEG_SUBSAMPLING;
+    out->reserve(image->width, image->height, subsampling);
     return tjCompress2(turbo, image->data, image->width, image->width * tjPixelSize[pixelFormat],
-                       image->height, pixelFormat, jpeg, jpegSize, subsampling, quality,
-                       VC_JPEG_ENCODE_FLAGS);
+                       image->height, pixelFormat, &out->jpeg, &out->size, subsampling, quality,
+                       out->flags);
 }
 
 // 4:2:0 pictures go to the encoder as planes, without a trip through RGB;
 // interleaved chroma is split into two planes first.
-int encode420(tjhandle turbo, const VCImage* image, int quality, unsigned char** jpeg,
-              unsigned long* jpegSize) {
+int encode420(tjhandle turbo, const VCImage* image, int quality, Output* out) {
     int w = image->width;
     int h = image->height;
     VCYuvLayout layout;
@@ -102,13 +120,13 @@ int encode420(tjhandle turbo, const VCImage* image, int quality, unsigned char**
         planes[1] = split.data();
         planes[2] = split.data() + quarter;
     }
-    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_420, jpeg, jpegSize,
-                                   quality, VC_JPEG_ENCODE_FLAGS);
+    out->reserve(w, h, TJSAMP_420);
+    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_420, &out->jpeg,
+                                   &out->size, quality, out->flags);
 }
 
 // Packed 4:2:2 ("YUYV", "YVYU") is split into planes and encoded as 4:2:2.
-int encode422(tjhandle turbo, const VCImage* image, int quality, unsigned char** jpeg,
-              unsigned long* jpegSize) {
+int encode422(tjhandle turbo, const VCImage* image, int quality, Output* out) {
     int w = image->width;
     int h = image->height;
     VCYuvLayout layout;
@@ -127,8 +145,9 @@ int encode422(tjhandle turbo, const VCImage* image, int quality, unsigned char**
         v[i] = src[layout.vOffset];
     }
     const unsigned char* planes[3] = {y, u, v};
-    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_422, jpeg, jpegSize,
-                                   quality, VC_JPEG_ENCODE_FLAGS);
+    out->reserve(w, h, TJSAMP_422);
+    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_422, &out->jpeg,
+                                   &out->size, quality, out->flags);
 }
 
 }  // namespace
@@ -140,31 +159,39 @@ std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes,
 VCImage* VCJpeg_encode(const VCImage* image, int quality) {
     tjhandle turbo = tjInitCompress();
     if (turbo == nullptr) return nullptr;
-    unsigned char* jpeg = nullptr;
-    unsigned long jpegSize = 0;
+    Output output;
     int rc = -1;
     int pixelFormat = turboPixelFormat(image->format);
     if (pixelFormat >= 0) {
-        rc = encodePacked(turbo, image, pixelFormat, quality, &jpeg, &jpegSize);
+        rc = encodePacked(turbo, image, pixelFormat, quality, &output);
     } else if (VCImage_isYUV420(image->format)) {
-        rc = encode420(turbo, image, quality, &jpeg, &jpegSize);
+        rc = encode420(turbo, image, quality, &output);
     } else if (image->format == VC_FORMAT_YUYV || image->format == VC_FORMAT_YVYU) {
-        rc = encode422(turbo, image, quality, &jpeg, &jpegSize);
+        rc = encode422(turbo, image, quality, &output);
     }
     tjDestroy(turbo);
 
-    VCImage* out = nullptr;
-    if (rc == 0 && jpeg != nullptr && jpegSize > 0 && jpegSize <= UINT32_MAX) {
-        // The record frees its buffer with free(); TurboJPEG buffers go back
-        // through tjFree, so the stream is copied (a small fraction of the work).
-        unsigned char* stream = static_cast<unsigned char*>(malloc(jpegSize));
-        if (stream != nullptr) {
-            memcpy(stream, jpeg, jpegSize);
-            out = VCImage_createEmpty(image->width, image->height, VC_FORMAT_JPEG);
-            out->data = stream;
-            out->size = static_cast<uint32_t>(jpegSize);
+    unsigned char* stream = nullptr;
+    if (rc == 0 && output.jpeg != nullptr && output.size > 0 && output.size <= UINT32_MAX) {
+        if (output.ours) {
+            // Give back the unused tail of the worst-case buffer.
+            stream = static_cast<unsigned char*>(realloc(output.jpeg, output.size));
+            if (stream == nullptr) stream = output.jpeg;
+            output.jpeg = nullptr;
+        } else {
+            // The record frees its buffer with free(); TurboJPEG's own buffers
+            // go back through tjFree.
+            stream = static_cast<unsigned char*>(malloc(output.size));
+            if (stream != nullptr) memcpy(stream, output.jpeg, output.size);
         }
     }
-    if (jpeg != nullptr) tjFree(jpeg);
+    if (output.jpeg != nullptr) {
+        if (output.ours) free(output.jpeg);
+        else tjFree(output.jpeg);
+    }
+    if (stream == nullptr) return nullptr;
+    VCImage* out = VCImage_createEmpty(image->width, image->height, VC_FORMAT_JPEG);
+    out->data = stream;
+    out->size = static_cast<uint32_t>(output.size);
     return out;
 }
