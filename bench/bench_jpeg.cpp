@@ -123,8 +123,8 @@ void BM_JpegDecode(benchmark::State& state) {
                 int w = 0, h = 0, subsampling = 0, colorspace = 0;
                 if (tjDecompressHeader3(tj, jpeg->data, jpeg->size, &w, &h, &subsampling,
                                         &colorspace) != 0 ||
-                    tjDecompress2(tj, jpeg->data, jpeg->size, pixels.data(), w, w * 4, h,
-                                  TJPF_RGBA, VC_JPEG_DECODE_FLAGS) != 0)
+                    tjDecompress2(tj, jpeg->data, jpeg->size, pixels.data(), w, w * 4, h, TJPF_RGBA,
+                                  VC_JPEG_DECODE_FLAGS) != 0)
                     state.SkipWithError("TurboJPEG decoding failed");
             }
             benchmark::ClobberMemory();

@@ -20,10 +20,16 @@ namespace {
 
 const unsigned char kPngSignature[] = {0x89, 'P', 'N', 'G', '\r', '\n', 0x1A, '\n'};
 
-bool isPng(const Bytes& b) { return b.size() > 8 && memcmp(b.data(), kPngSignature, 8) == 0; }
-bool isJpeg(const Bytes& b) { return b.size() > 2 && b[0] == 0xFF && b[1] == 0xD8; }
+bool isPng(const Bytes& b) {
+    return b.size() > 8 && memcmp(b.data(), kPngSignature, 8) == 0;
+}
+bool isJpeg(const Bytes& b) {
+    return b.size() > 2 && b[0] == 0xFF && b[1] == 0xD8;
+}
 
-Bytes text(const char* s) { return Bytes(s, s + strlen(s)); }
+Bytes text(const char* s) {
+    return Bytes(s, s + strlen(s));
+}
 
 std::vector<std::pair<int, std::string>> linesOf(const LogCapture& log) {
     std::vector<std::pair<int, std::string>> out;
@@ -273,8 +279,7 @@ TEST(VcFile, LoadFromFile) {
     EXPECT_EQ(VCImage_loadFromFile(target, dir.path().c_str()), VC_ERROR_IO_FAILED);
     EXPECT_EQ(countErrors(log, "VC_ERROR_IO_FAILED", -8), 3);
     writeFile(dir.file("garbage.jpg"), text("not a picture at all"));
-    EXPECT_EQ(VCImage_loadFromFile(target, dir.file("garbage.jpg").c_str()),
-              VC_ERROR_CODEC_FAILED);
+    EXPECT_EQ(VCImage_loadFromFile(target, dir.file("garbage.jpg").c_str()), VC_ERROR_CODEC_FAILED);
     EXPECT_EQ(target->data, nullptr);
     EXPECT_FALSE(log.contains(VF_LOG_DEBUG, "Decoding as raw image: 0x0 'RGBA'"));
     log.clear();

@@ -19,13 +19,13 @@ using namespace jpegtest;
 
 namespace {
 
-#define REQUIRE_FAST_CODEC()                                                        \
-    do {                                                                            \
-        if (!fastCodecInstalled()) {                                                \
-            if (getenv("KIV_EXPECT_FAST_JPEG") != nullptr)                          \
-                FAIL() << "libkivjpeginterface.so should be on the library path";   \
-            GTEST_SKIP() << "libkivjpeginterface.so is not on the library path";    \
-        }                                                                           \
+#define REQUIRE_FAST_CODEC()                                                      \
+    do {                                                                          \
+        if (!fastCodecInstalled()) {                                              \
+            if (getenv("KIV_EXPECT_FAST_JPEG") != nullptr)                        \
+                FAIL() << "libkivjpeginterface.so should be on the library path"; \
+            GTEST_SKIP() << "libkivjpeginterface.so is not on the library path";  \
+        }                                                                         \
     } while (0)
 
 // The codec is opened per call and closed after it.
@@ -40,7 +40,8 @@ bool codecMapped() {
 JpegStandinHeader headerOf(const VCImage* jpeg) {
     JpegStandinHeader header;
     memset(&header, 0, sizeof(header));
-    if (jpeg != nullptr && jpeg->size >= sizeof(header)) memcpy(&header, jpeg->data, sizeof(header));
+    if (jpeg != nullptr && jpeg->size >= sizeof(header))
+        memcpy(&header, jpeg->data, sizeof(header));
     return header;
 }
 

@@ -15,10 +15,12 @@ using namespace jpegtest;
 
 namespace {
 
-#define REQUIRE_GENERAL_CODECS()                                                 \
+#define REQUIRE_GENERAL_CODECS() \
     if (fastCodecInstalled()) GTEST_SKIP() << "the fast codec is installed here"
 
-Bytes bytesOf(const VCImage* image) { return Bytes(image->data, image->data + image->size); }
+Bytes bytesOf(const VCImage* image) {
+    return Bytes(image->data, image->data + image->size);
+}
 
 // First entry of the luminance quantisation table: 16 scaled by libjpeg's quality curve.
 int lumaDcQuantizer(const Bytes& jpeg) {
@@ -57,7 +59,9 @@ Bytes encodeBytes(const VCImage* image, int quality) {
     return out;
 }
 
-int clamp255(int v) { return v < 0 ? 0 : (v > 255 ? 255 : v); }
+int clamp255(int v) {
+    return v < 0 ? 0 : (v > 255 ? 255 : v);
+}
 
 // Full-range equations of the image core.
 void rgbToYuv(const unsigned char* p, int* y, int* u, int* v) {
@@ -70,7 +74,8 @@ void yuvToRgb(int y, int u, int v, unsigned char* out) {
     double du = u - 128.0;
     double dv = v - 128.0;
     out[0] = static_cast<unsigned char>(clamp255(static_cast<int>(y + 1.402 * dv)));
-    out[1] = static_cast<unsigned char>(clamp255(static_cast<int>(y - 0.34414 * du - 0.71414 * dv)));
+    out[1] =
+        static_cast<unsigned char>(clamp255(static_cast<int>(y - 0.34414 * du - 0.71414 * dv)));
     out[2] = static_cast<unsigned char>(clamp255(static_cast<int>(y + 1.772 * du)));
 }
 
@@ -114,10 +119,22 @@ Bytes layout420(const YuvPicture& pic, uint32_t format, size_t chromaAt) {
     unsigned char* c = out.data() + chromaAt;
     for (size_t i = 0; i < quarter; ++i) {
         switch (format) {
-            case VC_FORMAT_NV21: c[2 * i] = pic.v[i]; c[2 * i + 1] = pic.u[i]; break;
-            case VC_FORMAT_NV12: c[2 * i] = pic.u[i]; c[2 * i + 1] = pic.v[i]; break;
-            case VC_FORMAT_YV12: c[i] = pic.v[i]; c[quarter + i] = pic.u[i]; break;
-            case VC_FORMAT_YUVP: c[i] = pic.u[i]; c[quarter + i] = pic.v[i]; break;
+            case VC_FORMAT_NV21:
+                c[2 * i] = pic.v[i];
+                c[2 * i + 1] = pic.u[i];
+                break;
+            case VC_FORMAT_NV12:
+                c[2 * i] = pic.u[i];
+                c[2 * i + 1] = pic.v[i];
+                break;
+            case VC_FORMAT_YV12:
+                c[i] = pic.v[i];
+                c[quarter + i] = pic.u[i];
+                break;
+            case VC_FORMAT_YUVP:
+                c[i] = pic.u[i];
+                c[quarter + i] = pic.v[i];
+                break;
         }
     }
     return out;
@@ -257,8 +274,8 @@ TEST(VcJpeg, DecodeIntoExistingBuffers) {
 
     // A wrapped buffer stays the caller's; its size field is its capacity.
     Bytes caller(64 * 48 * 4, 0);
-    VCImage* wrapped = VCImage_createWrap(caller.data(), 1, 1, VC_FORMAT_RGBA,
-                                          static_cast<int>(caller.size()), 0);
+    VCImage* wrapped =
+        VCImage_createWrap(caller.data(), 1, 1, VC_FORMAT_RGBA, static_cast<int>(caller.size()), 0);
     ASSERT_EQ(VCImage_decodeFromJpeg(wrapped, jpeg.data(), length), 0);
     EXPECT_EQ(wrapped->data, caller.data());
     EXPECT_EQ(wrapped->wrapped, 1);
@@ -357,9 +374,9 @@ TEST(VcJpeg, EncodesYuvPictures) {
         VCImage_destroy(other);
     }
     Bytes padded = layout420(pic, VC_FORMAT_NV21, luma + 256);
-    VCImage* displaced = VCImage_createWrap(padded.data(), w, h, VC_FORMAT_NV21,
-                                            static_cast<int>(padded.size()),
-                                            static_cast<uint32_t>(luma + 256));
+    VCImage* displaced =
+        VCImage_createWrap(padded.data(), w, h, VC_FORMAT_NV21, static_cast<int>(padded.size()),
+                           static_cast<uint32_t>(luma + 256));
     EXPECT_EQ(encodeBytes(displaced, 95), fromNv21);
     VCImage_destroy(displaced);
 

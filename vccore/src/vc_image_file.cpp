@@ -157,8 +157,8 @@ extern "C" int VCImage_loadFromFile(VCImage* image, const char* path) {
     // A picture the caller has described already: the file holds its raw
     // pixels (the length is deliberately not compared with the geometry).
     if (image->width >= 1 && image->height >= 1 && VCImage_size(image) != 0) {
-        VF_LogMsg(VF_LOG_DEBUG, "Decoding as raw image: %dx%d '%4.4s'", image->width,
-                  image->height, reinterpret_cast<const char*>(&image->format));
+        VF_LogMsg(VF_LOG_DEBUG, "Decoding as raw image: %dx%d '%4.4s'", image->width, image->height,
+                  reinterpret_cast<const char*>(&image->format));
         VCImage_deallocate(image);
         image->data = buffer;
         image->size = static_cast<uint32_t>(total);

@@ -156,8 +156,7 @@ extern "C" VCImage* VCImage_encodeToJpeg(const VCImage* image, int quality) {
 }
 
 extern "C" int VCImage_decodeFromJpeg(VCImage* image, const unsigned char* bytes, int length) {
-    if (image == nullptr || bytes == nullptr || length == 0)
-        return VC_REPORT(VC_ERROR_NULL_PARAM);
+    if (image == nullptr || bytes == nullptr || length == 0) return VC_REPORT(VC_ERROR_NULL_PARAM);
     if (length < 0) return VC_REPORT(VC_ERROR_INVALID_PARAM);
     if (image->format != 0 &&
         startsWith(bytes, static_cast<size_t>(length), kJpegStart, sizeof(kJpegStart)) &&

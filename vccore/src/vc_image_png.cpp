@@ -12,7 +12,9 @@
 
 namespace {
 
-[[noreturn]] void onPngError(png_structp png, png_const_charp) { png_longjmp(png, 1); }
+[[noreturn]] void onPngError(png_structp png, png_const_charp) {
+    png_longjmp(png, 1);
+}
 
 // Warnings (bad ancillary chunks and the like) do not stop a picture.
 void onPngWarning(png_structp, png_const_charp) {}
@@ -38,8 +40,8 @@ public:
         if (mPng != nullptr) mInfo = png_create_info_struct(mPng);
     }
     ~PngReader() override {
-        if (mPng != nullptr) png_destroy_read_struct(&mPng, mInfo != nullptr ? &mInfo : nullptr,
-                                                     nullptr);
+        if (mPng != nullptr)
+            png_destroy_read_struct(&mPng, mInfo != nullptr ? &mInfo : nullptr, nullptr);
         free(mRows);
     }
 
@@ -150,9 +152,8 @@ bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int
     state.png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
     if (state.png != nullptr) state.info = png_create_info_struct(state.png);
     if (state.row != nullptr && state.info != nullptr) state.file = fopen(path, "wb");
-    bool ok = state.file != nullptr &&
-              writeRows(&state, rgba, static_cast<png_uint_32>(width),
-                        static_cast<png_uint_32>(height));
+    bool ok = state.file != nullptr && writeRows(&state, rgba, static_cast<png_uint_32>(width),
+                                                 static_cast<png_uint_32>(height));
     if (state.file != nullptr) {
         if (fflush(state.file) != 0 || ferror(state.file)) ok = false;
         if (fclose(state.file) != 0) ok = false;

@@ -51,14 +51,22 @@ private:
 // TurboJPEG pixel format of an RGB-family or grey image, -1 otherwise.
 int turboPixelFormat(uint32_t format) {
     switch (format) {
-        case VC_FORMAT_RGBA: return TJPF_RGBA;
-        case VC_FORMAT_BGRA: return TJPF_BGRA;
-        case VC_FORMAT_ARGB: return TJPF_ARGB;
-        case VC_FORMAT_ABGR: return TJPF_ABGR;
-        case VC_FORMAT_RGB8: return TJPF_RGB;
-        case VC_FORMAT_BGR8: return TJPF_BGR;
-        case VC_FORMAT_GREY: return TJPF_GRAY;
-        default: return -1;
+        case VC_FORMAT_RGBA:
+            return TJPF_RGBA;
+        case VC_FORMAT_BGRA:
+            return TJPF_BGRA;
+        case VC_FORMAT_ARGB:
+            return TJPF_ARGB;
+        case VC_FORMAT_ABGR:
+            return TJPF_ABGR;
+        case VC_FORMAT_RGB8:
+            return TJPF_RGB;
+        case VC_FORMAT_BGR8:
+            return TJPF_BGR;
+        case VC_FORMAT_GREY:
+            return TJPF_GRAY;
+        default:
+            return -1;
     }
 }
 
@@ -121,8 +129,8 @@ int encode420(tjhandle turbo, const VCImage* image, int quality, Output* out) {
         planes[2] = split.data() + quarter;
     }
     out->reserve(w, h, TJSAMP_420);
-    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_420, &out->jpeg,
-                                   &out->size, quality, out->flags);
+    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_420, &out->jpeg, &out->size,
+                                   quality, out->flags);
 }
 
 // Packed 4:2:2 ("YUYV", "YVYU") is split into planes and encoded as 4:2:2.
@@ -146,8 +154,8 @@ int encode422(tjhandle turbo, const VCImage* image, int quality, Output* out) {
     }
     const unsigned char* planes[3] = {y, u, v};
     out->reserve(w, h, TJSAMP_422);
-    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_422, &out->jpeg,
-                                   &out->size, quality, out->flags);
+    return tjCompressFromYUVPlanes(turbo, planes, w, nullptr, h, TJSAMP_422, &out->jpeg, &out->size,
+                                   quality, out->flags);
 }
 
 }  // namespace
@@ -186,8 +194,10 @@ VCImage* VCJpeg_encode(const VCImage* image, int quality) {
         }
     }
     if (output.jpeg != nullptr) {
-        if (output.ours) free(output.jpeg);
-        else tjFree(output.jpeg);
+        if (output.ours)
+            free(output.jpeg);
+        else
+            tjFree(output.jpeg);
     }
     if (stream == nullptr) return nullptr;
     VCImage* out = VCImage_createEmpty(image->width, image->height, VC_FORMAT_JPEG);

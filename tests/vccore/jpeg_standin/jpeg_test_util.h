@@ -93,7 +93,9 @@ inline void writeFile(const std::string& path, const Bytes& bytes) {
     fclose(f);
 }
 
-inline bool fileExists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+inline bool fileExists(const std::string& path) {
+    return access(path.c_str(), F_OK) == 0;
+}
 
 // A PNG stream written directly with libpng. `rows` holds the samples as the
 // colour type and depth lay them out (16-bit samples big-endian).
@@ -124,8 +126,8 @@ inline Bytes makePng(const PngSpec& spec) {
     if (!spec.palette.empty())
         png_set_PLTE(png, info, spec.palette.data(), static_cast<int>(spec.palette.size()));
     if (!spec.paletteAlpha.empty())
-        png_set_tRNS(png, info, spec.paletteAlpha.data(), static_cast<int>(spec.paletteAlpha.size()),
-                     nullptr);
+        png_set_tRNS(png, info, spec.paletteAlpha.data(),
+                     static_cast<int>(spec.paletteAlpha.size()), nullptr);
     png_write_info(png, info);
     size_t stride = spec.samples.size() / spec.height;
     std::vector<png_bytep> rows(spec.height);
