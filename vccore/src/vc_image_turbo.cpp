@@ -84,6 +84,8 @@ struct Output {
     bool ours = false;
 
     void reserve(int width, int height, int subsampling) {
+        // tjBufSize computes in int: past 2^28 pixels TurboJPEG grows the buffer instead.
+        if (static_cast<uint64_t>(width) * static_cast<uint64_t>(height) > (1u << 28)) return;
         unsigned long capacity = tjBufSize(width, height, subsampling);
         if (capacity == static_cast<unsigned long>(-1)) return;
         jpeg = static_cast<unsigned char*>(malloc(capacity));
@@ -98,9 +100,9 @@ int encodePacked(tjhandle turbo, const VCImage* image, int pixelFormat, int qual
     if (!holds(image, VCImage_requiredSize(image->width, image->height, image->format))) return -1;
     int subsampling = pixelFormat == TJPF_GRAY ? TJSAMP_GRAY : VC_JPEG_SUBSAMPLING;
     out->reserve(image->width, image->height, subsampling);
-    return tjCompress2(turbo, image->data, image->width, image->width * tjPixelSize[pixelFormat],
-                       image->height, pixelFormat, &out->jpeg, &out->size, subsampling, quality,
-                       out->flags);
+    // Pitch 0: rows tightly packed, as in every record.
+    return tjCompress2(turbo, image->data, image->width, 0, image->height, pixelFormat, &out->jpeg,
+                       &out->size, subsampling, quality, out->flags);
 }
 
 // 4:2:0 pictures go to the encoder as planes, without a trip through RGB;
@@ -165,6 +167,8 @@ std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes,
 }
 
 VCImage* VCJpeg_encode(const VCImage* image, int quality) {
+    // A picture whose size the record cannot state is not taken.
+    if (VCImage_requiredSize(image->width, image->height, image->format) == 0) return nullptr;
     tjhandle turbo = tjInitCompress();
     if (turbo == nullptr) return nullptr;
     Output output;
