@@ -1,0 +1,325 @@
+// EglImage on real Mesa: the four kinds, their failures, what they leave
+// behind, and the GraphicBuffer writes (copy, conversion, YUV resize).
+#include "core/egl/EglImage.h"
+
+#include <gtest/gtest.h>
+#include <ui/GraphicBuffer.h>
+
+#include <vector>
+
+#include "core/egl/EglEnvironment.h"
+#include "support/gl_context.h"
+#include "support/log_capture.h"
+#include "vccore/vc_image.h"
+#include "vccore/vc_log.h"
+
+using android::sp;
+
+namespace {
+
+// Quadrants in GL rows: lower-left red, lower-right green, upper half blue.
+void renderQuadrants(int w, int h) {
+    glViewport(0, 0, w, h);
+    glEnable(GL_SCISSOR_TEST);
+    const struct {
+        int x, y, w, h;
+        float r, g, b;
+    } parts[] = {{0, 0, w / 2, h / 2, 1, 0, 0},
+                 {w / 2, 0, w - w / 2, h / 2, 0, 1, 0},
+                 {0, h / 2, w, h - h / 2, 0, 0, 1}};
+    for (const auto& p : parts) {
+        glScissor(p.x, p.y, p.w, p.h);
+        glClearColor(p.r, p.g, p.b, 1.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+    }
+    glDisable(GL_SCISSOR_TEST);
+}
+
+std::vector<uint8_t> expectedQuadrants(int w, int h) {
+    std::vector<uint8_t> pixels;
+    for (int y = 0; y < h; ++y) {
+        for (int x = 0; x < w; ++x) {
+            if (y >= h / 2) {
+                pixels.insert(pixels.end(), {0, 0, 255, 255});
+            } else if (x < w / 2) {
+                pixels.insert(pixels.end(), {255, 0, 0, 255});
+            } else {
+                pixels.insert(pixels.end(), {0, 255, 0, 255});
+            }
+        }
+    }
+    return pixels;
+}
+
+// Names 1..limit of each kind that are still live in the current context.
+int liveObjects(GLuint limit) {
+    int live = 0;
+    for (GLuint name = 1; name <= limit; ++name) {
+        live += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name);
+    }
+    return live;
+}
+
+VCImage* newImage(int w, int h, uint32_t format) {
+    VCImage* image = VCImage_createNew(w, h, format);
+    EXPECT_NE(image, nullptr);
+    return image;
+}
+
+TEST(EglImageStateTest, OperationsBeforeInitializeLogAndFail) {
+    sp<EglImage> image = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 4, 4);
+    LogCapture log;
+    EXPECT_NE(image->bindTexture(), 0);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: bindTexture mInitialized == false"));
+    EXPECT_NE(image->bindFrameBuffer(), 0);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: bindFrameBuffer mInitialized == false"));
+    log.clear();
+    EXPECT_EQ(image->getImageData(), nullptr);
+    EXPECT_NE(image->flushCache(), 0);
+    EXPECT_EQ(log.count("EGL: not initialized"), 2u);
+    EXPECT_EQ(image->getTextureID(), 0u);
+    EXPECT_EQ(image->onDrawFrame(), 0);
+    // No GL call was made: there is no context on this thread to make one.
+    EXPECT_EQ(eglGetCurrentContext(), EGL_NO_CONTEXT);
+}
+
+class EglImageTest : public GlContextTest {
+protected:
+    const sp<EglEnvironment>& env() { return mGl->env(); }
+};
+
+TEST_F(EglImageTest, TextureAndFramebufferKinds) {
+    const int w = 10;
+    const int h = 6;
+    sp<EglImage> texture = new EglImage(EglImage::IMAGE_TEXTURE, w, h);
+    ASSERT_EQ(texture->initialize(), 0);
+    ASSERT_NE(texture->getTextureID(), 0u);
+    EXPECT_EQ(texture->getImageData(), nullptr);
+    std::vector<uint8_t> pixels = expectedQuadrants(w, h);
+    ASSERT_EQ(texture->setImageData(pixels.data(), GL_CLAMP_TO_EDGE), 0);
+    GLint wrap = 0;
+    glGetTexParameteriv(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, &wrap);
+    EXPECT_EQ(wrap, GL_CLAMP_TO_EDGE);
+    // What was uploaded is what the texture holds.
+    GLuint probe = 0;
+    glGenFramebuffers(1, &probe);
+    glBindFramebuffer(GL_FRAMEBUFFER, probe);
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D,
+                           texture->getTextureID(), 0);
+    EXPECT_EQ(GlTest_readPixels(w, h), pixels);
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    glDeleteFramebuffers(1, &probe);
+    // A non-RGBA record cannot be uploaded as width x height RGBA.
+    VCImage* nv21 = newImage(w, h, VC_FORMAT_NV21);
+    EXPECT_EQ(texture->setImageData(*nv21, GL_CLAMP_TO_EDGE), VC_ERROR_INVALID_PARAM);
+    VCImage_destroy(nv21);
+
+    sp<EglImage> target = new EglImage(EglImage::IMAGE_FRAMEBUFFER, w, h);
+    ASSERT_EQ(target->initialize(), 0);
+    ASSERT_EQ(target->bindFrameBuffer(), 0);
+    renderQuadrants(w, h);
+    ASSERT_EQ(target->unbindFrameBuffer(), 0);
+    EXPECT_EQ(target->flushCache(), 0);
+    VCImage* read = target->getImageData();
+    ASSERT_NE(read, nullptr);
+    EXPECT_EQ(read->format, VC_FORMAT_RGBA);
+    EXPECT_EQ(std::vector<uint8_t>(read->data, read->data + w * h * 4), expectedQuadrants(w, h));
+    VCImage_destroy(read);
+    // The frame buffer's texture can be sampled.
+    EXPECT_EQ(target->bindTexture(), 0);
+    GLint bound = 0;
+    glGetIntegerv(GL_TEXTURE_BINDING_2D, &bound);
+    EXPECT_EQ((GLuint)bound, target->getTextureID());
+    EXPECT_EQ(target->unbindTexture(), 0);
+
+    texture->release();
+    target->release();
+    EXPECT_FALSE(target->isInitialized());
+    EXPECT_EQ(target->getTextureID(), 0u);
+    EXPECT_EQ(liveObjects(64), 0);
+}
+
+TEST_F(EglImageTest, GraphicBufferFramebufferRendersIntoCpuVisibleMemory) {
+    const int w = 16;
+    const int h = 8;
+    sp<EglImage> target =
+        new EglImage(env(), EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, w, h, (int)VC_FORMAT_RGBA);
+    LogCapture log;
+    ASSERT_EQ(target->initialize(), 0);
+    EXPECT_TRUE(log.contains("Successfully created texture for input: 16x8 RGBA"));
+    EXPECT_TRUE(
+        log.contains("EglImage: Creating GraphicBuffer 16x8 RGBA (format 1, usage 0x00000333)"));
+    EXPECT_NE(target->getRenderBufferID(), 0u);
+    EXPECT_NE(target->getFrameBufferID(), 0u);
+    EXPECT_EQ(target->getTextureID(), 0u);
+    ASSERT_NE(target->getGraphicBuffer(), nullptr);
+
+    EXPECT_EQ(target->flushCache(), 0);
+    ASSERT_EQ(target->bindFrameBuffer(), 0);
+    renderQuadrants(w, h);
+    target->unbindFrameBuffer();
+    VCImage* read = target->getImageData();
+    ASSERT_NE(read, nullptr);
+    EXPECT_EQ(read->wrapped, 1);  // the buffer's own memory
+    EXPECT_EQ(read->format, VC_FORMAT_RGBA);
+    EXPECT_EQ(std::vector<uint8_t>(read->data, read->data + w * h * 4), expectedQuadrants(w, h));
+    VCImage_destroy(read);
+
+    // Rendered again: the next read sees the new frame.
+    ASSERT_EQ(target->bindFrameBuffer(), 0);
+    glClearColor(1.0f, 1.0f, 1.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    target->unbindFrameBuffer();
+    EXPECT_EQ(target->flushCache(), 0);
+    read = target->getImageData();
+    ASSERT_NE(read, nullptr);
+    EXPECT_EQ(std::vector<uint8_t>(read->data, read->data + w * h * 4),
+              std::vector<uint8_t>(w * h * 4, 255));
+    VCImage_destroy(read);
+    target->release();
+    EXPECT_EQ(target->getGraphicBuffer(), nullptr);
+}
+
+TEST_F(EglImageTest, IncompleteFramebufferFailsAndLeavesNothing) {
+    sp<EglImage> image = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 0, 0);
+    LogCapture log;
+    EXPECT_EQ(image->initialize(), VC_ERROR_INVALID_STATE);
+    bool reported = false;
+    for (const std::string& line : log.texts()) {
+        reported |= line.rfind("VC_ERROR_INVALID_STATE (-7): core/egl/EglImage:", 0) == 0;
+    }
+    EXPECT_TRUE(reported);
+    EXPECT_EQ(image->getTextureID(), 0u);
+    EXPECT_EQ(image->getFrameBufferID(), 0u);
+    EXPECT_FALSE(image->isInitialized());
+    EXPECT_EQ(liveObjects(64), 0);
+    EXPECT_NE(image->bindFrameBuffer(), 0);
+}
+
+TEST_F(EglImageTest, RepeatedCreateReleaseLeavesNoGlObject) {
+    for (int round = 0; round < 8; ++round) {
+        sp<EglImage> images[] = {
+            new EglImage(EglImage::IMAGE_TEXTURE, 8, 8),
+            new EglImage(EglImage::IMAGE_FRAMEBUFFER, 8, 8),
+            new EglImage(env(), EglImage::IMAGE_EXTERNAL, 8, 8, (int)VC_FORMAT_NV21),
+            new EglImage(env(), EglImage::IMAGE_EXTERNAL, 8, 8, (int)VC_FORMAT_RGBA),
+            new EglImage(env(), EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, 8, 8, (int)VC_FORMAT_RGBA),
+        };
+        for (auto& image : images) ASSERT_EQ(image->initialize(), 0) << "round " << round;
+        EXPECT_GT(liveObjects(64), 0);
+        for (auto& image : images) image->release();
+        ASSERT_EQ(liveObjects(64), 0) << "round " << round;
+    }
+}
+
+TEST_F(EglImageTest, UnsupportedFormatsAreRefused) {
+    LogCapture log;
+    sp<EglImage> rgb = new EglImage(env(), EglImage::IMAGE_EXTERNAL, 8, 8, (int)VC_FORMAT_RGB8);
+    EXPECT_EQ(rgb->initialize(), VC_ERROR_UNSUPPORTED);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Unsupported format for the EglImage: RGB8"));
+    sp<EglImage> yuyv = new EglImage(env(), EglImage::IMAGE_EXTERNAL, 8, 8, (int)VC_FORMAT_YUYV);
+    EXPECT_EQ(yuyv->initialize(), VC_ERROR_UNSUPPORTED);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Unsupported format for the EgImage: YUYV"));
+    EXPECT_EQ(yuyv->getGraphicBuffer(), nullptr);
+    sp<EglImage> noEnv = new EglImage(EglImage::IMAGE_EXTERNAL, 8, 8);
+    EXPECT_NE(noEnv->initialize(), 0);
+    EXPECT_EQ(liveObjects(64), 0);
+}
+
+TEST_F(EglImageTest, WritesCopyConvertOrResizeIntoTheBuffer) {
+    // Same size and format: a copy.
+    sp<EglImage> rgba = new EglImage(env(), EglImage::IMAGE_EXTERNAL, 4, 2, (int)VC_FORMAT_RGBA);
+    ASSERT_EQ(rgba->initialize(), 0);
+    VCImage* source = newImage(4, 2, VC_FORMAT_RGBA);
+    for (int i = 0; i < 32; ++i) source->data[i] = (uint8_t)(i * 5);
+    ASSERT_EQ(rgba->setImageData(*source, GL_CLAMP_TO_EDGE), 0);
+    VCImage* read = rgba->getImageData();
+    ASSERT_NE(read, nullptr);
+    EXPECT_EQ(0, memcmp(read->data, source->data, 32));
+    VCImage_destroy(read);
+
+    // Same size, other format: converted into the buffer's NV21.
+    sp<EglImage> nv21 = new EglImage(env(), EglImage::IMAGE_EXTERNAL, 4, 2, (int)VC_FORMAT_NV21);
+    ASSERT_EQ(nv21->initialize(), 0);
+    ASSERT_EQ(nv21->setImageData(*source, GL_CLAMP_TO_EDGE), 0);
+    read = nv21->getImageData();
+    ASSERT_NE(read, nullptr);
+    EXPECT_EQ(read->format, VC_FORMAT_NV21);
+    for (int i = 0; i < 8; ++i) {
+        const uint8_t* p = source->data + i * 4;
+        int y = (19595 * p[0] + 38470 * p[1] + 7471 * p[2]) >> 16;
+        EXPECT_EQ(read->data[i], y) << "pixel " << i;
+    }
+    VCImage_destroy(read);
+    VCImage_destroy(source);
+
+    LogCapture log;
+    VCImage empty;
+    empty.width = 4;
+    empty.height = 2;
+    empty.format = VC_FORMAT_RGBA;
+    EXPECT_EQ(nv21->setImageData(empty, GL_CLAMP_TO_EDGE), VC_ERROR_NULL_PARAM);
+    nv21->release();
+    rgba->release();
+}
+
+TEST_F(EglImageTest, SmallerYuvIsResizedAndOtherSizesAreIncompatible) {
+    const int sw = 640;
+    const int sh = 480;
+    const int dw = 1280;
+    const int dh = 720;
+    sp<EglImage> image = new EglImage(env(), EglImage::IMAGE_EXTERNAL, dw, dh, (int)VC_FORMAT_NV21);
+    ASSERT_EQ(image->initialize(), 0);
+    VCImage* source = newImage(sw, sh, VC_FORMAT_NV21);
+    // Luma encodes the column, the V and U of each pair the row and column.
+    for (int y = 0; y < sh; ++y) {
+        for (int x = 0; x < sw; ++x) source->data[y * sw + x] = (uint8_t)(x * 7 + y * 3);
+    }
+    uint8_t* chroma = source->data + sw * sh;
+    for (int y = 0; y < sh / 2; ++y) {
+        for (int x = 0; x < sw / 2; ++x) {
+            chroma[y * sw + 2 * x] = (uint8_t)y;            // V
+            chroma[y * sw + 2 * x + 1] = (uint8_t)(x + 1);  // U
+        }
+    }
+    LogCapture log;
+    ASSERT_EQ(image->setImageData(*source, GL_CLAMP_TO_EDGE), 0);
+    EXPECT_TRUE(log.contains("doTransformResizeYUV E"));
+    EXPECT_TRUE(log.contains("doTransformResizeYUV X"));
+    VCImage* read = image->getImageData();
+    ASSERT_NE(read, nullptr);
+    ASSERT_EQ(read->width, dw);
+    // Each output sample comes from the source sample under its centre.
+    for (int y = 0; y < dh; y += 37) {
+        for (int x = 0; x < dw; x += 13) {
+            int sx = (int)((x + 0.5) * sw / dw);
+            int sy = (int)((y + 0.5) * sh / dh);
+            ASSERT_EQ(read->data[y * dw + x], source->data[sy * sw + sx]) << x << "," << y;
+        }
+    }
+    const uint8_t* outChroma = read->data + dw * dh;
+    for (int y = 0; y < dh / 2; y += 11) {
+        for (int x = 0; x < dw / 2; x += 7) {
+            int sx = (int)((x + 0.5) * (sw / 2) / (dw / 2));
+            int sy = (int)((y + 0.5) * (sh / 2) / (dh / 2));
+            ASSERT_EQ(outChroma[y * dw + 2 * x], (uint8_t)sy) << x << "," << y;
+            ASSERT_EQ(outChroma[y * dw + 2 * x + 1], (uint8_t)(sx + 1)) << x << "," << y;
+        }
+    }
+    VCImage_destroy(read);
+
+    VCImage* rgba = newImage(sw, sh, VC_FORMAT_RGBA);
+    log.clear();
+    EXPECT_EQ(image->setImageData(*rgba, GL_CLAMP_TO_EDGE), VC_ERROR_INVALID_PARAM);
+    EXPECT_TRUE(
+        log.contains(VF_LOG_ERROR, "Incompatible image : 640x480 'RGBA' --> 1280x720 'NV21'"));
+    // The failed write still gave the buffer back.
+    void* pixels = nullptr;
+    EXPECT_EQ(image->getGraphicBuffer()->lock(0x3, &pixels), android::NO_ERROR);
+    image->getGraphicBuffer()->unlock();
+    VCImage_destroy(rgba);
+    VCImage_destroy(source);
+    image->release();
+}
+
+}  // namespace
