@@ -2,6 +2,8 @@
 // buffers directly.
 #ifdef __ANDROID__
 
+#define EGL_EGLEXT_PROTOTYPES 1
+
 #include "core/egl/EglNativeSeam.h"
 
 #include <system/window.h>

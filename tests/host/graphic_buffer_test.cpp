@@ -10,6 +10,7 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
+#include "core/egl/EglWindowSurface.h"
 #include "support/gl_context.h"
 
 using android::GraphicBuffer;
@@ -98,13 +99,14 @@ TEST(GraphicBufferLayout, AllocationLocksAndPlanes) {
     void* pixels = nullptr;
     EXPECT_EQ(empty->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), android::NO_INIT);
 
-    EXPECT_EQ((new GraphicBuffer(7, 4, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage))->initCheck(),
-              android::BAD_VALUE);  // odd 4:2:0 width
-    EXPECT_EQ((new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGB_565, kTextureUsage))->initCheck(),
-              android::BAD_VALUE);
-    EXPECT_EQ(
-        (new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 6u, "t"))->initCheck(),
-        android::BAD_VALUE);  // stride below width
+    sp<GraphicBuffer> oddNv21 =
+        new GraphicBuffer(7, 4, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
+    EXPECT_EQ(oddNv21->initCheck(), android::BAD_VALUE);  // odd 4:2:0 width
+    sp<GraphicBuffer> rgb565 = new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGB_565, kTextureUsage);
+    EXPECT_EQ(rgb565->initCheck(), android::BAD_VALUE);
+    sp<GraphicBuffer> narrow =
+        new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 6u, "t");
+    EXPECT_EQ(narrow->initCheck(), android::BAD_VALUE);  // stride below width
 
     sp<GraphicBuffer> rgba =
         new GraphicBuffer(10, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 16u, "t");
@@ -298,7 +300,9 @@ TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDispl
     }
     // The fixture's environment ends (eglTerminate); the host context holds
     // its own reference on the display, so the mirror survives.
+    EGLDisplay first = display();
     mGl->release();
+    EXPECT_NE(eglQueryString(first, EGL_VENDOR), nullptr);  // still initialised
     GlContext again;
     ASSERT_TRUE(again.ok());
     BufferView view(again.env()->getEGLDisplay(), buffer);
@@ -306,6 +310,30 @@ TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDispl
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), std::vector<uint8_t>(w * h * 4, 77));
     EXPECT_EQ(buffer->getUploadCount(), 0u);  // the first write predates the mirror
+}
+
+TEST(HostEglDisplayTest, TerminationEndsTheDisplayOnlyWithItsLastUser) {
+    GlContext first;
+    ASSERT_TRUE(first.ok());
+    EGLDisplay display = first.env()->getEGLDisplay();
+    {
+        GlContext second;  // its own eglInitialize on the same display
+        ASSERT_TRUE(second.ok());
+        ASSERT_EQ(second.env()->getEGLDisplay(), display);
+        second.release();  // its eglTerminate
+    }
+    // The first environment's context still renders.
+    ASSERT_EQ(first.surface()->bindSurface(), 0);  // the second one unbound this thread
+    GlTarget target;
+    ASSERT_TRUE(GlTest_makeTarget(2, 2, &target));
+    glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    EXPECT_EQ(GlTest_readPixels(2, 2)[1], 255);
+    GlTest_deleteTarget(&target);
+    EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);
+    first.release();
+    // The last reference ends it.
+    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
 }
 
 }  // namespace
