@@ -9,8 +9,9 @@
 #include <utils/String8.h>
 #include <utils/TypeHelpers.h>
 
-// Which rows a catalog starts with. Any other value gives an empty catalog.
-enum BuiltInFitlerType {
+// Which rows a catalog starts with. Any other value gives an empty catalog
+// (hence the fixed underlying type: every int is a valid value).
+enum BuiltInFitlerType : int {
     // "package,library" names of the maker's own filter libraries (ids 501…508)
     BUILT_IN_FILTER_MORVANE = 0,
     // "package.library" names of outside vendors' libraries (ids 1…8)

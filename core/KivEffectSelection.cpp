@@ -22,7 +22,7 @@ void setStatus(int* status, int value) {
 
 KivFilter* KivSelectEffectByName(KivBuiltInFilterCatalog& catalog, KivFilter* current,
                                  const char* name, const KivEffectDetach& detach, int* status,
-                                 KivEffectSelectMode mode) {
+                                 KivEffectSelectMode mode, const KivEffectCreate& create) {
     if (name == nullptr) {
         setStatus(status, VC_REPORT(VC_ERROR_NULL_PARAM));
         return current;
@@ -54,9 +54,12 @@ KivFilter* KivSelectEffectByName(KivBuiltInFilterCatalog& catalog, KivFilter* cu
         if (detach) detach(current);
         delete current;
     }
-    KivFilter* effect = id != -1 ? KivFilter::create(id, nullptr)
-                                 : KivFilter::create(kDownloadableFilterId, const_cast<char*>(name));
-    if (effect == nullptr) effect = KivFilter::create(kFallbackEffectId, nullptr);
+    auto make = [&create](int effectId, void* arg) {
+        return create ? create(effectId, arg) : KivFilter::create(effectId, arg);
+    };
+    KivFilter* effect = id != -1 ? make(id, nullptr)
+                                 : make(kDownloadableFilterId, const_cast<char*>(name));
+    if (effect == nullptr) effect = make(kFallbackEffectId, nullptr);
     setStatus(status, effect != nullptr ? VC_OK : VC_REPORT(VC_ERROR_UNKNOWN));
     return effect;
 }

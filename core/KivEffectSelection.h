@@ -11,6 +11,9 @@ class KivFilter;
 // detaches it from whatever draws it (e.g. its EglProgram's setFilter(null)).
 typedef std::function<void(KivFilter* current)> KivEffectDetach;
 
+// Builds an effect by id; empty means KivFilter::create (the factory).
+typedef std::function<KivFilter*(int id, void* arg)> KivEffectCreate;
+
 enum KivEffectSelectMode {
     // Keep the current effect when it already is the requested one.
     KIV_SELECT_REUSE_LOADED = 0,
@@ -37,6 +40,7 @@ enum KivEffectSelectMode {
 KivFilter* KivSelectEffectByName(KivBuiltInFilterCatalog& catalog, KivFilter* current,
                                  const char* name, const KivEffectDetach& detach,
                                  int* status = nullptr,
-                                 KivEffectSelectMode mode = KIV_SELECT_REUSE_LOADED);
+                                 KivEffectSelectMode mode = KIV_SELECT_REUSE_LOADED,
+                                 const KivEffectCreate& create = nullptr);
 
 #endif
