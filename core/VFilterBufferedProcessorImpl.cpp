@@ -193,6 +193,8 @@ VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source
     program.setCameraGeometry(width, height, 0, 0);
     program.setPreviewGeometry(width, height, false);
     target.flushCache();
+    // flushCache() leaves the default framebuffer bound: draw into the target.
+    if (target.bindFrameBuffer() != 0) return nullptr;
     program.onDrawFrame();
     glFinish();
     // One texel read forces the draw to complete before the buffer is read.
