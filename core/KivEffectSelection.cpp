@@ -57,8 +57,8 @@ KivFilter* KivSelectEffectByName(KivBuiltInFilterCatalog& catalog, KivFilter* cu
     auto make = [&create](int effectId, void* arg) {
         return create ? create(effectId, arg) : KivFilter::create(effectId, arg);
     };
-    KivFilter* effect = id != -1 ? make(id, nullptr)
-                                 : make(kDownloadableFilterId, const_cast<char*>(name));
+    KivFilter* effect =
+        id != -1 ? make(id, nullptr) : make(kDownloadableFilterId, const_cast<char*>(name));
     if (effect == nullptr) effect = make(kFallbackEffectId, nullptr);
     setStatus(status, effect != nullptr ? VC_OK : VC_REPORT(VC_ERROR_UNKNOWN));
     return effect;

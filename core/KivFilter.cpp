@@ -139,19 +139,31 @@ int KivFilter::loadPartialFragmentShader(EglProgram&, const char*, unsigned int&
     return VC_ERROR_UNSUPPORTED;
 }
 
-int KivFilter::loadExtFragmentShader(EglProgram&) { return VC_ERROR_UNSUPPORTED; }
+int KivFilter::loadExtFragmentShader(EglProgram&) {
+    return VC_ERROR_UNSUPPORTED;
+}
 
-const char* KivFilter::getPkgAndFileName() { return nullptr; }
+const char* KivFilter::getPkgAndFileName() {
+    return nullptr;
+}
 
-int KivFilter::onDrawFrame(EglProgram&) { return VC_OK; }
+int KivFilter::onDrawFrame(EglProgram&) {
+    return VC_OK;
+}
 
 void KivFilter::onInputImageSet() {}
 
-int KivFilter::releaseGL(EglRecycler&) { return VC_OK; }
+int KivFilter::releaseGL(EglRecycler&) {
+    return VC_OK;
+}
 
-bool KivFilter::isGLPreviewSupported() { return true; }
+bool KivFilter::isGLPreviewSupported() {
+    return true;
+}
 
-bool KivFilter::isGLPictureSupported() { return true; }
+bool KivFilter::isGLPictureSupported() {
+    return true;
+}
 
 int KivFilter::getOptionsCount() const {
     const VCOption_t* const* options = listOptions();
@@ -162,13 +174,21 @@ int KivFilter::getOptionsCount() const {
     return count;
 }
 
-const char* const* KivFilter::listOptionNames() const { return nullptr; }
+const char* const* KivFilter::listOptionNames() const {
+    return nullptr;
+}
 
-const VCOption_t* const* KivFilter::listOptions() const { return nullptr; }
+const VCOption_t* const* KivFilter::listOptions() const {
+    return nullptr;
+}
 
-const VCOption_t* KivFilter::getOptionDesc(int) const { return nullptr; }
+const VCOption_t* KivFilter::getOptionDesc(int) const {
+    return nullptr;
+}
 
-const VCOption_t* KivFilter::getOptionDesc(const char*) const { return nullptr; }
+const VCOption_t* KivFilter::getOptionDesc(const char*) const {
+    return nullptr;
+}
 
 // By-id access resolves the process-wide key to its name and goes through
 // the by-name operation, so effects only implement names.
@@ -199,15 +219,23 @@ int KivFilter::setOption(int id, const char* value) {
     return setOption(name, value);
 }
 
-int KivFilter::setOption(const char*, int) { return 0; }
+int KivFilter::setOption(const char*, int) {
+    return 0;
+}
 
-int KivFilter::setOption(const char*, float) { return 0; }
+int KivFilter::setOption(const char*, float) {
+    return 0;
+}
 
-int KivFilter::setOption(const char*, const char*) { return 0; }
+int KivFilter::setOption(const char*, const char*) {
+    return 0;
+}
 
 void KivFilter::kivImagingSetCallback(KivFilterCallback, void*) {}
 
-VCOptionValue_t KivFilter::getOption(const char*) const { return noValue(); }
+VCOptionValue_t KivFilter::getOption(const char*) const {
+    return noValue();
+}
 
 VCOptionValue_t KivFilter::getOption(int id) const {
     const char* name = VCOption_FindNameById(static_cast<uint32_t>(id));
@@ -218,12 +246,18 @@ VCOptionValue_t KivFilter::getOption(int id) const {
     return getOption(name);
 }
 
-bool KivFilter::checkSupportFormat(int) const { return true; }
+bool KivFilter::checkSupportFormat(int) const {
+    return true;
+}
 
-bool KivFilter::needsWorkImage() const { return true; }
+bool KivFilter::needsWorkImage() const {
+    return true;
+}
 
 void KivFilter::onWorkImageChanged() {}
 
 void KivFilter::onInputFormatChanged() {}
 
-bool KivFilter::supportsValueFlag() const { return true; }
+bool KivFilter::supportsValueFlag() const {
+    return true;
+}

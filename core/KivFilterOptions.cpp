@@ -17,7 +17,9 @@ VCOption_t makeRecord(const char* name, VCOptionType_t type) {
 
 }  // namespace
 
-VCOption_t KivOption_string(const char* name) { return makeRecord(name, VCOPTION_TYPE_STRING); }
+VCOption_t KivOption_string(const char* name) {
+    return makeRecord(name, VCOPTION_TYPE_STRING);
+}
 
 VCOption_t KivOption_int(const char* name, int min, int max) {
     VCOption_t option = makeRecord(name, VCOPTION_TYPE_INTEGER);
@@ -58,7 +60,9 @@ void KivFilterOptionTable::registerOnce() {
     });
 }
 
-bool KivFilterOptionTable::isRegistered() const { return mRegistered; }
+bool KivFilterOptionTable::isRegistered() const {
+    return mRegistered;
+}
 
 const VCOption_t* KivFilterOptionTable::find(int id) const {
     for (size_t i = 0; i < mCount; ++i) {

@@ -78,7 +78,7 @@ public:
 private:
     VCOption_t* mRecords;
     size_t mCount;
-    std::vector<const char*> mNames;          // null-terminated
+    std::vector<const char*> mNames;           // null-terminated
     std::vector<const VCOption_t*> mPointers;  // null-terminated
     std::once_flag mRegisterOnce;
     std::atomic<bool> mRegistered{false};

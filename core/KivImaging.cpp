@@ -3,9 +3,13 @@
 // A null handle never reaches the effect: each entry answers with its neutral
 // value instead, so C callers can pass a failed create's result straight on.
 
-extern "C" KivFilter* KivImaging_create(int id, void* arg) { return KivFilter::create(id, arg); }
+extern "C" KivFilter* KivImaging_create(int id, void* arg) {
+    return KivFilter::create(id, arg);
+}
 
-extern "C" void KivImaging_destroy(KivFilter* filter) { delete filter; }
+extern "C" void KivImaging_destroy(KivFilter* filter) {
+    delete filter;
+}
 
 extern "C" const char* KivImaging_getPkgAndFileName(KivFilter* filter) {
     return filter->getPkgAndFileName();
@@ -114,8 +118,7 @@ extern "C" int KivImaging_setOptionByNameF(KivFilter* filter, const char* name, 
     return filter->setOption(name, value);
 }
 
-extern "C" int KivImaging_setOptionByNameS(KivFilter* filter, const char* name,
-                                           const char* value) {
+extern "C" int KivImaging_setOptionByNameS(KivFilter* filter, const char* name, const char* value) {
     if (filter == nullptr) return 0;
     return filter->setOption(name, value);
 }

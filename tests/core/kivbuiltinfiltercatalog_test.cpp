@@ -8,8 +8,8 @@
 
 namespace {
 
-const char* const kMorvaneLibraries[] = {"libfilm.so",   "libvivid.so",     "libcalm.so",
-                                         "libretro.so",  "libpastel.so",    "libgrayscale.so",
+const char* const kMorvaneLibraries[] = {"libfilm.so",      "libvivid.so",  "libcalm.so",
+                                         "libretro.so",     "libpastel.so", "libgrayscale.so",
                                          "libevergreen.so", "libdawn.so"};
 
 TEST(KivBuiltInFilterCatalog, MakerRows) {
@@ -30,8 +30,8 @@ TEST(KivBuiltInFilterCatalog, MakerRows) {
               -1);
     EXPECT_EQ(catalog->getBuiltInFilterId("com.morvane.android.provider.filterprovider,libfilm"),
               -1);
-    EXPECT_EQ(catalog->getBuiltInFilterId("com.morvane.android.provider.filterprovider,libfilm.so "),
-              -1);
+    EXPECT_EQ(
+        catalog->getBuiltInFilterId("com.morvane.android.provider.filterprovider,libfilm.so "), -1);
     EXPECT_EQ(catalog->getBuiltInFilterId("libfilm.so"), -1);
     EXPECT_EQ(catalog->getBuiltInFilterId(""), -1);
     EXPECT_EQ(catalog->getBuiltInFilterId(nullptr), -1);
@@ -41,17 +41,17 @@ TEST(KivBuiltInFilterCatalog, VendorRows) {
     android::sp<KivBuiltInFilterCatalog> catalog =
         new KivBuiltInFilterCatalog(BUILT_IN_FILTER_3RDPARTY);
     EXPECT_EQ(catalog->size(), 8u);
-    const char* const libraries[] = {"libriddle.so",    "libdelicious.so", "libgold.so",
-                                     "libsweet.so",     "libnostalgia.so", "librose.so",
-                                     "libmonogram.so",  "libeveryday.so"};
+    const char* const libraries[] = {"libriddle.so",   "libdelicious.so", "libgold.so",
+                                     "libsweet.so",    "libnostalgia.so", "librose.so",
+                                     "libmonogram.so", "libeveryday.so"};
     // Rows come in vendor pairs: the package of row 2k equals that of 2k+1
     // and differs from every other pair's.
     std::string packages[4];
     for (int vendor = 0; vendor < 4; ++vendor) {
-        for (const std::string& candidate :
-             {std::string("com.example.filtervendor.alpha"), std::string("com.example.filtervendor.bravo"),
-              std::string("com.example.filtervendor.charlie"),
-              std::string("com.example.filtervendor.delta")}) {
+        for (const std::string& candidate : {std::string("com.example.filtervendor.alpha"),
+                                             std::string("com.example.filtervendor.bravo"),
+                                             std::string("com.example.filtervendor.charlie"),
+                                             std::string("com.example.filtervendor.delta")}) {
             if (catalog->getBuiltInFilterId((candidate + "." + libraries[2 * vendor]).c_str()) ==
                 2 * vendor + 1) {
                 packages[vendor] = candidate;
@@ -62,13 +62,12 @@ TEST(KivBuiltInFilterCatalog, VendorRows) {
                       (packages[vendor] + "." + libraries[2 * vendor + 1]).c_str()),
                   2 * vendor + 2);
         // The comma form belongs to the maker catalog only.
-        EXPECT_EQ(catalog->getBuiltInFilterId(
-                      (packages[vendor] + "," + libraries[2 * vendor]).c_str()),
-                  -1);
+        EXPECT_EQ(
+            catalog->getBuiltInFilterId((packages[vendor] + "," + libraries[2 * vendor]).c_str()),
+            -1);
         for (int other = 0; other < vendor; ++other) EXPECT_NE(packages[other], packages[vendor]);
     }
-    EXPECT_EQ(catalog->getBuiltInFilterId(
-                  "com.morvane.android.provider.filterprovider,libfilm.so"),
+    EXPECT_EQ(catalog->getBuiltInFilterId("com.morvane.android.provider.filterprovider,libfilm.so"),
               -1);
 }
 
@@ -77,9 +76,9 @@ TEST(KivBuiltInFilterCatalog, OtherTypesStartEmpty) {
         android::sp<KivBuiltInFilterCatalog> catalog = new KivBuiltInFilterCatalog(type);
         EXPECT_EQ(catalog->size(), 0u) << type;
         EXPECT_EQ(catalog->getType(), static_cast<BuiltInFitlerType>(type));
-        EXPECT_EQ(catalog->getBuiltInFilterId(
-                      "com.morvane.android.provider.filterprovider,libfilm.so"),
-                  -1);
+        EXPECT_EQ(
+            catalog->getBuiltInFilterId("com.morvane.android.provider.filterprovider,libfilm.so"),
+            -1);
         EXPECT_EQ(catalog->getBuiltInFilterId("com.example.filtervendor.alpha.libriddle.so"), -1);
     }
 }

@@ -76,9 +76,9 @@ TEST_F(KivEffectSelectionTest, CataloguedNameKeepsOrReplaces) {
                                              KIV_SELECT_REUSE_LOADED, factory.creator());
     EXPECT_EQ(again, effect);
     EXPECT_EQ(status, 0);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
-                             std::string("The effect is already loaded. filename = ") + kFilm +
-                                 ", getFilterType() = 501"));
+    EXPECT_TRUE(
+        log.contains(VF_LOG_ERROR, std::string("The effect is already loaded. filename = ") +
+                                       kFilm + ", getFilterType() = 501"));
     EXPECT_EQ(factory.requested.size(), 1u);
     EXPECT_TRUE(detacher.detached.empty());
 
@@ -101,14 +101,14 @@ TEST_F(KivEffectSelectionTest, ReportedTypeDecidesNotTheClass) {
     ASSERT_TRUE(catalog->addBuiltInFilter("vendor,libwarm.so", 432));
     ASSERT_TRUE(catalog->addBuiltInFilter("vendor,libbright.so", 431));
     KivFilter* brightness = new ProbeEffect(432);
-    KivFilter* kept = KivSelectEffectByName(*catalog, brightness, "vendor,libwarm.so",
-                                            detacher.fn(), nullptr, KIV_SELECT_REUSE_LOADED,
-                                            factory.creator());
+    KivFilter* kept =
+        KivSelectEffectByName(*catalog, brightness, "vendor,libwarm.so", detacher.fn(), nullptr,
+                              KIV_SELECT_REUSE_LOADED, factory.creator());
     EXPECT_EQ(kept, brightness);
     // … and never what is catalogued as 431.
-    KivFilter* rebuilt = KivSelectEffectByName(*catalog, brightness, "vendor,libbright.so",
-                                               detacher.fn(), nullptr, KIV_SELECT_REUSE_LOADED,
-                                               factory.creator());
+    KivFilter* rebuilt =
+        KivSelectEffectByName(*catalog, brightness, "vendor,libbright.so", detacher.fn(), nullptr,
+                              KIV_SELECT_REUSE_LOADED, factory.creator());
     // (The new effect may reuse the old one's address, so count calls instead.)
     ASSERT_NE(rebuilt, nullptr);
     EXPECT_EQ(factory.requested, std::vector<int>{431});
@@ -130,15 +130,14 @@ TEST_F(KivEffectSelectionTest, UnknownNameGoesDownloadableThenFallback) {
     KivFilter* kept = KivSelectEffectByName(*catalog, effect, kDownloaded, detacher.fn(), &status,
                                             KIV_SELECT_REUSE_LOADED, factory.creator());
     EXPECT_EQ(kept, effect);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
-                             std::string("The effect is already loaded. filename = ") +
-                                 kDownloaded + ", getPkgAndName() = " +
-                                 FakeFactory::kDownloadedWithSuffix));
+    EXPECT_TRUE(log.contains(
+        VF_LOG_ERROR, std::string("The effect is already loaded. filename = ") + kDownloaded +
+                          ", getPkgAndName() = " + FakeFactory::kDownloadedWithSuffix));
     // A longer name than the loaded one, or a different one, is not a prefix match.
     factory.failing = {2000};
-    KivFilter* fallback = KivSelectEffectByName(
-        *catalog, effect, "com.example.shop,libsparkle.so#v2-extra", detacher.fn(), &status,
-        KIV_SELECT_REUSE_LOADED, factory.creator());
+    KivFilter* fallback =
+        KivSelectEffectByName(*catalog, effect, "com.example.shop,libsparkle.so#v2-extra",
+                              detacher.fn(), &status, KIV_SELECT_REUSE_LOADED, factory.creator());
     ASSERT_NE(fallback, nullptr);
     EXPECT_EQ(status, 0);
     EXPECT_EQ(fallback->getFilterType(), 400);
@@ -153,8 +152,8 @@ TEST_F(KivEffectSelectionTest, CataloguedFailureFallsBackAndNothingLeft) {
     KivFilter* current = new ProbeEffect(401);
     int status = 99;
     KivFilter* effect = KivSelectEffectByName(
-        *catalog, current, "com.morvane.android.provider.filterprovider,libcalm.so",
-        detacher.fn(), &status, KIV_SELECT_REUSE_LOADED, factory.creator());
+        *catalog, current, "com.morvane.android.provider.filterprovider,libcalm.so", detacher.fn(),
+        &status, KIV_SELECT_REUSE_LOADED, factory.creator());
     ASSERT_NE(effect, nullptr);
     EXPECT_EQ(effect->getFilterType(), 400);
     EXPECT_EQ(factory.requested, (std::vector<int>{503, 400}));

@@ -11,7 +11,9 @@
 
 namespace {
 
-KivFilter* handle(ProbeEffect& effect) { return &effect; }
+KivFilter* handle(ProbeEffect& effect) {
+    return &effect;
+}
 
 // Error lines carry the line number of the report, which moves with edits;
 // the name, code and source file are what matter.

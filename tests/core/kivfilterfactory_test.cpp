@@ -19,20 +19,27 @@ namespace {
 // differs from the id it does so on purpose: processors compare it with the
 // requested id to decide whether an effect is already loaded.
 const std::map<int, int> kReportedType = {
-    {200, 200}, {201, 201}, {202, 202}, {204, 204}, {206, 206},
-    {208, 208}, {209, 209}, {210, 210}, {212, -1318387531 /* 0xB16B00B5 */},
-    {213, 213}, {400, 400}, {401, 401}, {402, 402}, {403, 403}, {406, 406},
-    {408, 408}, {410, 410}, {411, 411}, {412, 412}, {414, 414}, {415, 415},
-    {416, 416}, {417, 417}, {422, 422}, {425, 425}, {426, 426}, {427, 427},
-    {428, 428}, {429, 429}, {430, 430}, {431, 432}, {432, 432}, {433, 433},
-    {434, 434}, {435, 425}, {436, 436}, {440, 440}, {441, 441}, {442, 442},
-    {443, 443}, {444, 444}, {445, 445}, {446, 446}, {447, 447},
+    {200, 200}, {201, 201}, {202, 202},
+    {204, 204}, {206, 206}, {208, 208},
+    {209, 209}, {210, 210}, {212, -1318387531 /* 0xB16B00B5 */},
+    {213, 213}, {400, 400}, {401, 401},
+    {402, 402}, {403, 403}, {406, 406},
+    {408, 408}, {410, 410}, {411, 411},
+    {412, 412}, {414, 414}, {415, 415},
+    {416, 416}, {417, 417}, {422, 422},
+    {425, 425}, {426, 426}, {427, 427},
+    {428, 428}, {429, 429}, {430, 430},
+    {431, 432}, {432, 432}, {433, 433},
+    {434, 434}, {435, 425}, {436, 436},
+    {440, 440}, {441, 441}, {442, 442},
+    {443, 443}, {444, 444}, {445, 445},
+    {446, 446}, {447, 447},
 };
 
 TEST(KivFilterFactory, IdsWithoutAnEffectYieldNull) {
     LogCapture log;
-    for (int id : {-1, 0, 1, 199, 203, 205, 207, 211, 214, 399, 404, 405, 407, 409, 413, 418, 419,
-                   420, 421, 423, 424, 437, 438, 439, 448, 499, 509, 510, 1999, 2001}) {
+    for (int id : {-1,  0,   1,   199, 203, 205, 207, 211, 214, 399, 404, 405, 407, 409,  413,
+                   418, 419, 420, 421, 423, 424, 437, 438, 439, 448, 499, 509, 510, 1999, 2001}) {
         std::unique_ptr<KivFilter> f(KivFilter::create(id, nullptr));
         EXPECT_EQ(f, nullptr) << id;
         char line[64];
@@ -63,8 +70,12 @@ TEST(KivFilterFactory, ServedIdsReportTheirType) {
     if (served == 0) GTEST_SKIP() << "no effect class is in the factory table yet";
 }
 
-KivFilter* makeProbe(int id, void*) { return new ProbeEffect(id); }
-KivFilter* makeMismatched(int, void*) { return new ProbeEffect(432); }
+KivFilter* makeProbe(int id, void*) {
+    return new ProbeEffect(id);
+}
+KivFilter* makeMismatched(int, void*) {
+    return new ProbeEffect(432);
+}
 KivFilter* makeNamed(int id, void* arg) {
     return new ProbeEffect(id, static_cast<const char*>(arg));
 }

@@ -91,7 +91,7 @@ TEST(KivFilterOptions, SameNameAndTypeShareOneKey) {
     const VCOption_t* b = one.getOptionDesc("parameter");
     ASSERT_NE(a, nullptr);
     ASSERT_NE(b, nullptr);
-    EXPECT_NE(a, b);  // two records …
+    EXPECT_NE(a, b);            // two records …
     EXPECT_EQ(a->key, b->key);  // … one key
     EXPECT_EQ(KivImaging_getOptionsCount(&one), 1);
     // Either effect finds its own record by the shared key.

@@ -6,8 +6,8 @@
 #include "core/KivImaging.h"
 #include "vccore/vc_image.h"
 
-#define CHECK(cond)              \
-    do {                         \
+#define CHECK(cond)                   \
+    do {                              \
         if (!(cond)) return __LINE__; \
     } while (0)
 

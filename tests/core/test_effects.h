@@ -100,7 +100,8 @@ inline int TwoOptionEffect::setOption(const char* name, int value) {
 
 inline VCOptionValue_t TwoOptionEffect::getOption(const char* name) const {
     const VCOption_t* option = matchOption(name);
-    if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER) return KivFilter::getOption(name);
+    if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER)
+        return KivFilter::getOption(name);
     VCOptionValue_t value{};
     value.type = VCOPTION_TYPE_INTEGER;
     value.value.i = level;
