@@ -76,6 +76,7 @@ public:
     }
 
     bool readRgba(unsigned char* rgba) override {
+        free(mRows);
         mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * mHeight));
         if (mRows == nullptr) return false;
         size_t stride = static_cast<size_t>(mWidth) * 4;
