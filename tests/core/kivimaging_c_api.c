@@ -52,23 +52,3 @@ int kivtest_c_null_handles(void) {
     CHECK(KivImaging_create(-1, NULL) == NULL);
     return 0;
 }
-
-/* Drives an effect made by the C++ side: images, values, init, release. */
-int kivtest_c_drive(KivFilter* filter, int expectedType) {
-    unsigned char in[8 * 2 * 4];
-    unsigned char out[8 * 2 * 4];
-
-    CHECK(KivImaging_getValue(filter, 105, 0) == expectedType);
-    CHECK(KivImaging_init(filter) == -1);
-    CHECK(KivImaging_setInputImage(filter, in, 8, 2, (int)VC_FORMAT_RGBA, 0) == 0);
-    CHECK(KivImaging_setOutputImage(filter, out, 2, 8, (int)VC_FORMAT_RGBA, 0) == -4);
-    CHECK(KivImaging_setOutputImage(filter, out, 8, 2, (int)VC_FORMAT_RGBA, 0) == 0);
-    CHECK(KivImaging_getValue(filter, 102, 0) == 8);
-    CHECK(KivImaging_getValue(filter, 103, 0) == 2);
-    CHECK(KivImaging_init(filter) == 0);
-    CHECK(KivImaging_setValue(filter, 111, 1) == 0);
-    CHECK(KivImaging_getValue(filter, 111, 5) == 1);
-    CHECK(KivImaging_release(filter) == 0);
-    CHECK(KivImaging_getPkgAndFileName(filter) == NULL);
-    return 0;
-}

@@ -10,37 +10,12 @@
 #include "vccore/vc_log.h"
 
 extern "C" int kivtest_c_null_handles(void);
-extern "C" int kivtest_c_drive(KivFilter* filter, int expectedType);
 
 namespace {
 
 TEST(KivImagingCApi, NullHandlesFromC) {
     LogCapture log;  // keeps the factory's debug lines out of the output
     EXPECT_EQ(kivtest_c_null_handles(), 0) << "failed check at kivimaging_c_api.c line shown";
-}
-
-TEST(KivImagingCApi, DriveEffectFromC) {
-    ProbeEffect* effect = new ProbeEffect(440);
-    LogCapture log;
-    EXPECT_EQ(kivtest_c_drive(effect, 440), 0) << "failed check at kivimaging_c_api.c line shown";
-    // What the C side did is visible on the object: released working image,
-    // wrappers still in place, flag set.
-    EXPECT_EQ(effect->workImage(), nullptr);
-    EXPECT_EQ(effect->workChangedCalls, 2);  // made by init, dropped by release
-    ASSERT_NE(effect->outputImage(), nullptr);
-    EXPECT_EQ(effect->outputImage()->width, 8);
-    EXPECT_EQ(effect->getValue(111, 0), 1);
-    int live = ProbeEffect::sLive;
-    KivImaging_destroy(effect);
-    EXPECT_EQ(ProbeEffect::sLive, live - 1);
-}
-
-TEST(KivImagingCApi, CreateLogsTheRequest) {
-    LogCapture log;
-    KivFilter* f = KivImaging_create(203, nullptr);
-    EXPECT_EQ(f, nullptr);
-    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "Trying to instantiate effect 203"));
-    EXPECT_EQ(log.count("Trying to instantiate effect 203"), 1u);
 }
 
 struct Received {
