@@ -11,7 +11,6 @@
 #include "core/KivFilter.h"
 extern "C" {
 #else
-#include <stdbool.h>
 typedef struct KivFilter KivFilter;
 typedef void (*KivFilterCallback)(const char* message, void* context);
 #endif
