@@ -64,6 +64,8 @@ VFilterBufferedProcessorImpl::VFilterBufferedProcessorImpl()
 
 VFilterBufferedProcessorImpl::~VFilterBufferedProcessorImpl() {
     // GL objects were released by release(); only references are dropped here.
+    // The effect holds no GL object of its own once its program is gone.
+    deleteEffect();
     mCatalog.clear();
     mProgram.clear();
     mSurface.clear();
@@ -257,6 +259,7 @@ int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char* input, int 
     }
     if (rgba == nullptr) {
         destroyImage(wrapped);
+        unbindGLEnvironment();
         return 0;
     }
 

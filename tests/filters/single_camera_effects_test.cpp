@@ -94,32 +94,12 @@ Rendered renderWithProgram(KivFilter* effect, const lookref::Picture& picture) {
 // black, white and grey patches of the test picture sit on level boundaries).
 void expectMatches(int look, const lookref::Picture& picture, const std::vector<uint8_t>& actual,
                    int tolerance) {
-    std::vector<bool> nearThreshold;
-    std::vector<uint8_t> expected = lookref::render(look, picture, &nearThreshold);
-    ASSERT_EQ(expected.size(), actual.size()) << "look " << look;
-    size_t skipped = 0, bad = 0;
-    std::string firstBad;
-    for (size_t i = 0; i < nearThreshold.size(); ++i) {
-        if (nearThreshold[i]) {
-            ++skipped;
-            continue;
-        }
-        for (int ch = 0; ch < 4; ++ch) {
-            int d = std::abs(int(expected[i * 4 + ch]) - int(actual[i * 4 + ch]));
-            if (d > tolerance) {
-                if (bad++ == 0) {
-                    firstBad = "pixel " + std::to_string(i % picture.width()) + "," +
-                               std::to_string(i / picture.width()) + " ch " + std::to_string(ch) +
-                               " expected " + std::to_string(expected[i * 4 + ch]) + " got " +
-                               std::to_string(actual[i * 4 + ch]);
-                }
-                break;
-            }
-        }
-    }
-    EXPECT_EQ(0u, bad) << "look " << look << ": " << bad << " pixels off, first " << firstBad;
-    EXPECT_LT(skipped * 8, nearThreshold.size())
-        << "look " << look << ": too many ambiguous pixels";
+    ASSERT_EQ(size_t(picture.width()) * picture.height() * 4, actual.size()) << "look " << look;
+    size_t skipped = 0;
+    std::string first;
+    EXPECT_EQ(0u, lookref::compare(look, picture, actual.data(), tolerance, &skipped, &first))
+        << "look " << look << ", first bad pixel " << first;
+    EXPECT_LT(skipped * 8, actual.size() / 4) << "look " << look << ": too many ambiguous pixels";
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdlib>
 #include <utility>
 
 namespace lookref {
@@ -13,20 +14,26 @@ namespace {
 // rounding differs from ours).
 constexpr float kThresholdMargin = 0.004f;
 
-float clamp01(float v) { return std::min(std::max(v, 0.0f), 1.0f); }
+float clamp01(float v) {
+    return std::min(std::max(v, 0.0f), 1.0f);
+}
 
 float smoothstep(float e0, float e1, float x) {
     float t = clamp01((x - e0) / (e1 - e0));
     return t * t * (3.0f - 2.0f * t);
 }
 
-float luma(const float c[4]) { return 0.299f * c[0] + 0.587f * c[1] + 0.114f * c[2]; }
+float luma(const float c[4]) {
+    return 0.299f * c[0] + 0.587f * c[1] + 0.114f * c[2];
+}
 
 float distanceTo(float s, float t, float cs, float ct) {
     return std::sqrt((s - cs) * (s - cs) + (t - ct) * (t - ct));
 }
 
-bool near(float v, float threshold) { return std::fabs(v - threshold) < kThresholdMargin; }
+bool near(float v, float threshold) {
+    return std::fabs(v - threshold) < kThresholdMargin;
+}
 
 // Near a step of floor(y * levels)?
 bool nearLevel(float y, float levels) {
@@ -217,6 +224,31 @@ std::vector<uint8_t> render(int look, const Picture& p, std::vector<bool>* nearT
         }
     }
     return out;
+}
+
+size_t compare(int look, const Picture& picture, const uint8_t* actual, int tolerance,
+               size_t* skipped, std::string* firstBad) {
+    std::vector<bool> nearThreshold;
+    std::vector<uint8_t> expected = render(look, picture, &nearThreshold);
+    size_t bad = 0, near = 0;
+    for (size_t i = 0; i < nearThreshold.size(); ++i) {
+        if (nearThreshold[i]) {
+            ++near;
+            continue;
+        }
+        for (int ch = 0; ch < 4; ++ch) {
+            int want = expected[i * 4 + ch], got = actual[i * 4 + ch];
+            if (std::abs(want - got) <= tolerance) continue;
+            if (bad++ == 0 && firstBad != nullptr) {
+                *firstBad = std::to_string(i % picture.width()) + "," +
+                            std::to_string(i / picture.width()) + " ch" + std::to_string(ch) +
+                            " want " + std::to_string(want) + " got " + std::to_string(got);
+            }
+            break;
+        }
+    }
+    if (skipped != nullptr) *skipped = near;
+    return bad;
 }
 
 std::vector<uint8_t> makeTestPicture(int width, int height, bool opaque) {

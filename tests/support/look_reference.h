@@ -7,6 +7,7 @@
 
 #include <stdint.h>
 
+#include <string>
 #include <vector>
 
 namespace lookref {
@@ -51,6 +52,12 @@ Expected evaluate(int look, const Picture& picture, int x, int y);
 // Expected RGBA8 target content (clamped and rounded) and, per pixel, whether
 // it is near a threshold.
 std::vector<uint8_t> render(int look, const Picture& picture, std::vector<bool>* nearThreshold);
+
+// Compares an RGBA8 result with render()'s expectation within `tolerance` per
+// channel, skipping pixels near a threshold. Returns the number of pixels off
+// and sets `skipped` (may be null) and `firstBad` ("x,y chN want A got B").
+size_t compare(int look, const Picture& picture, const uint8_t* actual, int tolerance,
+               size_t* skipped, std::string* firstBad);
 
 // Deterministic test picture: smooth gradients with sharp-edged blocks and a
 // few flat patches, alpha varying unless opaque.
