@@ -127,6 +127,7 @@ TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
     EXPECT_EQ(0, p.setEffect(401));
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(401, p.getEffect()->getFilterType());
+    EXPECT_TRUE(log.contains(1, "virtual int VFilterBufferedProcessorImpl::setEffect(int) : 401"));
     for (int unknown : {-1, 0, 404, 509, 1999, 123456}) {
         EXPECT_EQ(0, p.setEffect(unknown));
         ASSERT_NE(nullptr, p.getEffect());
@@ -135,16 +136,31 @@ TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
     EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(400, p.getEffect()->getFilterType());
+    // A built-in library name goes to its effect id, anything else to a
+    // downloadable filter first; here neither exists, so 400 follows.
+    auto attempts = [&log]() {
+        std::vector<std::string> ids;
+        for (const std::string& l : log.texts())
+            if (l.rfind("Trying to instantiate effect ", 0) == 0) ids.push_back(l.substr(29));
+        return ids;
+    };
+    log.clear();
+    EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
+    EXPECT_EQ((std::vector<std::string>{"2000", "400"}), attempts());
+    log.clear();
+    EXPECT_EQ(0, p.setEffect("com.morvane.android.provider.filterprovider,libfilm.so"));
+    std::vector<std::string> tried = attempts();
+    ASSERT_FALSE(tried.empty());
+    EXPECT_EQ("501", tried[0]);
     EXPECT_EQ(0, p.setEffect(static_cast<const char*>(nullptr)));
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(400, p.getEffect()->getFilterType());
     EXPECT_EQ(0, p.setEffect(443));
     EXPECT_EQ(0, p.setEffectParameter("intensity=3"));
     EXPECT_EQ(443, p.getEffect()->getFilterType());
-    EXPECT_TRUE(log.contains(1, "virtual int VFilterBufferedProcessorImpl::setEffect(int) : 401"));
     EXPECT_TRUE(log.contains(1,
                              "virtual int VFilterBufferedProcessorImpl::setEffect(const char*) "
-                             ": no.such.package,libnothing.so"));
+                             ": com.morvane.android.provider.filterprovider,libfilm.so"));
     EXPECT_TRUE(log.contains(1,
                              "virtual int VFilterBufferedProcessorImpl::setEffectParameter("
                              "const char*) : intensity=3"));
