@@ -292,6 +292,12 @@ TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
     EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
     EXPECT_EQ(std::vector<uint8_t>(size_t(w) * 4, 0xC3), out);
     EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
+    // Empty and negative sizes: nothing drawn, nothing written, no crash.
+    std::vector<uint8_t> guard(64, 0xC3);
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), 0, 0, guard.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), -4, 2, guard.data(), VC_FORMAT_BGRA));
+    EXPECT_EQ(-7, mProcessor->doProcessNV21(in.data(), -3, 5, guard.data()));
+    EXPECT_EQ(std::vector<uint8_t>(64, 0xC3), guard);
     // The processor is still usable afterwards.
     std::vector<uint8_t> small(4 * 4 * 4, 10), smallOut(4 * 4 * 4);
     EXPECT_EQ(0, mProcessor->doProcessRGBA(small.data(), 4, 4, smallOut.data(), VC_FORMAT_RGBA));
