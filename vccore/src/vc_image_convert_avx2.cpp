@@ -35,8 +35,40 @@ struct Avx2 {
     static V srai32(V a, int n) { return _mm256_srai_epi32(a, n); }
     static V slli32(V a, int n) { return _mm256_slli_epi32(a, n); }
     static V slli16(V a, int n) { return _mm256_slli_epi16(a, n); }
-    static V srl32(V a, int n) { return _mm256_srl_epi32(a, _mm_cvtsi32_si128(n)); }
-    static V sll32(V a, int n) { return _mm256_sll_epi32(a, _mm_cvtsi32_si128(n)); }
+    static V srli32(V a, int n) { return _mm256_srli_epi32(a, n); }
+    // Byte moves inside every 4-byte pixel: one byte shuffle.
+    using Shuffle = V;
+    static Shuffle makeShuffle(int f0, int f1, int f2, int f3) {
+        alignas(32) int8_t mask[32];
+        const int from[4] = {f0, f1, f2, f3};
+        for (int i = 0; i < 32; ++i) mask[i] = static_cast<int8_t>((i % 16) / 4 * 4 + from[i % 4]);
+        return _mm256_load_si256(reinterpret_cast<const V*>(mask));
+    }
+    static V shuffle(V p, const Shuffle& s) { return _mm256_shuffle_epi8(p, s); }
+    static V srli16(V a, int n) { return _mm256_srli_epi16(a, n); }
+    static V min16(V a, V b) { return _mm256_min_epi16(a, b); }
+    static V max16(V a, V b) { return _mm256_max_epi16(a, b); }
+    static V unpacklo32(V a, V b) { return _mm256_unpacklo_epi32(a, b); }
+    static V unpackhi32(V a, V b) { return _mm256_unpackhi_epi32(a, b); }
+    static V combineEven(V a, V b) { return _mm256_blend_epi32(a, _mm256_slli_epi64(b, 32), 0xAA); }
+    // Words of four 8-pixel vectors a..d, lane 0: a0 b0 a2 b2 c0 d0 c2 d2,
+    // lane 1: a4 b4 a6 b6 c4 d4 c6 d6, to pixel order.
+    static V pairOrder(V w) {
+        const V grouped = _mm256_shufflehi_epi16(_mm256_shufflelo_epi16(w, 0xD8), 0xD8);
+        return _mm256_permutevar8x32_epi32(grouped, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));
+    }
+    // Pixels 0-3|16-19, 4-7|20-23, 8-11|24-27, 12-15|28-31 to 32 pixels in order.
+    static void storeQuads(uint8_t* p, V q0, V q1, V q2, V q3) {
+        store(p, _mm256_permute2x128_si256(q0, q1, 0x20));
+        store(p + 32, _mm256_permute2x128_si256(q2, q3, 0x20));
+        store(p + 64, _mm256_permute2x128_si256(q0, q1, 0x31));
+        store(p + 96, _mm256_permute2x128_si256(q2, q3, 0x31));
+    }
+    static V mulhi16(V a, V b) { return _mm256_mulhi_epi16(a, b); }
+    static V addsu8(V a, V b) { return _mm256_adds_epu8(a, b); }
+    static V subsu8(V a, V b) { return _mm256_subs_epu8(a, b); }
+    static V cmpeq16(V a, V b) { return _mm256_cmpeq_epi16(a, b); }
+    static bool any(V a) { return _mm256_movemask_epi8(a) != 0; }
     static V madd16(V a, V b) { return _mm256_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm256_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }

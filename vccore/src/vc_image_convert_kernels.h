@@ -7,98 +7,109 @@
 // bit; columns that do not fill a whole vector go through the same scalar
 // arithmetic as the reference.
 
+// Byte positions of R, G, B and alpha in a 4-byte pixel, fixed at compile time
+// so that the channel vectors stay in registers.
+template <int PR, int PG, int PB, int PA>
+struct Order {
+    static constexpr int r = PR, g = PG, b = PB, a = PA;
+};
+
+// Calls f with the Order of a 4-byte RGB format; false for other formats.
+template <class F>
+static bool withOrder(uint32_t format, F&& f) {
+    switch (format) {
+        case VC_FORMAT_RGBA: f(Order<0, 1, 2, 3>{}); return true;
+        case VC_FORMAT_BGRA: f(Order<2, 1, 0, 3>{}); return true;
+        case VC_FORMAT_ARGB: f(Order<1, 2, 3, 0>{}); return true;
+        case VC_FORMAT_ABGR: f(Order<3, 2, 1, 0>{}); return true;
+        default: return false;
+    }
+}
+
 template <class T>
 struct Kernels {
     using V = typename T::V;
     static constexpr int kBytes = static_cast<int>(sizeof(V));
 
-    // Splits interleaved chroma (kBytes / 2 pairs, 16-bit words as lanes of
-    // 32-bit pairs) into per-pair R, G and B offsets.
+    // Per-pixel R, G and B offsets of kBytes / 2 chroma pairs, as saturating
+    // byte increments and decrements (each pixel of a pair gets the same).
     struct Offsets {
-        V r, g, b;
+        V rPos, rNeg, gPos, gNeg, bPos, bNeg;
         bool special;
     };
 
-    template <bool kVU>
-    static inline V chromaWords(V x, bool high) {
-        // The 16-bit half holding U (or V) of every 32-bit pair lane.
-        return high ? T::srai32(x, 16) : T::srai32(T::slli32(x, 16), 16);
+    // Word offsets (one per pair, in pair order) to the two byte vectors.
+    static inline void splitOffsets(V off, V* pos, V* neg) {
+        const V zero = T::zero();
+        const V p = T::max16(off, zero);
+        const V n = T::max16(T::sub16(zero, off), zero);
+        *pos = T::or_(p, T::slli16(p, 8));
+        *neg = T::or_(n, T::slli16(n, 8));
     }
 
+    // c: kBytes interleaved chroma bytes, U first unless kVU.
     template <bool kVU>
     static inline void pairOffsets(V c, Offsets* out) {
         const V zero = T::zero();
         const V bias = T::set1_16(128);
-        const V lo = T::sub16(T::unpacklo8(c, zero), bias);
-        const V hi = T::sub16(T::unpackhi8(c, zero), bias);
-        // Word 0 of each pair holds the first chroma byte: U for NV12, V for NV21.
-        const int vHi = kVU ? 0 : 1;
-        const V coefR = kVU ? T::pair16(26346, 0) : T::pair16(0, 26346);
-        const V coefB = kVU ? T::pair16(0, -14942) : T::pair16(-14942, 0);
+        const V low = T::set1_16(0xff);
+        const V first = T::sub16(T::and_(c, low), bias);
+        const V second = T::sub16(T::srli16(c, 8), bias);
+        const V u = kVU ? second : first;
+        const V v = kVU ? first : second;
+        // floor(1.402 v) = v + floor(26346 v / 2^16)
+        const V r = T::add16(v, T::mulhi16(v, T::set1_16(26346)));
+        // floor(1.772 u) = 2u + floor(-14942 u / 2^16)
+        const V b = T::add16(T::add16(u, u), T::mulhi16(u, T::set1_16(-14942)));
+        // Green needs 20 fraction bits: 32-bit multiply-adds over (first,
+        // second) word pairs, with the coefficients split as high * 32 + low
+        // so that both fit the 16-bit multiplier.
         const int gu = kVCConvertGU;
         const int gv = kVCConvertGV;
-        // Green coefficients split as high * 32 + low, both small enough for
-        // the 16-bit multiply-add.
         const int guh = gu >> 5, gul = gu - guh * 32;
         const int gvh = gv >> 5, gvl = gv - gvh * 32;
         const V coefGh = kVU ? T::pair16(gvh, guh) : T::pair16(guh, gvh);
         const V coefGl = kVU ? T::pair16(gvl, gul) : T::pair16(gul, gvl);
         const V gBias = T::set1_32(kVCConvertGBias);
-        const uint32_t su = static_cast<uint16_t>(kVCConvertGFixU - 128);
-        const uint32_t sv = static_cast<uint16_t>(kVCConvertGFixV - 128);
-        const V special = T::set1_32(static_cast<int>(kVU ? (sv | su << 16) : (su | sv << 16)));
-        V r[2], g[2], b[2];
-        const V halves[2] = {lo, hi};
-        bool any = false;
+        V g[2];
+        const V halves[2] = {T::sub16(T::unpacklo8(c, zero), bias),
+                             T::sub16(T::unpackhi8(c, zero), bias)};
         for (int i = 0; i < 2; ++i) {
             const V x = halves[i];
-            const V v = chromaWords<kVU>(x, vHi == 1);
-            const V u = chromaWords<kVU>(x, vHi == 0);
-            // floor(1.402 v) = v + floor(26346 v / 2^16)
-            r[i] = T::add32(v, T::srai32(T::madd16(x, coefR), 16));
-            // floor(1.772 u) = 2u + floor(-14942 u / 2^16)
-            b[i] = T::add32(T::add32(u, u), T::srai32(T::madd16(x, coefB), 16));
             const V gsum = T::add32(T::slli32(T::madd16(x, coefGh), 5), T::madd16(x, coefGl));
             g[i] = T::srai32(T::add32(gsum, gBias), kVCConvertGShift);
-            any = any || T::anyEq32(x, special);
         }
-        out->r = T::packs32(r[0], r[1]);
-        out->g = T::packs32(g[0], g[1]);
-        out->b = T::packs32(b[0], b[1]);
-        out->special = any;
+        splitOffsets(r, &out->rPos, &out->rNeg);
+        splitOffsets(T::packs32(g[0], g[1]), &out->gPos, &out->gNeg);
+        splitOffsets(b, &out->bPos, &out->bNeg);
+        out->special = T::any(T::and_(T::cmpeq16(u, T::set1_16(kVCConvertGFixU - 128)),
+                                      T::cmpeq16(v, T::set1_16(kVCConvertGFixV - 128))));
     }
 
-    static inline V addOffsets(V ylo, V yhi, V off) {
-        return T::packus16(T::add16(ylo, T::unpacklo16(off, off)),
-                           T::add16(yhi, T::unpackhi16(off, off)));
-    }
-
-    // One row of kBytes pixels from kBytes luma bytes and the pair offsets.
-    static inline void rgbRow(const uint8_t* luma, const Offsets& o, const int pos[4],
-                              uint8_t* out) {
-        const V zero = T::zero();
+    // One row of kBytes pixels: saturating byte arithmetic is the clamp.
+    template <class O>
+    static inline void rgbRow(const uint8_t* luma, const Offsets& o, uint8_t* out) {
         const V y = T::load(luma);
-        const V ylo = T::unpacklo8(y, zero);
-        const V yhi = T::unpackhi8(y, zero);
         V ch[4];
-        ch[pos[0]] = addOffsets(ylo, yhi, o.r);
-        ch[pos[1]] = addOffsets(ylo, yhi, o.g);
-        ch[pos[2]] = addOffsets(ylo, yhi, o.b);
-        ch[pos[3]] = T::set1_8(-1);
+        ch[O::r] = T::subsu8(T::addsu8(y, o.rPos), o.rNeg);
+        ch[O::g] = T::subsu8(T::addsu8(y, o.gPos), o.gNeg);
+        ch[O::b] = T::subsu8(T::addsu8(y, o.bPos), o.bNeg);
+        ch[O::a] = T::set1_8(-1);
         T::store4(out, ch[0], ch[1], ch[2], ch[3]);
     }
 
-    static inline void scalarPixel(int y, int u, int v, const int pos[4], uint8_t* px) {
-        VCConvert_yuvToRgb(y, u, v, px + pos[0], px + pos[1], px + pos[2]);
-        px[pos[3]] = 255;
+    template <class O>
+    static inline void scalarPixel(int y, int u, int v, uint8_t* px) {
+        VCConvert_yuvToRgb(y, u, v, px + O::r, px + O::g, px + O::b);
+        px[O::a] = 255;
     }
 
     // 4:2:0 to a 4-byte RGB format. uv: interleaved chroma (planar == false),
     // or the U and V planes.
-    template <bool kVU>
+    template <bool kVU, bool kPlanar, class O>
     static void yuv420ToRgb32(const uint8_t* luma, const uint8_t* uv, const uint8_t* uPlane,
-                              const uint8_t* vPlane, bool planar, int w, int h, const int pos[4],
-                              uint8_t* dst) {
+                              const uint8_t* vPlane, int w, int h, uint8_t* dst) {
+        const bool planar = kPlanar;
         const size_t rowBytes = static_cast<size_t>(w) * 4;
         const int half = w / 2;
         for (int row = 0; row < h / 2; ++row) {
@@ -114,8 +125,8 @@ struct Kernels {
                 const V c = planar ? T::interleave(uRow + x / 2, vRow + x / 2) : T::load(cRow + x);
                 Offsets o;
                 pairOffsets<kVU>(c, &o);
-                rgbRow(y0 + x, o, pos, d0 + static_cast<size_t>(x) * 4);
-                rgbRow(y1 + x, o, pos, d1 + static_cast<size_t>(x) * 4);
+                rgbRow<O>(y0 + x, o, d0 + static_cast<size_t>(x) * 4);
+                rgbRow<O>(y1 + x, o, d1 + static_cast<size_t>(x) * 4);
                 if (o.special) {
                     // The one chroma pair whose green the integer model cannot
                     // follow for every luma: redo its pixels exactly.
@@ -124,8 +135,8 @@ struct Kernels {
                         chromaAt<kVU>(cRow, uRow, vRow, planar, k, &u, &v);
                         if (u != kVCConvertGFixU || v != kVCConvertGFixV) continue;
                         for (int j = 0; j < 2; ++j) {
-                            scalarPixel(y0[k + j], u, v, pos, d0 + (k + j) * 4);
-                            scalarPixel(y1[k + j], u, v, pos, d1 + (k + j) * 4);
+                            scalarPixel<O>(y0[k + j], u, v, d0 + (k + j) * 4);
+                            scalarPixel<O>(y1[k + j], u, v, d1 + (k + j) * 4);
                         }
                     }
                 }
@@ -134,8 +145,8 @@ struct Kernels {
                 int u, v;
                 chromaAt<kVU>(cRow, uRow, vRow, planar, x, &u, &v);
                 for (int j = 0; j < 2 && x + j < w; ++j) {
-                    scalarPixel(y0[x + j], u, v, pos, d0 + (x + j) * 4);
-                    scalarPixel(y1[x + j], u, v, pos, d1 + (x + j) * 4);
+                    scalarPixel<O>(y0[x + j], u, v, d0 + (x + j) * 4);
+                    scalarPixel<O>(y1[x + j], u, v, d1 + (x + j) * 4);
                 }
             }
         }
@@ -153,27 +164,35 @@ struct Kernels {
         }
     }
 
-    // Luma, U and V (32-bit lanes) of kBytes / 4 pixels of a 4-byte format.
-    static inline void rgbToYuvLanes(V p, const int pos[4], bool chroma, V* y, V* u, V* v) {
-        const V ff = T::set1_32(0xff);
-        const V r = T::and_(T::srl32(p, 8 * pos[0]), ff);
-        const V g = T::and_(T::srl32(p, 8 * pos[1]), ff);
-        const V b = T::and_(T::srl32(p, 8 * pos[2]), ff);
-        const V low = T::set1_32(0xffff);
-        // (19595 R + 38470 G + 7471 B) >> 16 = G + ((19595 (R-G) + 7471 (B-G)) >> 16)
-        const V rg = T::sub32(r, g);
-        const V bg = T::sub32(b, g);
-        const V x = T::or_(T::and_(rg, low), T::slli32(bg, 16));
-        *y = T::add32(g, T::srai32(T::madd16(x, T::pair16(19595, 7471)), 16));
-        if (!chroma) return;
-        const V bias = T::set1_32(128);
-        const V db = T::sub32(b, *y);
-        const V dr = T::sub32(r, *y);
-        // 36962 = 18481 + 18481 and 46727 = 23364 + 23363 keep the products exact.
-        const V xb = T::or_(T::and_(db, low), T::slli32(db, 16));
-        const V xr = T::or_(T::and_(dr, low), T::slli32(dr, 16));
-        *u = T::add32(T::srai32(T::madd16(xb, T::pair16(18481, 18481)), 16), bias);
-        *v = T::add32(T::srai32(T::madd16(xr, T::pair16(23364, 23363)), 16), bias);
+    // Luma, red and blue (32-bit lanes) of kBytes / 4 pixels of a 4-byte
+    // format. R and B always share a byte parity and G has the other, so two
+    // masks give (R, B) and (G, A) word pairs for the multiply-add.
+    template <class O>
+    static inline void rgbToYuvLanes(V p, V* y, V* r, V* b) {
+        const V low = T::set1_16(0xff);
+        const V rb = T::and_(O::r % 2 == 0 ? p : T::srli16(p, 8), low);
+        const V ga = T::and_(O::g % 2 == 0 ? p : T::srli16(p, 8), low);
+        const bool rLow = O::r < 2;
+        const bool gLow = O::g < 2;
+        // 38470 G = 2 * 19235 G keeps the coefficient within 16 bits.
+        const V sum = T::add32(
+            T::madd16(rb, rLow ? T::pair16(19595, 7471) : T::pair16(7471, 19595)),
+            T::slli32(T::madd16(ga, gLow ? T::pair16(19235, 0) : T::pair16(0, 19235)), 1));
+        *y = T::srai32(sum, 16);
+        const V word = T::set1_32(0xffff);
+        *r = rLow ? T::and_(rb, word) : T::srli32(rb, 16);
+        *b = rLow ? T::srli32(rb, 16) : T::and_(rb, word);
+    }
+
+    // ((36962 d) >> 16) + 128 = ((18481 d) >> 15) + 128, d = B - Y in the low
+    // word of every 32-bit lane.
+    static inline V chromaU(V d) {
+        return T::add32(T::srai32(T::madd16(d, T::pair16(18481, 0)), 15), T::set1_32(128));
+    }
+    // ((46727 e) >> 16) + 128 = e + ((-18809 e) >> 16) + 128, e = R - Y.
+    static inline V chromaV(V e) {
+        return T::add32(T::add32(e, T::srai32(T::madd16(e, T::pair16(-18809, 0)), 16)),
+                        T::set1_32(128));
     }
 
     // Four vectors of 32-bit lanes to kBytes clamped bytes in pixel order.
@@ -181,9 +200,10 @@ struct Kernels {
         return T::fixPackOrder(T::packus16(T::packs32(q[0], q[1]), T::packs32(q[2], q[3])));
     }
 
-    static inline void scalarRgbToYuv(const uint8_t* px, const int pos[4], bool chroma,
-                                      uint8_t* y, uint8_t* u, uint8_t* v) {
-        const int r = px[pos[0]], g = px[pos[1]], b = px[pos[2]];
+    template <class O>
+    static inline void scalarRgbToYuv(const uint8_t* px, bool chroma, uint8_t* y, uint8_t* u,
+                                      uint8_t* v) {
+        const int r = px[O::r], g = px[O::g], b = px[O::b];
         *y = VCConvert_rgbToY(r, g, b);
         if (!chroma) return;
         *u = VCConvert_rgbToU(b, *y);
@@ -192,10 +212,10 @@ struct Kernels {
 
     // A 4-byte RGB format to 4:2:0: interleaved chroma (uFirst tells NV12
     // from NV21) or separate U and V planes.
-    static void rgb32ToYuv420(const uint8_t* src, const int pos[4], int w, int h, uint8_t* luma,
-                              uint8_t* uv, bool uFirst, uint8_t* uPlane, uint8_t* vPlane,
-                              bool planar) {
-        const V mask = T::set1_16(0xff);
+    template <class O, bool kPlanar>
+    static void rgb32ToYuv420(const uint8_t* src, int w, int h, uint8_t* luma, uint8_t* uv,
+                              bool uFirst, uint8_t* uPlane, uint8_t* vPlane) {
+        const bool planar = kPlanar;
         const int half = w / 2;
         for (int row = 0; row < h; ++row) {
             const uint8_t* s = src + static_cast<size_t>(row) * w * 4;
@@ -206,28 +226,39 @@ struct Kernels {
             uint8_t* vRow = planar ? vPlane + static_cast<size_t>(row / 2) * half : nullptr;
             int x = 0;
             for (; x + kBytes <= w; x += kBytes) {
-                V ys[4] = {}, us[4] = {}, vs[4] = {};
+                V ys[4], rs[4], bs[4];
                 for (int i = 0; i < 4; ++i)
-                    rgbToYuvLanes(T::load(s + (static_cast<size_t>(x) + i * kBytes / 4) * 4), pos,
-                                  chroma, &ys[i], &us[i], &vs[i]);
+                    rgbToYuvLanes<O>(T::load(s + (static_cast<size_t>(x) + i * kBytes / 4) * 4),
+                                     &ys[i], &rs[i], &bs[i]);
                 T::store(yRow + x, packBytes(ys));
                 if (!chroma) continue;
-                // Even pixels carry the chroma of their pair.
-                const V ub = T::and_(packBytes(us), mask);
-                const V vb = T::and_(packBytes(vs), mask);
+                // Only even pixels give chroma: pack the even lanes of two
+                // vectors into one before the arithmetic.
+                V u[2], v[2];
+                for (int i = 0; i < 2; ++i) {
+                    u[i] = chromaU(T::combineEven(T::sub32(bs[2 * i], ys[2 * i]),
+                                                  T::sub32(bs[2 * i + 1], ys[2 * i + 1])));
+                    v[i] = chromaV(T::combineEven(T::sub32(rs[2 * i], ys[2 * i]),
+                                                  T::sub32(rs[2 * i + 1], ys[2 * i + 1])));
+                }
+                const V zero = T::zero();
+                const V low = T::set1_16(0xff);
+                const V u16 = T::min16(T::max16(T::packs32(u[0], u[1]), zero), low);
+                const V v16 = T::min16(T::max16(T::packs32(v[0], v[1]), zero), low);
+                const bool uLow = planar || uFirst;
+                const V pairs = T::pairOrder(
+                    T::or_(uLow ? u16 : v16, T::slli16(uLow ? v16 : u16, 8)));
                 if (planar) {
-                    T::storeHalf(uRow + x / 2, T::packus16(ub, T::zero()));
-                    T::storeHalf(vRow + x / 2, T::packus16(vb, T::zero()));
+                    T::storeHalf(uRow + x / 2, T::packus16(T::and_(pairs, low), zero));
+                    T::storeHalf(vRow + x / 2, T::packus16(T::srli16(pairs, 8), zero));
                 } else {
-                    const V first = uFirst ? ub : vb;
-                    const V second = uFirst ? vb : ub;
-                    T::store(cRow + x, T::or_(first, T::slli16(second, 8)));
+                    T::store(cRow + x, pairs);
                 }
             }
             for (; x < w; ++x) {
                 const bool pairChroma = chroma && x % 2 == 0;
                 uint8_t u = 0, v = 0;
-                scalarRgbToYuv(s + static_cast<size_t>(x) * 4, pos, pairChroma, yRow + x, &u, &v);
+                scalarRgbToYuv<O>(s + static_cast<size_t>(x) * 4, pairChroma, yRow + x, &u, &v);
                 if (!pairChroma) continue;
                 if (planar) {
                     uRow[x / 2] = u;
@@ -240,21 +271,24 @@ struct Kernels {
         }
     }
 
-    // Between 4-byte RGB formats: out byte i takes in byte from[i].
+    // Between 4-byte RGB formats: out byte k takes in byte from[k].
     static void rgb32ToRgb32(const uint8_t* src, const int from[4], size_t pixels,
                              uint8_t* dst) {
-        const V ff = T::set1_32(0xff);
+        const int f0 = from[0], f1 = from[1], f2 = from[2], f3 = from[3];
+        const typename T::Shuffle shuffle = T::makeShuffle(f0, f1, f2, f3);
         size_t i = 0;
         const size_t step = static_cast<size_t>(kBytes) / 4;
-        for (; i + step <= pixels; i += step) {
-            const V p = T::load(src + i * 4);
-            V out = T::zero();
-            for (int k = 0; k < 4; ++k)
-                out = T::or_(out, T::sll32(T::and_(T::srl32(p, 8 * from[k]), ff), 8 * k));
-            T::store(dst + i * 4, out);
+        for (; i + step <= pixels; i += step)
+            T::store(dst + i * 4, T::shuffle(T::load(src + i * 4), shuffle));
+        for (; i < pixels; ++i) {
+            const uint8_t* s = src + i * 4;
+            uint8_t* d = dst + i * 4;
+            const uint8_t b0 = s[f0], b1 = s[f1], b2 = s[f2], b3 = s[f3];
+            d[0] = b0;
+            d[1] = b1;
+            d[2] = b2;
+            d[3] = b3;
         }
-        for (; i < pixels; ++i)
-            for (int k = 0; k < 4; ++k) dst[i * 4 + k] = src[i * 4 + from[k]];
     }
 
     static bool rgb32Positions(uint32_t format, int pos[4]) {
@@ -286,39 +320,47 @@ struct Kernels {
             VCYuvLayout l;
             if (!VCImage_yuvLayout(src, &l)) return false;
             const uint8_t* d = src->data;
-            switch (src->format) {
-                case VC_FORMAT_NV12:
-                    yuv420ToRgb32<false>(d, d + l.uOffset, nullptr, nullptr, false, w, h, dp,
-                                         dst->data);
-                    return true;
-                case VC_FORMAT_NV21:
-                    yuv420ToRgb32<true>(d, d + l.vOffset, nullptr, nullptr, false, w, h, dp,
-                                        dst->data);
-                    return true;
-                default:
-                    yuv420ToRgb32<false>(d, nullptr, d + l.uOffset, d + l.vOffset, true, w, h, dp,
-                                         dst->data);
-                    return true;
-            }
+            uint8_t* out = dst->data;
+            return withOrder(dst->format, [&](auto order) {
+                using O = decltype(order);
+                switch (src->format) {
+                    case VC_FORMAT_NV12:
+                        yuv420ToRgb32<false, false, O>(d, d + l.uOffset, nullptr, nullptr, w, h,
+                                                       out);
+                        break;
+                    case VC_FORMAT_NV21:
+                        yuv420ToRgb32<true, false, O>(d, d + l.vOffset, nullptr, nullptr, w, h,
+                                                      out);
+                        break;
+                    default:
+                        yuv420ToRgb32<false, true, O>(d, nullptr, d + l.uOffset, d + l.vOffset, w,
+                                                      h, out);
+                        break;
+                }
+            });
         }
         if (srcRgb32 && VCImage_isYUV420(dst->format)) {
             VCYuvLayout l;
             if (!VCImage_yuvLayout(dst, &l)) return false;
             uint8_t* d = dst->data;
-            switch (dst->format) {
-                case VC_FORMAT_NV12:
-                    rgb32ToYuv420(src->data, sp, w, h, d, d + l.uOffset, true, nullptr, nullptr,
-                                  false);
-                    return true;
-                case VC_FORMAT_NV21:
-                    rgb32ToYuv420(src->data, sp, w, h, d, d + l.vOffset, false, nullptr, nullptr,
-                                  false);
-                    return true;
-                default:
-                    rgb32ToYuv420(src->data, sp, w, h, d, nullptr, false, d + l.uOffset,
-                                  d + l.vOffset, true);
-                    return true;
-            }
+            const uint8_t* in = src->data;
+            return withOrder(src->format, [&](auto order) {
+                using O = decltype(order);
+                switch (dst->format) {
+                    case VC_FORMAT_NV12:
+                        rgb32ToYuv420<O, false>(in, w, h, d, d + l.uOffset, true, nullptr,
+                                                nullptr);
+                        break;
+                    case VC_FORMAT_NV21:
+                        rgb32ToYuv420<O, false>(in, w, h, d, d + l.vOffset, false, nullptr,
+                                                nullptr);
+                        break;
+                    default:
+                        rgb32ToYuv420<O, true>(in, w, h, d, nullptr, false, d + l.uOffset,
+                                               d + l.vOffset);
+                        break;
+                }
+            });
         }
         return false;
     }

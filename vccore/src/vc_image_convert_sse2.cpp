@@ -30,8 +30,53 @@ struct Sse2 {
     static V srai32(V a, int n) { return _mm_srai_epi32(a, n); }
     static V slli32(V a, int n) { return _mm_slli_epi32(a, n); }
     static V slli16(V a, int n) { return _mm_slli_epi16(a, n); }
-    static V srl32(V a, int n) { return _mm_srl_epi32(a, _mm_cvtsi32_si128(n)); }
-    static V sll32(V a, int n) { return _mm_sll_epi32(a, _mm_cvtsi32_si128(n)); }
+    static V srli32(V a, int n) { return _mm_srli_epi32(a, n); }
+    // Byte moves inside every 4-byte pixel, by shifts and masks (SSE2 has no
+    // byte shuffle).
+    struct Shuffle {
+        V in[4];
+        V out[4];
+    };
+    static Shuffle makeShuffle(int f0, int f1, int f2, int f3) {
+        const int from[4] = {f0, f1, f2, f3};
+        Shuffle s;
+        for (int k = 0; k < 4; ++k) {
+            s.in[k] = _mm_cvtsi32_si128(8 * from[k]);
+            s.out[k] = _mm_cvtsi32_si128(8 * k);
+        }
+        return s;
+    }
+    static V shuffle(V p, const Shuffle& s) {
+        const V ff = _mm_set1_epi32(0xff);
+        V out = _mm_setzero_si128();
+        for (int k = 0; k < 4; ++k)
+            out = _mm_or_si128(out, _mm_sll_epi32(_mm_and_si128(_mm_srl_epi32(p, s.in[k]), ff),
+                                                  s.out[k]));
+        return out;
+    }
+    static V srli16(V a, int n) { return _mm_srli_epi16(a, n); }
+    static V min16(V a, V b) { return _mm_min_epi16(a, b); }
+    static V max16(V a, V b) { return _mm_max_epi16(a, b); }
+    static V unpacklo32(V a, V b) { return _mm_unpacklo_epi32(a, b); }
+    static V unpackhi32(V a, V b) { return _mm_unpackhi_epi32(a, b); }
+    // Even 32-bit lanes of a, with the even lanes of b in between.
+    static V combineEven(V a, V b) {
+        return _mm_or_si128(_mm_and_si128(a, _mm_set_epi32(0, -1, 0, -1)), _mm_slli_epi64(b, 32));
+    }
+    // Words a0 b0 a2 b2 c0 d0 c2 d2 (of four 4-pixel vectors) to pixel order.
+    static V pairOrder(V w) { return _mm_shufflehi_epi16(_mm_shufflelo_epi16(w, 0xD8), 0xD8); }
+    // Four vectors of four pixels, in order.
+    static void storeQuads(uint8_t* p, V q0, V q1, V q2, V q3) {
+        store(p, q0);
+        store(p + 16, q1);
+        store(p + 32, q2);
+        store(p + 48, q3);
+    }
+    static V mulhi16(V a, V b) { return _mm_mulhi_epi16(a, b); }
+    static V addsu8(V a, V b) { return _mm_adds_epu8(a, b); }
+    static V subsu8(V a, V b) { return _mm_subs_epu8(a, b); }
+    static V cmpeq16(V a, V b) { return _mm_cmpeq_epi16(a, b); }
+    static bool any(V a) { return _mm_movemask_epi8(a) != 0; }
     static V madd16(V a, V b) { return _mm_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm_packus_epi16(a, b); }
