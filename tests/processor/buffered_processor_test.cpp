@@ -210,11 +210,10 @@ TEST_F(BufferedProcessorTest, EveryLookThroughNv21EvenAndOddHeight) {
     for (int h : {48, 47}) {
         const int w = 64;
         Nv21Picture even = makeNv21(w, 48);
-        std::vector<uint8_t> input(even.nv21);
-        if (h == 47) {
-            // 47 luma rows followed by the 24 chroma rows of the 48-row picture.
-            input.erase(input.begin() + w * 47, input.begin() + w * 48);
-        }
+        // h luma rows followed by the 24 chroma rows of the 48-row picture.
+        std::vector<uint8_t> input(size_t(w) * h + size_t(w) * 24);
+        memcpy(input.data(), even.nv21.data(), size_t(w) * h);
+        memcpy(input.data() + size_t(w) * h, even.nv21.data() + w * 48, size_t(w) * 24);
         lookref::Picture picture(w, 48, even.rgba);
         for (int id : lookref::lookIds()) {
             ASSERT_EQ(0, mProcessor->setEffect(id));
