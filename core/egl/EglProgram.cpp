@@ -228,7 +228,9 @@ int EglProgram::loadEffectShader() {
         } else {
             mDrawFlag = true;
             int id = mFilter->loadExtFragmentShader(*this);
-            if (id == 0) {
+            // Not a shader name: 0, or a negative status from an effect
+            // without an external shader.
+            if (id <= 0) {
                 result = VC_REPORT(VC_ERROR_UNKNOWN);
             } else {
                 shaderId = static_cast<unsigned int>(id);

@@ -22,7 +22,8 @@ class KivFilter;
 class EglProgram : public virtual android::RefBase {
 public:
     // Texture coordinates of the camera input for the four strip vertices.
-    enum GeometryType {
+    // Stored as given: a value above 3 is legal and binds no coordinates.
+    enum GeometryType : int {
         GEOMETRY_VFLIP = 0,
         GEOMETRY_NORMAL = 1,
         GEOMETRY_ROTATE_180 = 2,

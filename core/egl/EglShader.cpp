@@ -182,6 +182,11 @@ void EglShader::unBindVertexAttrib(const char* name) {
 
 void EglShader::release() {
     if (mProgramId != 0) {
+        // A deleted program that is still in use lives on until another one
+        // is; let go of it so that release really frees it.
+        GLint current = 0;
+        GL_CHECK(glGetIntegerv(GL_CURRENT_PROGRAM, &current));
+        if (static_cast<GLuint>(current) == mProgramId) GL_CHECK(glUseProgram(GL_NONE));
         GLsizei iAttachCnt = 16;
         GLuint iShaders[16] = {};
         if (!GL_CHECK(glGetAttachedShaders(mProgramId, iAttachCnt, &iAttachCnt, iShaders))) {

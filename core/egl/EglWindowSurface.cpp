@@ -1,0 +1,139 @@
+#include "core/egl/EglWindowSurface.h"
+
+#include <android/native_window.h>
+#include <system/window.h>
+
+#include "core/egl/EglCheck.h"
+#include "core/egl/EglNativeSeam.h"
+#include "vccore/vc_error.h"
+#include "vccore/vc_log.h"
+
+#define VC_SOURCE "core/egl/EglWindowSurface"
+
+using android::sp;
+
+EglWindowSurface::EglWindowSurface(const sp<EglEnvironment>& env, const sp<ANativeWindow>& window,
+                                   SURFACE_TYPE type)
+    : mSurfaceType(type),
+      mEglSurface(EGL_NO_SURFACE),
+      mNativeWindow(window),
+      mEglEnv(env),
+      mFlag(false) {}
+
+EglWindowSurface::EglWindowSurface(const sp<EglEnvironment>& env)
+    : mSurfaceType(SURFACE_PBUFFER), mEglSurface(EGL_NO_SURFACE), mEglEnv(env), mFlag(false) {}
+
+EglWindowSurface::~EglWindowSurface() {}
+
+void EglWindowSurface::setSize(int width, int height) {
+    if (mSurfaceType == SURFACE_PBUFFER || mNativeWindow == nullptr) return;
+    mWidth = width;
+    mHeight = height;
+    ANativeWindow* window = mNativeWindow.get();
+    ANativeWindow_setBuffersGeometry(window, width, height, ANativeWindow_getFormat(window));
+}
+
+int EglWindowSurface::getWidth() {
+    if (mSurfaceType == SURFACE_PBUFFER || mNativeWindow == nullptr) {
+        mWidth = 1;
+    } else {
+        mWidth = ANativeWindow_getWidth(mNativeWindow.get());
+    }
+    return mWidth;
+}
+
+int EglWindowSurface::getHeight() {
+    if (mSurfaceType == SURFACE_PBUFFER || mNativeWindow == nullptr) {
+        mHeight = 1;
+    } else {
+        mHeight = ANativeWindow_getHeight(mNativeWindow.get());
+    }
+    return mHeight;
+}
+
+int EglWindowSurface::initialize_l() {
+    if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    bool isWindow = mSurfaceType != SURFACE_PBUFFER;
+    if (isWindow && mNativeWindow == nullptr) return VC_REPORT(VC_ERROR_NULL_PARAM);
+
+    ANativeWindow* window = mNativeWindow.get();
+    if (mSurfaceType == SURFACE_PREVIEW || mSurfaceType == SURFACE_PREVIEW_SW) {
+        EglLog(VF_LOG_DEBUG, "Setting max buffer count to %d", kPreviewBufferCount);
+        window->perform(window, NATIVE_WINDOW_SET_BUFFER_COUNT, kPreviewBufferCount);
+    }
+
+    EGLDisplay display = mEglEnv->getEGLDisplay();
+    EGLConfig config = mEglEnv->getEGLConfig();
+    if (!isWindow) {
+        if (!EGL_CHECK(mEglSurface = eglCreatePbufferSurface(mEglEnv->getEGLDisplay(),
+                                                             mEglEnv->getEGLConfig(),
+                                                             EglEnvironment::sPbufferAttribs))) {
+            return VC_REPORT(VC_ERROR_UNKNOWN);
+        }
+    } else {
+        // Through the seam: a device makes a real window surface, a host an
+        // off-screen one whose swaps feed the window.
+        if (!EGL_CHECK(mEglSurface = EglNativeSeam::get().createWindowSurface(display, config,
+                                                                              window, NULL))) {
+            return VC_REPORT(VC_ERROR_UNKNOWN);
+        }
+    }
+    if (mEglSurface == EGL_NO_SURFACE) return VC_REPORT(VC_ERROR_UNKNOWN);
+
+    if (mSurfaceType == SURFACE_PREVIEW_SW) {
+        window->perform(window, NATIVE_WINDOW_SET_USAGE, kSoftwarePreviewUsage);
+    }
+    return 0;
+}
+
+int EglWindowSurface::bindSurface() {
+    if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    EGLBoolean result;
+    if (!EGL_CHECK_BOOL(result = eglMakeCurrent(mEglEnv->getEGLDisplay(), mEglSurface, mEglSurface,
+                                                mEglEnv->getEGLContext()))) {
+        return VC_REPORT(VC_ERROR_UNKNOWN);
+    }
+    return 0;
+}
+
+int EglWindowSurface::unbindSurface() {
+    if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    EGLBoolean result;
+    if (!EGL_CHECK_BOOL(result = eglMakeCurrent(mEglEnv->getEGLDisplay(), EGL_NO_SURFACE,
+                                                EGL_NO_SURFACE, EGL_NO_CONTEXT))) {
+        return VC_REPORT(VC_ERROR_UNKNOWN);
+    }
+    return 0;
+}
+
+int EglWindowSurface::swapSurface() {
+    if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    EGLBoolean result;
+    if (mSurfaceType == SURFACE_PBUFFER) {
+        result = EGL_CHECK_BOOL(eglSwapBuffers(mEglEnv->getEGLDisplay(), mEglSurface));
+    } else {
+        result =
+            EGL_CHECK_BOOL(EglNativeSeam::get().swapBuffers(mEglEnv->getEGLDisplay(), mEglSurface));
+    }
+    if (result != EGL_TRUE) return VC_REPORT(VC_ERROR_UNKNOWN);
+    return 0;
+}
+
+void EglWindowSurface::release_l() {
+    if (mEglSurface != EGL_NO_SURFACE && mEglEnv != nullptr) {
+        EGLBoolean result;
+        bool ok;
+        if (mSurfaceType == SURFACE_PBUFFER) {
+            ok = EGL_CHECK_BOOL(result = eglDestroySurface(mEglEnv->getEGLDisplay(), mEglSurface));
+        } else {
+            ok = EGL_CHECK_BOOL(result = EglNativeSeam::get().destroySurface(
+                                    mEglEnv->getEGLDisplay(), mEglSurface));
+        }
+        if (!ok) EglLog(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed.");
+    }
+    // Forgotten even when the destroy failed: the handle is no longer usable.
+    mEglSurface = EGL_NO_SURFACE;
+    if (mSurfaceType != SURFACE_PBUFFER && mNativeWindow != nullptr) mNativeWindow.clear();
+    mEglEnv.clear();
+    mFlag = false;
+}
