@@ -2,6 +2,7 @@
 
 #include <stdarg.h>
 #include <stdio.h>
+#include <string.h>
 
 #include <atomic>
 
@@ -18,18 +19,18 @@ bool gVerbose = false;
 void coreLog(int level, const char* format, ...) __attribute__((format(printf, 2, 3)));
 
 void coreLog(int level, const char* format, ...) {
-    if (level >= VF_LOG_ERROR) gErrors++;
-    if (!gVerbose) return;
+    if (!gVerbose && level < VF_LOG_ERROR) return;
     char line[2048];
     va_list args;
     va_start(args, format);
     vsnprintf(line, sizeof(line), format, args);
     va_end(args);
-    fprintf(stderr, "%s %s\n", VF_LogLabel(level), line);
+    if (level >= VF_LOG_ERROR && cliLogIsErrorReport(line)) gErrors++;
+    if (gVerbose) fprintf(stderr, "%s %s\n", VF_LogLabel(level), line);
 }
 
 void androidLog(const struct __android_logger_data* data, const char* message) {
-    if (data->priority >= ANDROID_LOG_ERROR) gErrors++;
+    if (data->priority >= ANDROID_LOG_ERROR && cliLogIsErrorReport(message)) gErrors++;
     if (!gVerbose) return;
     fprintf(stderr, "[%s] %s\n", data->tag != nullptr ? data->tag : "", message);
 }
@@ -46,6 +47,11 @@ void cliLogSetup(bool verbose) {
 
 int cliLogErrorCount() {
     return gErrors.load();
+}
+
+bool cliLogIsErrorReport(const char* message) {
+    return message != nullptr && strncmp(message, "VC_ERROR_", 9) == 0 &&
+           strstr(message, " (-") != nullptr;
 }
 
 }  // namespace kivcli
