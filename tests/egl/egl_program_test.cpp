@@ -1,0 +1,451 @@
+// EglProgram on llvmpipe: what reaches the framebuffer for each geometry and
+// effect path (checked against a CPU mapping of the same quad), the default
+// fallbacks, effect replacement and failure, geometry and texture-unit rules,
+// and that repeated programs leave no GL object alive.
+#include <GLES2/gl2.h>
+#include <GLES2/gl2ext.h>
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "core/KivFilter.h"
+#include "core/egl/EglProgram.h"
+#include "core/egl/EglRecycler.h"
+#include "support/gl_context.h"
+#include "support/log_capture.h"
+#include "vccore/vc_log.h"
+
+using android::sp;
+
+namespace {
+
+const int W = 5;
+const int H = 3;
+
+// An effect driven by a fragment snippet, counting what the program asks of it.
+class TestFilter : public KivFilter {
+public:
+    explicit TestFilter(const char* code, int type = 403) : mCode(code), mType(type) {}
+    int doEffect() override { return 0; }
+    int getFilterType() const override { return mType; }
+    int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int& id) override {
+        loads++;
+        program.setDrawFlag(true);
+        id = program.loadFragmentShader(mCode, false);
+        if (id == 0) return -1;
+        return program.bindFragmentShader(id);
+    }
+    int loadExtFragmentShader(EglProgram& program) override {
+        loads++;
+        return static_cast<int>(program.loadFragmentShader(mCode, true));
+    }
+    int onDrawFrame(EglProgram&) override {
+        draws++;
+        return drawResult;
+    }
+    int releaseGL(EglRecycler& recycler) override {
+        releasedWith = &recycler;
+        return 0;
+    }
+
+    const char* mCode;
+    int mType;
+    int loads = 0;
+    int draws = 0;
+    int drawResult = 0;
+    EglRecycler* releasedWith = nullptr;
+};
+
+std::vector<uint8_t> pattern(int w, int h, int seed) {
+    std::vector<uint8_t> px(static_cast<size_t>(w) * h * 4);
+    for (size_t i = 0; i < px.size(); i++)
+        px[i] = static_cast<uint8_t>((i * 37 + seed * 101) % 251);
+    return px;
+}
+
+// Where output pixel (x, y) (y = 0 at the bottom) samples the input for a
+// camera geometry; -1 means no texture coordinates (every pixel reads (0,0)).
+std::vector<uint8_t> expectedFor(const std::vector<uint8_t>& src, int type) {
+    std::vector<uint8_t> out(src.size());
+    for (int y = 0; y < H; y++) {
+        for (int x = 0; x < W; x++) {
+            int sx = x, sy = y;
+            switch (type) {
+                case EglProgram::GEOMETRY_VFLIP:
+                    sy = H - 1 - y;
+                    break;
+                case EglProgram::GEOMETRY_NORMAL:
+                    break;
+                case EglProgram::GEOMETRY_ROTATE_180:
+                    sx = W - 1 - x;
+                    sy = H - 1 - y;
+                    break;
+                case EglProgram::GEOMETRY_HFLIP:
+                    sx = W - 1 - x;
+                    break;
+                default:
+                    sx = 0;
+                    sy = 0;
+                    break;
+            }
+            for (int c = 0; c < 4; c++) out[(y * W + x) * 4 + c] = src[(sy * W + sx) * 4 + c];
+        }
+    }
+    return out;
+}
+
+std::vector<uint8_t> opaque(std::vector<uint8_t> px) {
+    for (size_t i = 3; i < px.size(); i += 4) px[i] = 255;
+    return px;
+}
+
+class EglProgramTest : public GlContextTest {
+protected:
+    void SetUp() override {
+        GlContextTest::SetUp();
+        if (HasFatalFailure()) return;
+        mSrc = pattern(W, H, 1);
+        mSrc2 = pattern(W, H, 2);
+        ASSERT_TRUE(GlTest_makeExternalTexture(W, H, mSrc.data(), &mInput));
+        ASSERT_TRUE(GlTest_makeExternalTexture(W, H, mSrc2.data(), &mInput2));
+        ASSERT_TRUE(GlTest_makeTarget(W, H, &mTarget));
+        mProgram = new EglProgram();
+        ASSERT_EQ(mProgram->setCameraGeometry(W, H, 0, 0), 0);
+        ASSERT_EQ(mProgram->setPreviewGeometry(W, H, true), 0);
+    }
+    void TearDown() override {
+        if (mProgram != nullptr) mProgram->release();
+        mProgram.clear();
+        GlTest_deleteExternalTexture(&mInput);
+        GlTest_deleteExternalTexture(&mInput2);
+        GlTest_deleteTarget(&mTarget);
+        GlContextTest::TearDown();
+    }
+    // Binds the inputs to units 0 and 1, draws one frame, reads the target.
+    std::vector<uint8_t> draw(int* result = nullptr) {
+        glBindFramebuffer(GL_FRAMEBUFFER, mTarget.framebuffer);
+        glClearColor(0, 0, 0, 0);
+        glClear(GL_COLOR_BUFFER_BIT);
+        glActiveTexture(GL_TEXTURE1);
+        glBindTexture(GL_TEXTURE_EXTERNAL_OES, mInput2.external);
+        glActiveTexture(GL_TEXTURE0);
+        glBindTexture(GL_TEXTURE_EXTERNAL_OES, mInput.external);
+        int r = mProgram->onDrawFrame();
+        if (result != nullptr) *result = r;
+        return GlTest_readPixels(W, H);
+    }
+
+    std::vector<uint8_t> mSrc, mSrc2;
+    GlExternalTexture mInput, mInput2;
+    GlTarget mTarget;
+    sp<EglProgram> mProgram;
+};
+
+TEST(EglProgramTextTest, ShaderTextsAreExact) {
+    EXPECT_STREQ(EglProgram::kBaseFragmentCode,
+                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
+                 "lowp samplerExternalOES texSampler; varying highp vec2 v_texcoord; %s void "
+                 "main() { gl_FragColor = doEffect(); }");
+    EXPECT_STREQ(EglProgram::kBaseFragmentCode2,
+                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
+                 "lowp samplerExternalOES texSampler; uniform lowp samplerExternalOES "
+                 "texSampler2; varying highp vec2 v_texcoord; %s void main() { gl_FragColor = "
+                 "doEffect2(); }");
+    EXPECT_STREQ(EglProgram::kDefaultFragmentShader,
+                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
+                 "lowp samplerExternalOES texSampler; varying highp vec2 v_texcoord; void main() { "
+                 "gl_FragColor.rgb = texture2D(texSampler, v_texcoord).rgb; gl_FragColor.a = 1.0; "
+                 "}");
+    EXPECT_STREQ(EglProgram::kDefaultFragmentShader2D,
+                 "precision mediump float; uniform lowp sampler2D texSampler; varying highp vec2 "
+                 "v_texcoord; void main() { gl_FragColor.rgb = texture2D(texSampler, "
+                 "v_texcoord).rgb; gl_FragColor.a = 1.0; }");
+}
+
+TEST(EglProgramGeometryTest, SettersValidateAndDefault) {
+    sp<EglProgram> program = new EglProgram();
+    EXPECT_EQ(program->getCameraMode(), 10);
+    EXPECT_EQ(program->getCameraGeometryType(0), EglProgram::GEOMETRY_VFLIP);
+    EXPECT_EQ(program->getCameraGeometryType(1), EglProgram::GEOMETRY_ROTATE_180);
+    EXPECT_TRUE(program->getPreviewFlip());
+    EXPECT_TRUE(program->getDrawFlag());
+    EXPECT_EQ(program->getProgramID(), 0u);
+
+    EXPECT_EQ(program->setCameraGeometry(640, 480, 0, 0), 0);
+    EXPECT_EQ(program->getCameraWidth(), 640);
+    EXPECT_EQ(program->getCameraHeight(), 480);
+    EXPECT_EQ(program->getCameraWidth2(), 640);
+    EXPECT_EQ(program->getCameraHeight2(), 640);  // the width, not the height
+    EXPECT_EQ(program->setCameraGeometry(640, 480, 320, 240), 0);
+    EXPECT_EQ(program->getCameraWidth2(), 320);
+    EXPECT_EQ(program->getCameraHeight2(), 240);
+
+    LogCapture log;
+    EXPECT_EQ(program->setCameraGeometry(0, 480, 1, 1), -3);
+    EXPECT_EQ(program->setCameraGeometry(640, -1, 1, 1), -3);
+    EXPECT_EQ(program->getCameraWidth(), 640);
+    EXPECT_EQ(program->getCameraWidth2(), 320);
+    EXPECT_EQ(program->setPreviewGeometry(1280, 720, false), 0);
+    EXPECT_EQ(program->setPreviewGeometry(0, 480, true), -3);
+    EXPECT_EQ(program->getPreviewWidth(), 1280);
+    EXPECT_EQ(program->getPreviewHeight(), 720);
+    EXPECT_FALSE(program->getPreviewFlip());
+    EXPECT_EQ(log.count(""), 0u);
+    ASSERT_EQ(log.lines().size(), 3u);
+    EXPECT_EQ(log.lines()[0].text.rfind("VC_ERROR_INVALID_PARAM (-3): core/egl/EglProgram:", 0),
+              0u);
+
+    program->setCameraGeometryType(EglProgram::GEOMETRY_HFLIP, 0);
+    program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 7);
+    EXPECT_EQ(program->getCameraGeometryType(0), EglProgram::GEOMETRY_HFLIP);
+    EXPECT_EQ(program->getCameraGeometryType(1), EglProgram::GEOMETRY_NORMAL);
+}
+
+TEST_F(EglProgramTest, PassThroughDrawsEveryGeometryExactly) {
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    for (int type = 0; type <= 4; type++) {
+        mProgram->setCameraGeometryType(static_cast<EglProgram::GeometryType>(type), 0);
+        int result = -99;
+        std::vector<uint8_t> out = draw(&result);
+        EXPECT_EQ(result, 0);
+        EXPECT_EQ(out, opaque(expectedFor(mSrc, type))) << "geometry " << type;
+    }
+    EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));
+}
+
+TEST_F(EglProgramTest, DefaultOnlyDraws2DAndIgnoresEffects) {
+    ASSERT_EQ(mProgram->initialize(21, true), 0);
+    EXPECT_EQ(mProgram->getCameraMode(), 10);
+    EXPECT_FALSE(mProgram->getPreviewFlip());
+    TestFilter filter("vec4 doEffect() { return vec4(1.0); }");
+    mProgram->setFilter(&filter);
+    EXPECT_EQ(mProgram->getFilter(), nullptr);
+
+    GLuint texture = GlTest_makeTexture2D(W, H, mSrc.data());
+    glBindFramebuffer(GL_FRAMEBUFFER, mTarget.framebuffer);
+    glActiveTexture(GL_TEXTURE0);
+    glBindTexture(GL_TEXTURE_2D, texture);
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    ASSERT_EQ(mProgram->onDrawFrame(), 0);
+    EXPECT_EQ(GlTest_readPixels(W, H), opaque(mSrc));
+    EXPECT_EQ(filter.loads + filter.draws, 0);
+    glDeleteTextures(1, &texture);
+}
+
+TEST_F(EglProgramTest, EffectSnippetIsWrappedCompiledAndDrawn) {
+    TestFilter filter(
+        "vec4 doEffect() { vec4 c = texture2D(texSampler, v_texcoord); return vec4(1.0 - c.rgb, "
+        "c.a); }");
+    mProgram->setFilter(&filter);
+    LogCapture log;
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    EXPECT_TRUE(log.contains(
+        VF_LOG_DEBUG, "Loading effect fragment shader... mCameraMode = 10, getfilterType = 403"));
+    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "Successfully linked the GL program: #" +
+                                               std::to_string(mProgram->getProgramID())));
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    std::vector<uint8_t> out = draw();
+    ASSERT_EQ(out.size(), mSrc.size());
+    for (size_t i = 0; i < out.size(); i++) {
+        int want = (i % 4 == 3) ? mSrc[i] : 255 - mSrc[i];
+        EXPECT_NEAR(out[i], want, 1) << "byte " << i;
+    }
+    EXPECT_EQ(filter.loads, 1);
+    EXPECT_EQ(filter.draws, 1);
+}
+
+TEST_F(EglProgramTest, BrokenSnippetFallsBackToPassThrough) {
+    TestFilter filter("vec4 doEffect() { return undefined_thing; }");
+    mProgram->setFilter(&filter);
+    LogCapture log;
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    EXPECT_TRUE(
+        log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
+    EXPECT_TRUE(log.contains("Loading default fragment shader."));
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_VFLIP, 0);
+    int result = -99;
+    EXPECT_EQ(draw(&result), opaque(expectedFor(mSrc, EglProgram::GEOMETRY_VFLIP)));
+    EXPECT_EQ(result, 0);
+    // The effect still gets its per-frame call.
+    EXPECT_EQ(filter.draws, 1);
+}
+
+TEST_F(EglProgramTest, FailingEffectIsDroppedAndTheNextFrameIsPassThrough) {
+    TestFilter filter("vec4 doEffect() { return vec4(0.0, 0.0, 1.0, 1.0); }");
+    filter.drawResult = -1;
+    mProgram->setFilter(&filter);
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    GLuint oldProgram = mProgram->getProgramID();
+    LogCapture log;
+    int result = 0;
+    draw(&result);
+    EXPECT_EQ(result, -1);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "The filter returned -1 from onDrawFrame!"));
+    EXPECT_EQ(mProgram->getFilter(), nullptr);
+    EXPECT_EQ(filter.releasedWith, nullptr);  // dropped, not released or deleted
+    EXPECT_FALSE(glIsProgram(oldProgram));
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    EXPECT_EQ(draw(&result), opaque(mSrc));
+    EXPECT_EQ(result, 0);
+    EXPECT_EQ(filter.draws, 1);
+}
+
+TEST_F(EglProgramTest, ReplacingTheEffectReleasesTheOldOneAndReloadsOnTheNextFrame) {
+    TestFilter red("vec4 doEffect() { return vec4(1.0, 0.0, 0.0, 1.0); }");
+    TestFilter green("vec4 doEffect() { return vec4(0.0, 1.0, 0.0, 1.0); }");
+    mProgram->setFilter(&red);
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    std::vector<uint8_t> out = draw();
+    EXPECT_EQ(out[0], 255);
+    EXPECT_EQ(out[1], 0);
+
+    mProgram->setFilter(&green);
+    EXPECT_EQ(red.releasedWith, mProgram->getRecycler().get());
+    EXPECT_EQ(green.loads, 0);  // nothing happens before the next frame
+    LogCapture log;
+    out = draw();
+    EXPECT_TRUE(log.contains("Switching to new Effect Filter..."));
+    EXPECT_EQ(green.loads, 1);
+    for (size_t i = 0; i < out.size(); i += 4) {
+        ASSERT_EQ(out[i], 0);
+        ASSERT_EQ(out[i + 1], 255);
+    }
+
+    // Back to no effect: the pass-through again.
+    mProgram->setFilter(nullptr);
+    EXPECT_EQ(green.releasedWith, mProgram->getRecycler().get());
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    EXPECT_EQ(draw(), opaque(mSrc));
+}
+
+TEST_F(EglProgramTest, TwoInputModeUsesTheSecondTemplateAndTheFlipFlag) {
+    TestFilter second("vec4 doEffect2() { return texture2D(texSampler2, v_texcoord); }");
+    mProgram->setFilter(&second);
+    ASSERT_EQ(mProgram->initialize(20, false), 0);
+    EXPECT_STREQ(mProgram->getBaseFragmentCode(), EglProgram::kBaseFragmentCode2);
+    EXPECT_EQ(draw(), expectedFor(mSrc2, EglProgram::GEOMETRY_VFLIP));  // flip set
+    ASSERT_EQ(mProgram->setPreviewGeometry(W, H, false), 0);
+    // The camera-0 type does not matter with two inputs.
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_HFLIP, 0);
+    EXPECT_EQ(draw(), mSrc2);
+}
+
+TEST_F(EglProgramTest, DownloadableEffectSuppliesACompleteShader) {
+    TestFilter ext(
+        "precision mediump float; varying highp vec2 v_texcoord; void main() { gl_FragColor = "
+        "vec4(0.0, 0.0, 1.0, 1.0); }",
+        2000);
+    ext.mType = 2001;
+    mProgram->setFilter(&ext);
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    std::vector<uint8_t> out = draw();
+    EXPECT_EQ((std::vector<uint8_t>(out.begin(), out.begin() + 4)),
+              (std::vector<uint8_t>{0, 0, 255, 255}));
+
+    TestFilter none(nullptr, 2000);  // yields shader 0
+    mProgram->setFilter(&none);
+    LogCapture log;
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    EXPECT_EQ(draw(), opaque(mSrc));
+    bool reported = false;
+    for (const auto& l : log.texts())
+        if (l.rfind("VC_ERROR_UNKNOWN (-1): core/egl/EglProgram:", 0) == 0) reported = true;
+    EXPECT_TRUE(reported);
+    EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
+}
+
+// An effect that breaks the program itself (takes its vertex stage away):
+// even the default cannot link.
+class SabotageFilter : public TestFilter {
+public:
+    SabotageFilter() : TestFilter("") {}
+    int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int&) override {
+        program.getShader()->unBindVertexShader();
+        return -1;
+    }
+};
+
+TEST_F(EglProgramTest, UnlinkableDefaultMeansABlackScreen) {
+    SabotageFilter filter;
+    mProgram->setFilter(&filter);
+    LogCapture log;
+    EXPECT_EQ(mProgram->initialize(10, false), -1);
+    EXPECT_TRUE(log.contains(
+        VF_LOG_ERROR,
+        "Could not link the default GL program. This is really bad. Screen will go black!"));
+    EXPECT_EQ(mProgram->getProgramID(), 0u);
+}
+
+// An effect that does all its drawing itself (draw flag cleared).
+class SelfDrawingFilter : public TestFilter {
+public:
+    SelfDrawingFilter() : TestFilter("") {}
+    int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int& id) override {
+        program.setDrawFlag(false);
+        id = 0;
+        return 0;
+    }
+    int onDrawFrame(EglProgram&) override {
+        glClearColor(0.0f, 1.0f, 1.0f, 1.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+        return 0;
+    }
+};
+
+TEST_F(EglProgramTest, WithTheDrawFlagClearedTheEffectDrawsAlone) {
+    SelfDrawingFilter filter;
+    mProgram->setFilter(&filter);
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    EXPECT_FALSE(mProgram->getDrawFlag());
+    std::vector<uint8_t> out = draw();
+    for (size_t i = 0; i < out.size(); i += 4) {
+        ASSERT_EQ((std::vector<uint8_t>(out.begin() + i, out.begin() + i + 4)),
+                  (std::vector<uint8_t>{0, 255, 255, 255}));
+    }
+}
+
+TEST_F(EglProgramTest, TextureUnitsAreHandedOutUpToTheLimit) {
+    ASSERT_EQ(mProgram->initialize(10, false), 0);
+    GLint units = 0;
+    glGetIntegerv(GL_MAX_COMBINED_TEXTURE_IMAGE_UNITS, &units);
+    ASSERT_GT(units, 2);
+    EXPECT_EQ(mProgram->getMaxAvailableTextures(), units);
+    for (int expected = 2; expected <= units; expected++) {
+        ASSERT_EQ(mProgram->getNextAvailableTexture(), expected);
+    }
+    LogCapture log;
+    EXPECT_EQ(mProgram->getNextAvailableTexture(), -5);
+    EXPECT_EQ(mProgram->getNextAvailableTexture(), -5);
+    EXPECT_EQ(
+        log.count("EGL Error: Running out of available textures! Please check the filter code!"),
+        2u);
+    mProgram->resetAvailableTextures();
+    EXPECT_EQ(mProgram->getNextAvailableTexture(), 2);
+}
+
+TEST_F(EglProgramTest, RepeatedProgramsLeaveNoLiveGlObject) {
+    std::vector<GLuint> programs, shaders;
+    for (int i = 0; i < 15; i++) {
+        TestFilter filter("vec4 doEffect() { return texture2D(texSampler, v_texcoord); }");
+        filter.drawResult = (i % 3 == 2) ? -1 : 0;  // some take the failure path
+        sp<EglProgram> program = new EglProgram();
+        program->setFilter(&filter);
+        program->setPreviewGeometry(W, H, false);
+        ASSERT_EQ(program->initialize(10 + (i % 2) * 10, false), 0);
+        programs.push_back(program->getProgramID());
+        shaders.push_back(program->getShader()->getVertexId());
+        shaders.push_back(program->getShader()->getFragmentId());
+        program->onDrawFrame();
+        if (program->getShader() != nullptr) {
+            programs.push_back(program->getProgramID());
+            shaders.push_back(program->getShader()->getFragmentId());
+        }
+        program->release();
+        program->release();
+    }
+    for (GLuint p : programs) EXPECT_FALSE(glIsProgram(p)) << p;
+    for (GLuint s : shaders) EXPECT_FALSE(glIsShader(s)) << s;
+}
+
+}  // namespace
