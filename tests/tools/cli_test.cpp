@@ -13,8 +13,11 @@
 #include <string>
 #include <vector>
 
+#include <android/log.h>
+
 #include "core/KivImaging.h"
 #include "vccore/vc_file.h"
+#include "vccore/vc_log.h"
 
 namespace {
 
@@ -31,9 +34,14 @@ std::string readAll(const std::string& path) {
     return s.str();
 }
 
+void quietLog(int, const char*, ...) {}
+
 class Cli : public ::testing::Test {
 protected:
     void SetUp() override {
+        // The suite asks the factory about a thousand ids itself; keep its own log short.
+        VF_LogMsg = quietLog;
+        __android_log_set_minimum_priority(ANDROID_LOG_WARN);
         char tmpl[] = "/tmp/kivcli_test_XXXXXX";
         ASSERT_NE(nullptr, mkdtemp(tmpl));
         mDir = tmpl;
