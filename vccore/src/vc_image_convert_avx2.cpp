@@ -13,7 +13,19 @@ struct Avx2 {
     using V = __m256i;
     static V zero() { return _mm256_setzero_si256(); }
     static V load(const uint8_t* p) { return _mm256_loadu_si256(reinterpret_cast<const V*>(p)); }
-    static void store(uint8_t* p, V v) { _mm256_storeu_si256(reinterpret_cast<V*>(p), v); }
+    // Streaming stores go out as two aligned halves: heap blocks are only
+    // 16-byte aligned.
+    template <bool kStream = false>
+    static void store(uint8_t* p, V v) {
+        if (kStream) {
+            _mm_stream_si128(reinterpret_cast<__m128i*>(p), _mm256_castsi256_si128(v));
+            _mm_stream_si128(reinterpret_cast<__m128i*>(p + 16), _mm256_extracti128_si256(v, 1));
+        } else {
+            _mm256_storeu_si256(reinterpret_cast<V*>(p), v);
+        }
+    }
+    static bool streamable(const uint8_t* p) { return (reinterpret_cast<uintptr_t>(p) & 15) == 0; }
+    static void fence() { _mm_sfence(); }
     static void storeHalf(uint8_t* p, V v) {
         // Quadwords 0 and 2 hold the bytes of the two 128-bit lanes.
         _mm_storeu_si128(reinterpret_cast<__m128i*>(p),
@@ -57,18 +69,18 @@ struct Avx2 {
         const V grouped = _mm256_shufflehi_epi16(_mm256_shufflelo_epi16(w, 0xD8), 0xD8);
         return _mm256_permutevar8x32_epi32(grouped, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));
     }
-    // Pixels 0-3|16-19, 4-7|20-23, 8-11|24-27, 12-15|28-31 to 32 pixels in order.
-    static void storeQuads(uint8_t* p, V q0, V q1, V q2, V q3) {
-        store(p, _mm256_permute2x128_si256(q0, q1, 0x20));
-        store(p + 32, _mm256_permute2x128_si256(q2, q3, 0x20));
-        store(p + 64, _mm256_permute2x128_si256(q0, q1, 0x31));
-        store(p + 96, _mm256_permute2x128_si256(q2, q3, 0x31));
-    }
     static V mulhi16(V a, V b) { return _mm256_mulhi_epi16(a, b); }
     static V addsu8(V a, V b) { return _mm256_adds_epu8(a, b); }
     static V subsu8(V a, V b) { return _mm256_subs_epu8(a, b); }
     static V cmpeq16(V a, V b) { return _mm256_cmpeq_epi16(a, b); }
     static bool any(V a) { return _mm256_movemask_epi8(a) != 0; }
+    static V mullo16(V a, V b) { return _mm256_mullo_epi16(a, b); }
+    // Groups of 4 pixels (4 bytes of a byte plane) as 0 2 4 6 | 1 3 5 7, so
+    // that the in-lane unpacks of store4 yield 8 consecutive pixels per
+    // vector.
+    static V toStoreOrder(V v) {
+        return _mm256_permutevar8x32_epi32(v, _mm256_setr_epi32(0, 2, 4, 6, 1, 3, 5, 7));
+    }
     static V madd16(V a, V b) { return _mm256_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm256_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }
@@ -88,20 +100,17 @@ struct Avx2 {
         const __m128i vv = _mm_loadu_si128(reinterpret_cast<const __m128i*>(v));
         return _mm256_set_m128i(_mm_unpackhi_epi8(uu, vv), _mm_unpacklo_epi8(uu, vv));
     }
-    // Lane-wise unpacks give pixels 0-3|16-19, 4-7|20-23, 8-11|24-27, 12-15|28-31.
+    // Four byte planes in store order (see toStoreOrder) to 32 pixels.
+    template <bool kStream>
     static void store4(uint8_t* p, V b0, V b1, V b2, V b3) {
         const V t0 = _mm256_unpacklo_epi8(b0, b1);
         const V t1 = _mm256_unpackhi_epi8(b0, b1);
         const V t2 = _mm256_unpacklo_epi8(b2, b3);
         const V t3 = _mm256_unpackhi_epi8(b2, b3);
-        const V q0 = _mm256_unpacklo_epi16(t0, t2);
-        const V q1 = _mm256_unpackhi_epi16(t0, t2);
-        const V q2 = _mm256_unpacklo_epi16(t1, t3);
-        const V q3 = _mm256_unpackhi_epi16(t1, t3);
-        store(p, _mm256_permute2x128_si256(q0, q1, 0x20));
-        store(p + 32, _mm256_permute2x128_si256(q2, q3, 0x20));
-        store(p + 64, _mm256_permute2x128_si256(q0, q1, 0x31));
-        store(p + 96, _mm256_permute2x128_si256(q2, q3, 0x31));
+        store<kStream>(p, _mm256_unpacklo_epi16(t0, t2));
+        store<kStream>(p + 32, _mm256_unpackhi_epi16(t0, t2));
+        store<kStream>(p + 64, _mm256_unpacklo_epi16(t1, t3));
+        store<kStream>(p + 96, _mm256_unpackhi_epi16(t1, t3));
     }
 };
 

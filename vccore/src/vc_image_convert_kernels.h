@@ -30,6 +30,7 @@ template <class T>
 struct Kernels {
     using V = typename T::V;
     static constexpr int kBytes = static_cast<int>(sizeof(V));
+    static constexpr uint32_t kStreamBytes = 32u << 20;
 
     // Per-pixel R, G and B offsets of kBytes / 2 chroma pairs, as saturating
     // byte increments and decrements (each pixel of a pair gets the same).
@@ -38,18 +39,21 @@ struct Kernels {
         bool special;
     };
 
-    // Word offsets (one per pair, in pair order) to the two byte vectors.
+    // Word offsets (one per pair) to the two byte vectors; multiplying a
+    // byte value by 0x0101 copies it into both bytes of its word.
     static inline void splitOffsets(V off, V* pos, V* neg) {
-        const V zero = T::zero();
-        const V p = T::max16(off, zero);
-        const V n = T::max16(T::sub16(zero, off), zero);
-        *pos = T::or_(p, T::slli16(p, 8));
-        *neg = T::or_(n, T::slli16(n, 8));
+        const V p = T::max16(off, T::zero());
+        const V both = T::set1_16(0x0101);
+        *pos = T::mullo16(p, both);
+        *neg = T::mullo16(T::sub16(p, off), both);
     }
 
     // c: kBytes interleaved chroma bytes, U first unless kVU.
     template <bool kVU>
     static inline void pairOffsets(V c, Offsets* out) {
+        // Luma and chroma are both taken in the byte order the four-plane
+        // store expects (a fixed permutation of 4-pixel groups).
+        c = T::toStoreOrder(c);
         const V zero = T::zero();
         const V bias = T::set1_16(128);
         const V low = T::set1_16(0xff);
@@ -87,15 +91,15 @@ struct Kernels {
     }
 
     // One row of kBytes pixels: saturating byte arithmetic is the clamp.
-    template <class O>
+    template <class O, bool kStream>
     static inline void rgbRow(const uint8_t* luma, const Offsets& o, uint8_t* out) {
-        const V y = T::load(luma);
+        const V y = T::toStoreOrder(T::load(luma));
         V ch[4];
         ch[O::r] = T::subsu8(T::addsu8(y, o.rPos), o.rNeg);
         ch[O::g] = T::subsu8(T::addsu8(y, o.gPos), o.gNeg);
         ch[O::b] = T::subsu8(T::addsu8(y, o.bPos), o.bNeg);
         ch[O::a] = T::set1_8(-1);
-        T::store4(out, ch[0], ch[1], ch[2], ch[3]);
+        T::template store4<kStream>(out, ch[0], ch[1], ch[2], ch[3]);
     }
 
     template <class O>
@@ -108,7 +112,7 @@ struct Kernels {
     // or the U and V planes.
     template <bool kVU, bool kPlanar, class O>
     static void yuv420ToRgb32(const uint8_t* luma, const uint8_t* uv, const uint8_t* uPlane,
-                              const uint8_t* vPlane, int w, int h, uint8_t* dst) {
+                              const uint8_t* vPlane, int w, int h, uint8_t* dst, bool stream) {
         const bool planar = kPlanar;
         const size_t rowBytes = static_cast<size_t>(w) * 4;
         const int half = w / 2;
@@ -120,13 +124,19 @@ struct Kernels {
             const uint8_t* cRow = planar ? nullptr : uv + static_cast<size_t>(row) * w;
             const uint8_t* uRow = planar ? uPlane + static_cast<size_t>(row) * half : nullptr;
             const uint8_t* vRow = planar ? vPlane + static_cast<size_t>(row) * half : nullptr;
+            const bool streamRows = stream && T::streamable(d0) && T::streamable(d1);
             int x = 0;
             for (; x + kBytes <= w; x += kBytes) {
                 const V c = planar ? T::interleave(uRow + x / 2, vRow + x / 2) : T::load(cRow + x);
                 Offsets o;
                 pairOffsets<kVU>(c, &o);
-                rgbRow<O>(y0 + x, o, d0 + static_cast<size_t>(x) * 4);
-                rgbRow<O>(y1 + x, o, d1 + static_cast<size_t>(x) * 4);
+                if (streamRows) {
+                    rgbRow<O, true>(y0 + x, o, d0 + static_cast<size_t>(x) * 4);
+                    rgbRow<O, true>(y1 + x, o, d1 + static_cast<size_t>(x) * 4);
+                } else {
+                    rgbRow<O, false>(y0 + x, o, d0 + static_cast<size_t>(x) * 4);
+                    rgbRow<O, false>(y1 + x, o, d1 + static_cast<size_t>(x) * 4);
+                }
                 if (o.special) {
                     // The one chroma pair whose green the integer model cannot
                     // follow for every luma: redo its pixels exactly.
@@ -150,6 +160,7 @@ struct Kernels {
                 }
             }
         }
+        if (stream) T::fence();
     }
 
     template <bool kVU>
@@ -272,12 +283,20 @@ struct Kernels {
     }
 
     // Between 4-byte RGB formats: out byte k takes in byte from[k].
-    static void rgb32ToRgb32(const uint8_t* src, const int from[4], size_t pixels,
-                             uint8_t* dst) {
+    static void rgb32ToRgb32(const uint8_t* src, const int from[4], size_t pixels, uint8_t* dst,
+                             bool stream) {
         const int f0 = from[0], f1 = from[1], f2 = from[2], f3 = from[3];
         const typename T::Shuffle shuffle = T::makeShuffle(f0, f1, f2, f3);
         size_t i = 0;
         const size_t step = static_cast<size_t>(kBytes) / 4;
+        if (stream) {
+            // Write-combining stores once the destination is aligned.
+            for (; i < pixels && !T::streamable(dst + i * 4); ++i)
+                for (int k = 0; k < 4; ++k) dst[i * 4 + k] = src[i * 4 + from[k]];
+            for (; i + step <= pixels; i += step)
+                T::template store<true>(dst + i * 4, T::shuffle(T::load(src + i * 4), shuffle));
+            T::fence();
+        }
         for (; i + step <= pixels; i += step)
             T::store(dst + i * 4, T::shuffle(T::load(src + i * 4), shuffle));
         for (; i < pixels; ++i) {
@@ -304,6 +323,8 @@ struct Kernels {
     static bool convert(const VCImage* src, VCImage* dst) {
         const int w = src->width;
         const int h = src->height;
+        // Outputs far beyond any cache bypass it rather than evict everything.
+        const bool stream = VCImage_requiredSize(w, h, dst->format) >= kStreamBytes;
         int sp[4], dp[4];
         const bool srcRgb32 = rgb32Positions(src->format, sp);
         const bool dstRgb32 = rgb32Positions(dst->format, dp);
@@ -313,7 +334,7 @@ struct Kernels {
             from[dp[1]] = sp[1];
             from[dp[2]] = sp[2];
             from[dp[3]] = sp[3];
-            rgb32ToRgb32(src->data, from, static_cast<size_t>(w) * h, dst->data);
+            rgb32ToRgb32(src->data, from, static_cast<size_t>(w) * h, dst->data, stream);
             return true;
         }
         if (VCImage_isYUV420(src->format) && dstRgb32) {
@@ -326,15 +347,15 @@ struct Kernels {
                 switch (src->format) {
                     case VC_FORMAT_NV12:
                         yuv420ToRgb32<false, false, O>(d, d + l.uOffset, nullptr, nullptr, w, h,
-                                                       out);
+                                                       out, stream);
                         break;
                     case VC_FORMAT_NV21:
                         yuv420ToRgb32<true, false, O>(d, d + l.vOffset, nullptr, nullptr, w, h,
-                                                      out);
+                                                      out, stream);
                         break;
                     default:
                         yuv420ToRgb32<false, true, O>(d, nullptr, d + l.uOffset, d + l.vOffset, w,
-                                                      h, out);
+                                                      h, out, stream);
                         break;
                 }
             });

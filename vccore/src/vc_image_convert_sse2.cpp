@@ -12,7 +12,15 @@ struct Sse2 {
     using V = __m128i;
     static V zero() { return _mm_setzero_si128(); }
     static V load(const uint8_t* p) { return _mm_loadu_si128(reinterpret_cast<const V*>(p)); }
-    static void store(uint8_t* p, V v) { _mm_storeu_si128(reinterpret_cast<V*>(p), v); }
+    template <bool kStream = false>
+    static void store(uint8_t* p, V v) {
+        if (kStream)
+            _mm_stream_si128(reinterpret_cast<V*>(p), v);
+        else
+            _mm_storeu_si128(reinterpret_cast<V*>(p), v);
+    }
+    static bool streamable(const uint8_t* p) { return (reinterpret_cast<uintptr_t>(p) & 15) == 0; }
+    static void fence() { _mm_sfence(); }
     static void storeHalf(uint8_t* p, V v) { _mm_storel_epi64(reinterpret_cast<V*>(p), v); }
     static V set1_8(int v) { return _mm_set1_epi8(static_cast<char>(v)); }
     static V set1_16(int v) { return _mm_set1_epi16(static_cast<short>(v)); }
@@ -65,18 +73,13 @@ struct Sse2 {
     }
     // Words a0 b0 a2 b2 c0 d0 c2 d2 (of four 4-pixel vectors) to pixel order.
     static V pairOrder(V w) { return _mm_shufflehi_epi16(_mm_shufflelo_epi16(w, 0xD8), 0xD8); }
-    // Four vectors of four pixels, in order.
-    static void storeQuads(uint8_t* p, V q0, V q1, V q2, V q3) {
-        store(p, q0);
-        store(p + 16, q1);
-        store(p + 32, q2);
-        store(p + 48, q3);
-    }
     static V mulhi16(V a, V b) { return _mm_mulhi_epi16(a, b); }
     static V addsu8(V a, V b) { return _mm_adds_epu8(a, b); }
     static V subsu8(V a, V b) { return _mm_subs_epu8(a, b); }
     static V cmpeq16(V a, V b) { return _mm_cmpeq_epi16(a, b); }
     static bool any(V a) { return _mm_movemask_epi8(a) != 0; }
+    static V mullo16(V a, V b) { return _mm_mullo_epi16(a, b); }
+    static V toStoreOrder(V v) { return v; }
     static V madd16(V a, V b) { return _mm_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm_packus_epi16(a, b); }
@@ -92,15 +95,16 @@ struct Sse2 {
                                  _mm_loadl_epi64(reinterpret_cast<const V*>(v)));
     }
     // Four byte planes (byte 0 … byte 3 of every pixel) to 16 pixels.
+    template <bool kStream>
     static void store4(uint8_t* p, V b0, V b1, V b2, V b3) {
         const V t0 = _mm_unpacklo_epi8(b0, b1);
         const V t1 = _mm_unpackhi_epi8(b0, b1);
         const V t2 = _mm_unpacklo_epi8(b2, b3);
         const V t3 = _mm_unpackhi_epi8(b2, b3);
-        store(p, _mm_unpacklo_epi16(t0, t2));
-        store(p + 16, _mm_unpackhi_epi16(t0, t2));
-        store(p + 32, _mm_unpacklo_epi16(t1, t3));
-        store(p + 48, _mm_unpackhi_epi16(t1, t3));
+        store<kStream>(p, _mm_unpacklo_epi16(t0, t2));
+        store<kStream>(p + 16, _mm_unpackhi_epi16(t0, t2));
+        store<kStream>(p + 32, _mm_unpacklo_epi16(t1, t3));
+        store<kStream>(p + 48, _mm_unpackhi_epi16(t1, t3));
     }
 };
 
