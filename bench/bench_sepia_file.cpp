@@ -87,24 +87,31 @@ void BM_SepiaFile_Ours(benchmark::State& state) {
     processor->initialize();
     processor->setEffect(401);
     for (auto _ : state) {
-        auto start = std::chrono::steady_clock::now();
+        using Clock = std::chrono::steady_clock;
+        auto start = Clock::now();
         VCImage* nv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
         int rc = VCImage_loadFromFile(nv21, in.c_str());
         VCImage* rgba =
             rc == VC_OK ? VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA) : nullptr;
-        if (rgba != nullptr) {
+        bool ok = rgba != nullptr;
+        auto decoded = Clock::now(), processed = decoded;
+        if (ok) {
             rc = processor->doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data);
+            processed = Clock::now();
             unlink(out.c_str());
             if (rc == VC_OK) rc = VCImage_saveToFile(rgba, out.c_str(), kQuality);
         }
         VCImage_destroy(rgba);
         VCImage_destroy(nv21);
-        auto stop = std::chrono::steady_clock::now();
-        if (rgba == nullptr || rc != VC_OK || fileSize(out) <= 0) {
+        auto stop = Clock::now();
+        if (!ok || rc != VC_OK || fileSize(out) <= 0) {
             state.SkipWithError("our file path failed");
             break;
         }
         gOurs.push_back(std::chrono::duration<double>(stop - start).count());
+        gDecode.push_back(std::chrono::duration<double>(decoded - start).count());
+        gProcess.push_back(std::chrono::duration<double>(processed - decoded).count());
+        gEncode.push_back(std::chrono::duration<double>(stop - processed).count());
     }
     processor->release();
     BufferedProcessor_Destroy(processor);
