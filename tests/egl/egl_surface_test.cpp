@@ -1,6 +1,10 @@
 // EglWindowSurface as a 1x1 pbuffer: size rules, binding, swapping, release.
 #include <EGL/egl.h>
+#include <GLES2/gl2.h>
 #include <gtest/gtest.h>
+#include <gui/HostWindow.h>
+#include <system/window.h>
+#include <ui/GraphicBuffer.h>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglWindowSurface.h"
@@ -8,6 +12,8 @@
 #include "support/log_capture.h"
 #include "vccore/vc_log.h"
 
+using android::GraphicBuffer;
+using android::HostWindow;
 using android::sp;
 
 namespace {
@@ -80,6 +86,86 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
     }
     EXPECT_TRUE(sawCheckLine);
     EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
+}
+
+TEST_F(GlContextTest, PreviewWindowGetsThreeBuffersAndReceivesSwappedFrames) {
+    sp<HostWindow> window = new HostWindow(8, 4);
+    ASSERT_EQ(native_window_set_buffer_count(window.get(), 5), 0);
+    ASSERT_EQ(window->getBufferCount(), 5);
+    const uint64_t usage = window->getConsumerUsage();
+    sp<EglWindowSurface> surface =
+        new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
+    LogCapture log;
+    ASSERT_EQ(surface->initialize(), 0);
+    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "Setting max buffer count to 3"));
+    EXPECT_EQ(window->getBufferCount(), 3);
+    EXPECT_EQ(window->getConsumerUsage(), usage);  // only the software preview sets usage
+    EXPECT_EQ(surface->getWidth(), 8);
+    EXPECT_EQ(surface->getHeight(), 4);
+
+    ASSERT_EQ(surface->bindSurface(), 0);
+    glClearColor(1.0f, 0.0f, 0.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    ASSERT_EQ(surface->swapSurface(), 0);
+    ASSERT_EQ(window->queuedFrameCount(), 1u);
+    sp<GraphicBuffer> frame;
+    uint64_t number = 0;
+    int64_t timestamp = 0;
+    ASSERT_EQ(window->acquireFrame(&frame, &number, &timestamp), 0);
+    void* pixels = nullptr;
+    ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), 0);
+    const uint8_t* p = static_cast<const uint8_t*>(pixels);
+    EXPECT_EQ(p[0], 255);
+    EXPECT_EQ(p[1], 0);
+    EXPECT_EQ(p[2], 0);
+    EXPECT_EQ(p[3], 255);
+    frame->unlock();
+    window->releaseFrame(frame);
+
+    ASSERT_EQ(mGl->surface()->bindSurface(), 0);
+    surface->release();
+    EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
+    EXPECT_EQ(window->getConnectedApi(), 0);
+    // The surface gave its window reference back.
+    EXPECT_EQ(window->getStrongCount(), 1);
+}
+
+TEST_F(GlContextTest, WindowSizeIsAskedOfTheWindow) {
+    sp<HostWindow> window = new HostWindow(8, 4);
+    sp<EglWindowSurface> surface =
+        new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_RECORDING);
+    ASSERT_EQ(surface->initialize(), 0);
+    surface->setSize(32, 16);
+    EXPECT_EQ(surface->getWidth(), 32);
+    EXPECT_EQ(surface->getHeight(), 16);
+    // The window changed behind the surface's back: asked again, not cached.
+    ASSERT_EQ(native_window_set_buffers_dimensions(window.get(), 10, 6), 0);
+    EXPECT_EQ(surface->getWidth(), 10);
+    EXPECT_EQ(surface->getHeight(), 6);
+    surface->release();
+}
+
+TEST_F(GlContextTest, RecordingLeavesTheWindowAloneAndSoftwarePreviewSetsItsUsage) {
+    sp<HostWindow> recorder = new HostWindow(8, 4);
+    ASSERT_EQ(native_window_set_buffer_count(recorder.get(), 5), 0);
+    const uint64_t usage = recorder->getConsumerUsage();
+    sp<EglWindowSurface> recording =
+        new EglWindowSurface(mGl->env(), recorder, EglWindowSurface::SURFACE_RECORDING);
+    LogCapture log;
+    ASSERT_EQ(recording->initialize(), 0);
+    EXPECT_FALSE(log.contains("Setting max buffer count to 3"));
+    EXPECT_EQ(recorder->getBufferCount(), 5);
+    EXPECT_EQ(recorder->getConsumerUsage(), usage);
+    recording->release();
+
+    sp<HostWindow> preview = new HostWindow(8, 4);
+    ASSERT_NE(preview->getConsumerUsage(), 0x08002030u);
+    sp<EglWindowSurface> sw =
+        new EglWindowSurface(mGl->env(), preview, EglWindowSurface::SURFACE_PREVIEW_SW);
+    ASSERT_EQ(sw->initialize(), 0);
+    EXPECT_EQ(preview->getConsumerUsage(), 0x08002030u);
+    EXPECT_EQ(preview->getBufferCount(), 3);
+    sw->release();
 }
 
 }  // namespace
