@@ -175,35 +175,39 @@ struct Kernels {
         }
     }
 
-    // Luma, red and blue (32-bit lanes) of kBytes / 4 pixels of a 4-byte
-    // format. R and B always share a byte parity and G has the other, so two
-    // masks give (R, B) and (G, A) word pairs for the multiply-add.
+    // (R, B) word pairs of 4-byte pixels: R and B always share a byte parity
+    // (and G has the other).
     template <class O>
-    static inline void rgbToYuvLanes(V p, V* y, V* r, V* b) {
-        const V low = T::set1_16(0xff);
-        const V rb = T::and_(O::r % 2 == 0 ? p : T::srli16(p, 8), low);
-        const V ga = T::and_(O::g % 2 == 0 ? p : T::srli16(p, 8), low);
+    static inline V redBlueWords(V p) {
+        return T::and_(O::r % 2 == 0 ? p : T::srli16(p, 8), T::set1_16(0xff));
+    }
+
+    // Luma (32-bit lanes) of kBytes / 4 pixels of a 4-byte format.
+    template <class O>
+    static inline V lumaLanes(V p) {
+        const V rb = redBlueWords<O>(p);
+        const V ga = T::and_(O::g % 2 == 0 ? p : T::srli16(p, 8), T::set1_16(0xff));
         const bool rLow = O::r < 2;
         const bool gLow = O::g < 2;
         // 38470 G = 2 * 19235 G keeps the coefficient within 16 bits.
         const V sum = T::add32(
             T::madd16(rb, rLow ? T::pair16(19595, 7471) : T::pair16(7471, 19595)),
             T::slli32(T::madd16(ga, gLow ? T::pair16(19235, 0) : T::pair16(0, 19235)), 1));
-        *y = T::srai32(sum, 16);
-        const V word = T::set1_32(0xffff);
-        *r = rLow ? T::and_(rb, word) : T::srli32(rb, 16);
-        *b = rLow ? T::srli32(rb, 16) : T::and_(rb, word);
+        return T::srai32(sum, 16);
     }
 
-    // ((36962 d) >> 16) + 128 = ((18481 d) >> 15) + 128, d = B - Y in the low
-    // word of every 32-bit lane.
-    static inline V chromaU(V d) {
-        return T::add32(T::srai32(T::madd16(d, T::pair16(18481, 0)), 15), T::set1_32(128));
-    }
-    // ((46727 e) >> 16) + 128 = e + ((-18809 e) >> 16) + 128, e = R - Y.
-    static inline V chromaV(V e) {
-        return T::add32(T::add32(e, T::srai32(T::madd16(e, T::pair16(-18809, 0)), 16)),
-                        T::set1_32(128));
+    // B - Y and R - Y of the even pixels of two pixel vectors, in 32-bit lanes
+    // (combineEven order).
+    template <class O>
+    static inline void chromaDiffs(V p0, V p1, V y0, V y1, V* d, V* e) {
+        const V rb = redBlueWords<O>(T::combineEven(p0, p1));
+        const V y = T::combineEven(y0, y1);
+        const V word = T::set1_32(0xffff);
+        const bool rLow = O::r < 2;
+        const V r = rLow ? T::and_(rb, word) : T::srli32(rb, 16);
+        const V b = rLow ? T::srli32(rb, 16) : T::and_(rb, word);
+        *d = T::sub32(b, y);
+        *e = T::sub32(r, y);
     }
 
     // Four vectors of 32-bit lanes to kBytes clamped bytes in pixel order.
@@ -237,25 +241,29 @@ struct Kernels {
             uint8_t* vRow = planar ? vPlane + static_cast<size_t>(row / 2) * half : nullptr;
             int x = 0;
             for (; x + kBytes <= w; x += kBytes) {
-                V ys[4], rs[4], bs[4];
-                for (int i = 0; i < 4; ++i)
-                    rgbToYuvLanes<O>(T::load(s + (static_cast<size_t>(x) + i * kBytes / 4) * 4),
-                                     &ys[i], &rs[i], &bs[i]);
+                V ps[4], ys[4];
+                for (int i = 0; i < 4; ++i) {
+                    ps[i] = T::load(s + (static_cast<size_t>(x) + i * kBytes / 4) * 4);
+                    ys[i] = lumaLanes<O>(ps[i]);
+                }
                 T::store(yRow + x, packBytes(ys));
                 if (!chroma) continue;
-                // Only even pixels give chroma: pack the even lanes of two
-                // vectors into one before the arithmetic.
-                V u[2], v[2];
-                for (int i = 0; i < 2; ++i) {
-                    u[i] = chromaU(T::combineEven(T::sub32(bs[2 * i], ys[2 * i]),
-                                                  T::sub32(bs[2 * i + 1], ys[2 * i + 1])));
-                    v[i] = chromaV(T::combineEven(T::sub32(rs[2 * i], ys[2 * i]),
-                                                  T::sub32(rs[2 * i + 1], ys[2 * i + 1])));
-                }
+                // Only even pixels give chroma: their lanes of two vectors are
+                // packed into one, and two of those into 16-bit words.
+                V d[2], e[2];
+                chromaDiffs<O>(ps[0], ps[1], ys[0], ys[1], &d[0], &e[0]);
+                chromaDiffs<O>(ps[2], ps[3], ys[2], ys[3], &d[1], &e[1]);
+                const V d16 = T::packs32(d[0], d[1]);
+                const V e16 = T::packs32(e[0], e[1]);
+                const V bias = T::set1_16(128);
+                // (36962 d) >> 16 is the high half of 2d * 18481.
+                const V u = T::add16(T::mulhi16(T::add16(d16, d16), T::set1_16(18481)), bias);
+                // (46727 e) >> 16 = e + the high half of e * -18809.
+                const V v = T::add16(T::add16(e16, T::mulhi16(e16, T::set1_16(-18809))), bias);
                 const V zero = T::zero();
                 const V low = T::set1_16(0xff);
-                const V u16 = T::min16(T::max16(T::packs32(u[0], u[1]), zero), low);
-                const V v16 = T::min16(T::max16(T::packs32(v[0], v[1]), zero), low);
+                const V u16 = T::min16(T::max16(u, zero), low);
+                const V v16 = T::min16(T::max16(v, zero), low);
                 const bool uLow = planar || uFirst;
                 const V pairs = T::pairOrder(
                     T::or_(uLow ? u16 : v16, T::slli16(uLow ? v16 : u16, 8)));
@@ -296,6 +304,17 @@ struct Kernels {
             for (; i + step <= pixels; i += step)
                 T::template store<true>(dst + i * 4, T::shuffle(T::load(src + i * 4), shuffle));
             T::fence();
+        }
+        // Four vectors a turn keep more loads in flight.
+        for (; i + 4 * step <= pixels; i += 4 * step) {
+            const V a = T::load(src + i * 4);
+            const V b = T::load(src + (i + step) * 4);
+            const V c = T::load(src + (i + 2 * step) * 4);
+            const V d = T::load(src + (i + 3 * step) * 4);
+            T::store(dst + i * 4, T::shuffle(a, shuffle));
+            T::store(dst + (i + step) * 4, T::shuffle(b, shuffle));
+            T::store(dst + (i + 2 * step) * 4, T::shuffle(c, shuffle));
+            T::store(dst + (i + 3 * step) * 4, T::shuffle(d, shuffle));
         }
         for (; i + step <= pixels; i += step)
             T::store(dst + i * 4, T::shuffle(T::load(src + i * 4), shuffle));
