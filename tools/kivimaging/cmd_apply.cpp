@@ -140,6 +140,10 @@ int cmdApply(int argc, char** argv) {
     if (!runner.open(&error) || !runner.select(effect, args.get("parameter"), &error)) {
         return failure(error);
     }
+    if (args.has("parameter") && !runner.acceptsParameter()) {
+        fprintf(stderr, "kivimaging: warning: %s takes no parameters; -p is ignored\n",
+                effect.label.c_str());
+    }
 
     int written = 0;
     ProgressBar bar(stdout, static_cast<int>(jobs.size()), jobs.size() > 1 && isatty(1));

@@ -73,6 +73,15 @@ bool EffectRunner::select(const EffectChoice& choice, const std::string& paramet
     return true;
 }
 
+bool EffectRunner::acceptsParameter() const {
+    KivFilter* effect = mProcessor != nullptr ? mProcessor->getEffect() : nullptr;
+    const char* const* names = effect != nullptr ? effect->listOptionNames() : nullptr;
+    for (int i = 0; names != nullptr && names[i] != nullptr; i++) {
+        if (strcmp(names[i], "parameter") == 0) return true;
+    }
+    return false;
+}
+
 VCImage* EffectRunner::run(const VCImage* input, std::string* error) {
     if (mProcessor == nullptr || input == nullptr || input->data == nullptr ||
         input->format != VC_FORMAT_RGBA) {

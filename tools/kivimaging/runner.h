@@ -22,6 +22,9 @@ public:
     // Selects an effect and hands it the parameter string when one is given.
     // Fails when a library name ended in the pass-through fallback.
     bool select(const EffectChoice& choice, const std::string& parameter, std::string* error);
+    // Whether the selected effect has an option named "parameter" (the one
+    // the parameter string goes to).
+    bool acceptsParameter() const;
     // Renders `input` ("RGBA") into a new "RGBA" image of the same size.
     VCImage* run(const VCImage* input, std::string* error);
 
