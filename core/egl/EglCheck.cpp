@@ -34,6 +34,26 @@ const ErrorName kErrorNames[] = {
     {0x300E, "EGL_CONTEXT_LOST"},
 };
 
+// The statement text as the source has it on one line: a statement that the
+// formatter broke after an opening parenthesis stringifies as "f( a", so the
+// space the line break left there (or before a closing one) is taken out.
+class Statement {
+public:
+    explicit Statement(const char* text) {
+        size_t n = 0;
+        for (const char* p = text; *p != '\0' && n + 1 < sizeof(mText); p++) {
+            if (*p == ' ' && n > 0 && mText[n - 1] == '(') continue;
+            if (*p == ' ' && p[1] == ')') continue;
+            mText[n++] = *p;
+        }
+        mText[n] = '\0';
+    }
+    const char* c_str() const { return mText; }
+
+private:
+    char mText[512];
+};
+
 }  // namespace
 
 const char* EglErrorName(int code) {
@@ -63,14 +83,14 @@ bool EglCheck_gl(const char* statement, const char* source, int line) {
     if (error == GL_NO_ERROR) return true;
     const char* name = EglErrorName(static_cast<int>(error));
     EglLog(VF_LOG_ERROR, "GL Error: 0x%04x '%s' - %s at %s:%i", error, name ? name : "(null)",
-           statement, source, line);
+           Statement(statement).c_str(), source, line);
     return false;
 }
 
 static bool logEglError(EGLint error, const char* statement, const char* source, int line) {
     const char* name = EglErrorName(error);
     EglLog(VF_LOG_ERROR, "EGL Error: 0x%04x '%s' - %s at %s:%i", error, name ? name : "(null)",
-           statement, source, line);
+           Statement(statement).c_str(), source, line);
     return false;
 }
 

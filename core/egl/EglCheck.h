@@ -21,8 +21,10 @@
 //
 // The file using them defines VC_SOURCE (its path in the tree without
 // extension, e.g. "core/egl/EglEnvironment") before the first use. The text
-// logged is the macro argument exactly as written in the source, so write the
-// statement the way it should read in the log.
+// logged is the macro argument as written in the source, so write the
+// statement the way it should read in the log. A statement split over lines
+// logs as one line (line breaks become single spaces; a space left right
+// after "(" or before ")" by such a break is dropped).
 //
 // Example:
 //   EGLBoolean result;

@@ -65,11 +65,14 @@ int EglWindowSurface::initialize_l() {
     EGLDisplay display = mEglEnv->getEGLDisplay();
     EGLConfig config = mEglEnv->getEGLConfig();
     if (!isWindow) {
-        if (!EGL_CHECK(mEglSurface = eglCreatePbufferSurface(mEglEnv->getEGLDisplay(),
-                                                             mEglEnv->getEGLConfig(),
-                                                             EglEnvironment::sPbufferAttribs))) {
-            return VC_REPORT(VC_ERROR_UNKNOWN);
-        }
+        // Named locally so that the checked statement reads as it logs.
+        const EGLint* sPbufferAttribs = EglEnvironment::sPbufferAttribs;
+        // clang-format off
+        bool created = EGL_CHECK(mEglSurface = eglCreatePbufferSurface(mEglEnv->getEGLDisplay(),
+                                                                       mEglEnv->getEGLConfig(),
+                                                                       sPbufferAttribs));
+        // clang-format on
+        if (!created) return VC_REPORT(VC_ERROR_UNKNOWN);
     } else {
         // Through the seam: a device makes a real window surface, a host an
         // off-screen one whose swaps feed the window.
@@ -126,8 +129,9 @@ void EglWindowSurface::release_l() {
         if (mSurfaceType == SURFACE_PBUFFER) {
             ok = EGL_CHECK_BOOL(result = eglDestroySurface(mEglEnv->getEGLDisplay(), mEglSurface));
         } else {
-            ok = EGL_CHECK_BOOL(result = EglNativeSeam::get().destroySurface(
-                                    mEglEnv->getEGLDisplay(), mEglSurface));
+            EglNativeSeam& seam = EglNativeSeam::get();
+            ok =
+                EGL_CHECK_BOOL(result = seam.destroySurface(mEglEnv->getEGLDisplay(), mEglSurface));
         }
         if (!ok) EglLog(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed.");
     }

@@ -67,6 +67,21 @@ TEST_F(GlContextTest, GlCheckLogsTheStatementAsWritten) {
     // The check consumed the error.
     EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));
 
+    // A statement broken over lines logs as written on one line.
+    log.clear();
+    // clang-format off
+    EXPECT_FALSE(GL_CHECK(glBindTexture(
+        0x1234,
+        0)));
+    // clang-format on
+    ASSERT_EQ(log.lines().size(), 1u);
+    EXPECT_EQ(log.lines()[0].text.rfind(
+                  "GL Error: 0x0500 'GL_INVALID_ENUM' - glBindTexture(0x1234, 0) at "
+                  "tests/egl/egl_check_test:",
+                  0),
+              0u)
+        << log.lines()[0].text;
+
     log.clear();
     GLuint name = 0;
     line = __LINE__ + 1;

@@ -2,6 +2,9 @@
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
 #include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
 #include <gui/HostWindow.h>
 #include <system/window.h>
 #include <ui/GraphicBuffer.h>
@@ -86,6 +89,22 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
     }
     EXPECT_TRUE(sawCheckLine);
     EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
+
+    // A surface on the terminated display cannot be made.
+    log.clear();
+    sp<EglWindowSurface> late = new EglWindowSurface(env);
+    EXPECT_EQ(late->initialize(), -1);
+    std::vector<std::string> lines = log.texts();
+    ASSERT_EQ(lines.size(), 2u);
+    EXPECT_EQ(lines[0].rfind("EGL Error: 0x3001 'EGL_NOT_INITIALIZED' - mEglSurface = "
+                             "eglCreatePbufferSurface(mEglEnv->getEGLDisplay(), "
+                             "mEglEnv->getEGLConfig(), sPbufferAttribs) at "
+                             "core/egl/EglWindowSurface:",
+                             0),
+              0u)
+        << lines[0];
+    EXPECT_EQ(lines[1].rfind("VC_ERROR_UNKNOWN (-1): core/egl/EglWindowSurface:", 0), 0u);
+    late->release();
 }
 
 TEST_F(GlContextTest, PreviewWindowGetsThreeBuffersAndReceivesSwappedFrames) {
