@@ -251,21 +251,22 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
     VCImage_destroy(src);
     VCImage_destroy(dst);
 
-    // The class name, in any case, selects the same effect; a second run
-    // replaces the file (here a larger one) instead of writing into it.
+    // The class name, in any case, selects the same effect. A JPEG result
+    // replaces an existing (here larger) file instead of writing into it.
+    const std::string jpeg = path("neg.jpg");
     {
-        std::ofstream junk(out, std::ios::binary | std::ios::trunc);
+        std::ofstream junk(jpeg, std::ios::binary | std::ios::trunc);
         junk << std::string(1 << 20, 'x');
     }
-    r = run({"apply", "-e", "negative", "-p", "intensity=10", in, "-o", out});
+    r = run({"apply", "-e", "negative", "-p", "intensity=10", in, "-o", jpeg});
     ASSERT_EQ(0, r.status) << r.err;
     // Negative has no options: the parameter string is reported as ignored.
     EXPECT_NE(std::string::npos, r.err.find("403 Negative takes no parameters; -p is ignored"))
         << r.err;
     struct stat st;
-    ASSERT_EQ(0, stat(out.c_str(), &st));
+    ASSERT_EQ(0, stat(jpeg.c_str(), &st));
     EXPECT_LT(st.st_size, 1 << 20) << "the old file's tail survived";
-    VCImage* again = load(out);
+    VCImage* again = load(jpeg);
     ASSERT_NE(nullptr, again);
     EXPECT_EQ(w, again->width);
     VCImage_destroy(again);

@@ -58,7 +58,7 @@ bool imageSave(const VCImage* image, const std::string& path, int quality, std::
         *error = "cannot write '" + path + "': the name must end in .png, .jpg or .jpeg";
         return false;
     }
-    // The library writes over an existing file without truncating it.
+    // The library writes JPEG streams over an existing file without truncating it.
     if (unlink(path.c_str()) != 0 && errno != ENOENT) {
         *error = "cannot replace '" + path + "': " + strerror(errno);
         return false;
