@@ -190,8 +190,8 @@ int main(int argc, char** argv) {
     RatioReporter reporter;
     benchmark::RunSpecifiedBenchmarks(&reporter);
 
-    printf("\n%-12s %-10s %10s %10s %10s %12s %12s\n", "conversion", "size", "ours ms",
-           "libyuv ms", "memcpy ms", "ours/libyuv", "ours/memcpy");
+    printf("\n%-12s %-10s %10s %10s %10s %12s %12s\n", "conversion", "size", "ours ms", "libyuv ms",
+           "memcpy ms", "ours/libyuv", "ours/memcpy");
     for (const Case& c : kCases) {
         for (const Size& s : kSizes) {
             const double ours = reporter.time(label(c, s, "ours"));

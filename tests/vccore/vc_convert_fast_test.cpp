@@ -31,7 +31,9 @@ std::vector<int> vectorLevels() {
     return out;
 }
 
-int clampTo8(int v) { return v < 0 ? 0 : (v > 255 ? 255 : v); }
+int clampTo8(int v) {
+    return v < 0 ? 0 : (v > 255 ? 255 : v);
+}
 
 void doubleRgb(int y, int u, int v, int out[3]) {
     out[0] = clampTo8(static_cast<int>(y + 1.402 * (v - 128)));
@@ -94,8 +96,8 @@ TEST(VCConvertFast, YuvToRgbKernelsEqualDoubleForAllTriples) {
     }
     Buffer rgba(luma * 4);
     for (uint32_t format : {VC_FORMAT_NV12, VC_FORMAT_NV21}) {
-        VCImage* src = VCImage_createWrap(yuv.bytes.get(), w, h, format,
-                                          static_cast<int>(yuv.size), 0);
+        VCImage* src =
+            VCImage_createWrap(yuv.bytes.get(), w, h, format, static_cast<int>(yuv.size), 0);
         VCImage* dst = VCImage_createWrap(rgba.bytes.get(), w, h, VC_FORMAT_RGBA,
                                           static_cast<int>(rgba.size), 0);
         for (int level : vectorLevels()) {
@@ -138,7 +140,8 @@ TEST(VCConvertFast, RgbToYuvKernelsEqualTheEquationsForAllTriples) {
         for (int pass = 0; pass < 4; ++pass) {
             for (int y = 0; y < h; ++y) {
                 for (int x = 0; x < w; ++x) {
-                    const uint32_t t = static_cast<uint32_t>(y ^ (pass >> 1)) * w + (x ^ (pass & 1));
+                    const uint32_t t =
+                        static_cast<uint32_t>(y ^ (pass >> 1)) * w + (x ^ (pass & 1));
                     uint8_t* px = rgba.bytes.get() + (static_cast<size_t>(y) * w + x) * 4;
                     px[0] = static_cast<uint8_t>(t);
                     px[1] = static_cast<uint8_t>(t >> 8);
@@ -196,8 +199,8 @@ void compareLevels(uint32_t sf, uint32_t df, Size s, uint32_t srcOffset, uint32_
     memset(ref.bytes.get(), 0x5C, dstBytes + dstShift);
     memset(fast.bytes.get(), 0x5C, dstBytes + dstShift);
 
-    VCImage* in = VCImage_createWrap(src.bytes.get(), s.w, s.h, sf, static_cast<int>(srcBytes),
-                                     srcOffset);
+    VCImage* in =
+        VCImage_createWrap(src.bytes.get(), s.w, s.h, sf, static_cast<int>(srcBytes), srcOffset);
     VCImage* outRef = VCImage_createWrap(ref.bytes.get() + dstShift, s.w, s.h, df,
                                          static_cast<int>(dstBytes), dstOffset);
     VCImage* outFast = VCImage_createWrap(fast.bytes.get() + dstShift, s.w, s.h, df,
@@ -219,8 +222,8 @@ void compareLevels(uint32_t sf, uint32_t df, Size s, uint32_t srcOffset, uint32_
 
 const uint32_t kRgb32[] = {VC_FORMAT_RGBA, VC_FORMAT_BGRA, VC_FORMAT_ARGB, VC_FORMAT_ABGR};
 const uint32_t kYuv420[] = {VC_FORMAT_NV12, VC_FORMAT_NV21, VC_FORMAT_YV12, VC_FORMAT_YUVP};
-const Size kEven[] = {{2, 2},  {6, 4},  {14, 2},  {16, 2},   {30, 6},   {32, 4},   {34, 2},
-                      {62, 4}, {64, 2}, {66, 6},  {96, 2},   {998, 4},  {1000, 6}, {1026, 2}};
+const Size kEven[] = {{2, 2},  {6, 4},  {14, 2}, {16, 2}, {30, 6},  {32, 4},   {34, 2},
+                      {62, 4}, {64, 2}, {66, 6}, {96, 2}, {998, 4}, {1000, 6}, {1026, 2}};
 const Size kOdd[] = {{1, 1}, {3, 5}, {9, 3}, {33, 7}, {1001, 3}};
 
 }  // namespace

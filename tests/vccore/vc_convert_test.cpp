@@ -31,7 +31,9 @@ bool hasErrorLine(const LogCapture& log, const char* name, int code, const char*
     return false;
 }
 
-int clampTo8(int v) { return v < 0 ? 0 : (v > 255 ? 255 : v); }
+int clampTo8(int v) {
+    return v < 0 ? 0 : (v > 255 ? 255 : v);
+}
 
 // Written from the equations, with its own plane arithmetic.
 void expectRgb(int y, int u, int v, int* r, int* g, int* b) {
@@ -50,7 +52,8 @@ Yuv sampleAt(const std::vector<uint8_t>& buf, uint32_t format, int w, int h, int
     const size_t luma = static_cast<size_t>(w) * h;
     const size_t i = static_cast<size_t>(y) * w + x;
     switch (format) {
-        case VC_FORMAT_GREY: return {buf[i], 128, 128};
+        case VC_FORMAT_GREY:
+            return {buf[i], 128, 128};
         case VC_FORMAT_YUYV: {
             const size_t p = (i / 2) * 4;
             return {buf[i * 2], buf[p + 1], buf[p + 3]};
@@ -59,15 +62,20 @@ Yuv sampleAt(const std::vector<uint8_t>& buf, uint32_t format, int w, int h, int
             const size_t p = (i / 2) * 4;
             return {buf[i * 2], buf[p + 3], buf[p + 1]};
         }
-        default: break;
+        default:
+            break;
     }
     const size_t c = static_cast<size_t>(y / 2) * (w / 2) + x / 2;
     const size_t q = luma / 4;
     switch (format) {
-        case VC_FORMAT_NV12: return {buf[i], buf[chromaAt + 2 * c], buf[chromaAt + 2 * c + 1]};
-        case VC_FORMAT_NV21: return {buf[i], buf[chromaAt + 2 * c + 1], buf[chromaAt + 2 * c]};
-        case VC_FORMAT_YV12: return {buf[i], buf[chromaAt + q + c], buf[chromaAt + c]};
-        default: return {buf[i], buf[chromaAt + c], buf[chromaAt + q + c]};  // YUVP
+        case VC_FORMAT_NV12:
+            return {buf[i], buf[chromaAt + 2 * c], buf[chromaAt + 2 * c + 1]};
+        case VC_FORMAT_NV21:
+            return {buf[i], buf[chromaAt + 2 * c + 1], buf[chromaAt + 2 * c]};
+        case VC_FORMAT_YV12:
+            return {buf[i], buf[chromaAt + q + c], buf[chromaAt + c]};
+        default:
+            return {buf[i], buf[chromaAt + c], buf[chromaAt + q + c]};  // YUVP
     }
 }
 
@@ -83,8 +91,8 @@ struct RgbPos {
     int bpp, r, g, b, a;
 };
 const RgbPos kRgb[] = {
-    {VC_FORMAT_RGBA, 4, 0, 1, 2, 3}, {VC_FORMAT_BGRA, 4, 2, 1, 0, 3},
-    {VC_FORMAT_ARGB, 4, 1, 2, 3, 0}, {VC_FORMAT_ABGR, 4, 3, 2, 1, 0},
+    {VC_FORMAT_RGBA, 4, 0, 1, 2, 3},  {VC_FORMAT_BGRA, 4, 2, 1, 0, 3},
+    {VC_FORMAT_ARGB, 4, 1, 2, 3, 0},  {VC_FORMAT_ABGR, 4, 3, 2, 1, 0},
     {VC_FORMAT_RGB8, 3, 0, 1, 2, -1}, {VC_FORMAT_BGR8, 3, 2, 1, 0, -1},
 };
 const uint32_t kYuv[] = {VC_FORMAT_GREY, VC_FORMAT_YUYV, VC_FORMAT_YVYU, VC_FORMAT_NV12,
@@ -156,8 +164,8 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     smallHeader->height = 2;
     EXPECT_EQ(VC_OK, VCImage_convert(square, smallHeader));
 
-    for (VCImage* i : {rgba, nv21, odd, target, tall, yuyv, grey, oddYuyv, out, tight, square,
-                       smallHeader})
+    for (VCImage* i :
+         {rgba, nv21, odd, target, tall, yuyv, grey, oddYuyv, out, tight, square, smallHeader})
         VCImage_destroy(i);
 }
 
@@ -282,8 +290,7 @@ TEST(VCImageConvert, YuvToRgbMatchesTheEquationsForEverySourceAndTarget) {
         for (size_t displaced : {static_cast<size_t>(0), static_cast<size_t>(w * h + 8)}) {
             if (displaced != 0 && !VCImage_isYUV420(sf)) continue;
             std::vector<uint8_t> buf = randomBytes(3 * w * h, sf + displaced);
-            VCImage* src = VCImage_createWrap(buf.data(), w, h, sf,
-                                              static_cast<int>(buf.size()),
+            VCImage* src = VCImage_createWrap(buf.data(), w, h, sf, static_cast<int>(buf.size()),
                                               static_cast<uint32_t>(displaced));
             const size_t chromaAt = displaced != 0 ? displaced : static_cast<size_t>(w * h);
             for (const RgbPos& t : kRgb) {
@@ -315,13 +322,13 @@ TEST(VCImageConvert, RgbToYuvPointSamplesTheChroma) {
     const int w = 8, h = 6;
     for (const RgbPos& s : kRgb) {
         std::vector<uint8_t> px = randomBytes(static_cast<size_t>(w) * h * s.bpp, s.format);
-        VCImage* src = VCImage_createWrap(px.data(), w, h, s.format, static_cast<int>(px.size()),
-                                          0);
+        VCImage* src =
+            VCImage_createWrap(px.data(), w, h, s.format, static_cast<int>(px.size()), 0);
         for (uint32_t tf : kYuv) {
             std::vector<uint8_t> out(2 * w * h + 16, 0xAB);
             const uint32_t displaced = VCImage_isYUV420(tf) ? w * h + 16 : 0;
-            VCImage* dst = VCImage_createWrap(out.data(), w, h, tf, static_cast<int>(out.size()),
-                                              displaced);
+            VCImage* dst =
+                VCImage_createWrap(out.data(), w, h, tf, static_cast<int>(out.size()), displaced);
             ASSERT_EQ(VC_OK, VCImage_convert(src, dst));
             const size_t chromaAt = displaced != 0 ? displaced : static_cast<size_t>(w * h);
             for (int y = 0; y < h; ++y) {
@@ -355,8 +362,8 @@ TEST(VCImageConvert, YuvToYuvMovesChromaBetweenSubsamplings) {
         for (uint32_t tf : kYuv) {
             if (tf == sf) continue;
             std::vector<uint8_t> out(2 * w * h, 0);
-            VCImage* dst = VCImage_createWrap(out.data(), w, h, tf, static_cast<int>(out.size()),
-                                              0);
+            VCImage* dst =
+                VCImage_createWrap(out.data(), w, h, tf, static_cast<int>(out.size()), 0);
             ASSERT_EQ(VC_OK, VCImage_convert(src, dst));
             for (int y = 0; y < h; ++y) {
                 for (int x = 0; x < w; ++x) {

@@ -122,9 +122,8 @@ TEST(VCImageCrop, RgbAndEvery420Layout) {
             std::vector<uint8_t> buf(32 + gap + 16, 0);
             for (int i = 0; i < 32; ++i) buf[i] = static_cast<uint8_t>(i);
             for (int i = 0; i < 16; ++i) buf[32 + gap + i] = static_cast<uint8_t>(100 + i);
-            VCImage* yuv = VCImage_createWrap(buf.data(), 8, 4, format,
-                                              static_cast<int>(buf.size()),
-                                              gap != 0 ? 32 + gap : 0);
+            VCImage* yuv = VCImage_createWrap(
+                buf.data(), 8, 4, format, static_cast<int>(buf.size()), gap != 0 ? 32 + gap : 0);
             VCImage* part = VCImage_createEmpty(4, 2, format);
             ASSERT_EQ(VC_OK, VCImage_crop(yuv, part, 2, 2));
             const uint8_t wantLuma[8] = {18, 19, 20, 21, 26, 27, 28, 29};

@@ -8,9 +8,8 @@
 
 namespace {
 
-typedef void (*CscArgbToYuv420sp)(unsigned char* yDst, unsigned char* uvDst,
-                                  unsigned char* rgbSrc, unsigned int width,
-                                  unsigned int height);
+typedef void (*CscArgbToYuv420sp)(unsigned char* yDst, unsigned char* uvDst, unsigned char* rgbSrc,
+                                  unsigned int width, unsigned int height);
 
 }  // namespace
 

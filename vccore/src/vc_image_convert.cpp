@@ -11,7 +11,9 @@
 
 namespace {
 
-const char* fourcc(const uint32_t& format) { return reinterpret_cast<const char*>(&format); }
+const char* fourcc(const uint32_t& format) {
+    return reinterpret_cast<const char*>(&format);
+}
 
 // 4:2:2 and 4:2:0 formats need even widths, 4:2:0 even heights; grey is free.
 bool parityOk(uint32_t format, int width, int height) {

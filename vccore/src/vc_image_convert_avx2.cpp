@@ -35,8 +35,8 @@ struct Avx2 {
     static V set1_16(int v) { return _mm256_set1_epi16(static_cast<short>(v)); }
     static V set1_32(int v) { return _mm256_set1_epi32(v); }
     static V pair16(int lo, int hi) {
-        return _mm256_set1_epi32(static_cast<int>((static_cast<uint32_t>(hi) << 16) |
-                                                  static_cast<uint16_t>(lo)));
+        return _mm256_set1_epi32(
+            static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm256_add_epi16(a, b); }
     static V sub16(V a, V b) { return _mm256_sub_epi16(a, b); }
@@ -60,8 +60,6 @@ struct Avx2 {
     static V srli16(V a, int n) { return _mm256_srli_epi16(a, n); }
     static V min16(V a, V b) { return _mm256_min_epi16(a, b); }
     static V max16(V a, V b) { return _mm256_max_epi16(a, b); }
-    static V unpacklo32(V a, V b) { return _mm256_unpacklo_epi32(a, b); }
-    static V unpackhi32(V a, V b) { return _mm256_unpackhi_epi32(a, b); }
     static V combineEven(V a, V b) { return _mm256_blend_epi32(a, _mm256_slli_epi64(b, 32), 0xAA); }
     // Words of four 8-pixel vectors a..d, lane 0: a0 b0 a2 b2 c0 d0 c2 d2,
     // lane 1: a4 b4 a6 b6 c4 d4 c6 d6, to pixel order.
@@ -86,11 +84,6 @@ struct Avx2 {
     static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }
     static V unpacklo8(V a, V b) { return _mm256_unpacklo_epi8(a, b); }
     static V unpackhi8(V a, V b) { return _mm256_unpackhi_epi8(a, b); }
-    static V unpacklo16(V a, V b) { return _mm256_unpacklo_epi16(a, b); }
-    static V unpackhi16(V a, V b) { return _mm256_unpackhi_epi16(a, b); }
-    static bool anyEq32(V a, V b) {
-        return _mm256_movemask_epi8(_mm256_cmpeq_epi32(a, b)) != 0;
-    }
     // The two lane-wise packs leave 4-byte groups in the order 0 2 4 6 1 3 5 7.
     static V fixPackOrder(V v) {
         return _mm256_permutevar8x32_epi32(v, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));

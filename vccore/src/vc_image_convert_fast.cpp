@@ -51,9 +51,12 @@ int VCConvert_setLevel(int level) {
 bool VCConvert_fast(const VCImage* source, VCImage* destination) {
     switch (VCConvert_level()) {
 #if defined(__x86_64__)
-        case kVCConvertAvx2: return VCConvert_avx2(source, destination);
-        case kVCConvertSse2: return VCConvert_sse2(source, destination);
+        case kVCConvertAvx2:
+            return VCConvert_avx2(source, destination);
+        case kVCConvertSse2:
+            return VCConvert_sse2(source, destination);
 #endif
-        default: return false;
+        default:
+            return false;
     }
 }

@@ -18,11 +18,20 @@ struct Order {
 template <class F>
 static bool withOrder(uint32_t format, F&& f) {
     switch (format) {
-        case VC_FORMAT_RGBA: f(Order<0, 1, 2, 3>{}); return true;
-        case VC_FORMAT_BGRA: f(Order<2, 1, 0, 3>{}); return true;
-        case VC_FORMAT_ARGB: f(Order<1, 2, 3, 0>{}); return true;
-        case VC_FORMAT_ABGR: f(Order<3, 2, 1, 0>{}); return true;
-        default: return false;
+        case VC_FORMAT_RGBA:
+            f(Order<0, 1, 2, 3>{});
+            return true;
+        case VC_FORMAT_BGRA:
+            f(Order<2, 1, 0, 3>{});
+            return true;
+        case VC_FORMAT_ARGB:
+            f(Order<1, 2, 3, 0>{});
+            return true;
+        case VC_FORMAT_ABGR:
+            f(Order<3, 2, 1, 0>{});
+            return true;
+        default:
+            return false;
     }
 }
 
@@ -190,9 +199,9 @@ struct Kernels {
         const bool rLow = O::r < 2;
         const bool gLow = O::g < 2;
         // 38470 G = 2 * 19235 G keeps the coefficient within 16 bits.
-        const V sum = T::add32(
-            T::madd16(rb, rLow ? T::pair16(19595, 7471) : T::pair16(7471, 19595)),
-            T::slli32(T::madd16(ga, gLow ? T::pair16(19235, 0) : T::pair16(0, 19235)), 1));
+        const V sum =
+            T::add32(T::madd16(rb, rLow ? T::pair16(19595, 7471) : T::pair16(7471, 19595)),
+                     T::slli32(T::madd16(ga, gLow ? T::pair16(19235, 0) : T::pair16(0, 19235)), 1));
         return T::srai32(sum, 16);
     }
 
@@ -265,8 +274,8 @@ struct Kernels {
                 const V u16 = T::min16(T::max16(u, zero), low);
                 const V v16 = T::min16(T::max16(v, zero), low);
                 const bool uLow = planar || uFirst;
-                const V pairs = T::pairOrder(
-                    T::or_(uLow ? u16 : v16, T::slli16(uLow ? v16 : u16, 8)));
+                const V pairs =
+                    T::pairOrder(T::or_(uLow ? u16 : v16, T::slli16(uLow ? v16 : u16, 8)));
                 if (planar) {
                     T::storeHalf(uRow + x / 2, T::packus16(T::and_(pairs, low), zero));
                     T::storeHalf(vRow + x / 2, T::packus16(T::srli16(pairs, 8), zero));
@@ -369,8 +378,8 @@ struct Kernels {
                                                        out, stream);
                         break;
                     case VC_FORMAT_NV21:
-                        yuv420ToRgb32<true, false, O>(d, d + l.vOffset, nullptr, nullptr, w, h,
-                                                      out, stream);
+                        yuv420ToRgb32<true, false, O>(d, d + l.vOffset, nullptr, nullptr, w, h, out,
+                                                      stream);
                         break;
                     default:
                         yuv420ToRgb32<false, true, O>(d, nullptr, d + l.uOffset, d + l.vOffset, w,
@@ -388,8 +397,7 @@ struct Kernels {
                 using O = decltype(order);
                 switch (dst->format) {
                     case VC_FORMAT_NV12:
-                        rgb32ToYuv420<O, false>(in, w, h, d, d + l.uOffset, true, nullptr,
-                                                nullptr);
+                        rgb32ToYuv420<O, false>(in, w, h, d, d + l.uOffset, true, nullptr, nullptr);
                         break;
                     case VC_FORMAT_NV21:
                         rgb32ToYuv420<O, false>(in, w, h, d, d + l.vOffset, false, nullptr,

@@ -26,8 +26,8 @@ struct Sse2 {
     static V set1_16(int v) { return _mm_set1_epi16(static_cast<short>(v)); }
     static V set1_32(int v) { return _mm_set1_epi32(v); }
     static V pair16(int lo, int hi) {
-        return _mm_set1_epi32(static_cast<int>((static_cast<uint32_t>(hi) << 16) |
-                                               static_cast<uint16_t>(lo)));
+        return _mm_set1_epi32(
+            static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm_add_epi16(a, b); }
     static V sub16(V a, V b) { return _mm_sub_epi16(a, b); }
@@ -58,15 +58,13 @@ struct Sse2 {
         const V ff = _mm_set1_epi32(0xff);
         V out = _mm_setzero_si128();
         for (int k = 0; k < 4; ++k)
-            out = _mm_or_si128(out, _mm_sll_epi32(_mm_and_si128(_mm_srl_epi32(p, s.in[k]), ff),
-                                                  s.out[k]));
+            out = _mm_or_si128(
+                out, _mm_sll_epi32(_mm_and_si128(_mm_srl_epi32(p, s.in[k]), ff), s.out[k]));
         return out;
     }
     static V srli16(V a, int n) { return _mm_srli_epi16(a, n); }
     static V min16(V a, V b) { return _mm_min_epi16(a, b); }
     static V max16(V a, V b) { return _mm_max_epi16(a, b); }
-    static V unpacklo32(V a, V b) { return _mm_unpacklo_epi32(a, b); }
-    static V unpackhi32(V a, V b) { return _mm_unpackhi_epi32(a, b); }
     // Even 32-bit lanes of a, with the even lanes of b in between.
     static V combineEven(V a, V b) {
         return _mm_or_si128(_mm_and_si128(a, _mm_set_epi32(0, -1, 0, -1)), _mm_slli_epi64(b, 32));
@@ -85,9 +83,6 @@ struct Sse2 {
     static V packus16(V a, V b) { return _mm_packus_epi16(a, b); }
     static V unpacklo8(V a, V b) { return _mm_unpacklo_epi8(a, b); }
     static V unpackhi8(V a, V b) { return _mm_unpackhi_epi8(a, b); }
-    static V unpacklo16(V a, V b) { return _mm_unpacklo_epi16(a, b); }
-    static V unpackhi16(V a, V b) { return _mm_unpackhi_epi16(a, b); }
-    static bool anyEq32(V a, V b) { return _mm_movemask_epi8(_mm_cmpeq_epi32(a, b)) != 0; }
     static V fixPackOrder(V v) { return v; }
     // kBytes / 2 U bytes and as many V bytes, interleaved U, V, U, V …
     static V interleave(const uint8_t* u, const uint8_t* v) {

@@ -11,15 +11,16 @@
 
 namespace {
 
-typedef void* (*CscInit)(int width, int height, uint32_t sourceFormat,
-                         uint32_t destinationFormat);
+typedef void* (*CscInit)(int width, int height, uint32_t sourceFormat, uint32_t destinationFormat);
 typedef void (*CscRelease)(void* state);
 typedef int (*CscConvert)(void* state, const VCImage* source, VCImage* destination);
 
 // Cleared for good once the library or one of its entries is found missing.
 std::atomic<bool> gCscAvailable{true};
 
-const char* fourcc(const uint32_t& format) { return reinterpret_cast<const char*>(&format); }
+const char* fourcc(const uint32_t& format) {
+    return reinterpret_cast<const char*>(&format);
+}
 
 }  // namespace
 

@@ -13,7 +13,9 @@
 
 namespace {
 
-const char* fourcc(const uint32_t& format) { return reinterpret_cast<const char*>(&format); }
+const char* fourcc(const uint32_t& format) {
+    return reinterpret_cast<const char*>(&format);
+}
 
 // True when every plane of the image lies inside the bytes it declares.
 bool planesFit(const VCImage* image) {
@@ -32,7 +34,9 @@ void copyRows(const uint8_t* src, size_t srcStride, uint8_t* dst, size_t dstStri
     for (int i = 0; i < rows; ++i) memcpy(dst + i * dstStride, src + i * srcStride, bytes);
 }
 
-inline int floorHalf(int twice) { return twice >= 0 ? twice / 2 : -((1 - twice) / 2); }
+inline int floorHalf(int twice) {
+    return twice >= 0 ? twice / 2 : -((1 - twice) / 2);
+}
 
 // Rotates 4-byte pixels about a pivot; the output buffer is cleared first.
 void rotatePixels(const uint8_t* in, int w, int h, int orient, int px, int py, uint8_t* out,
@@ -102,8 +106,7 @@ extern "C" int VCImage_scale(const VCImage* source, VCImage* destination) {
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
     }
     if (source->format != VC_FORMAT_RGBA || destination->format != VC_FORMAT_RGBA) {
-        VF_LogMsg(VF_LOG_ERROR, "%s supports only ANDROID_BITMAP format for now",
-                  "VCImage_scale");
+        VF_LogMsg(VF_LOG_ERROR, "%s supports only ANDROID_BITMAP format for now", "VCImage_scale");
         return VC_REPORT(VC_ERROR_INVALID_PARAM);
     }
     if (destination->data == nullptr) {
@@ -253,8 +256,8 @@ extern "C" int VCImage_drawImage(const VCImage* source, VCImage* destination, in
     if (VCImage_rgbLayout(source->format, &rgb)) {
         const size_t bpp = static_cast<size_t>(rgb.bytesPerPixel);
         copyRows(source->data + (static_cast<size_t>(srcY) * sw + srcX) * bpp, sw * bpp,
-                 destination->data + (static_cast<size_t>(dstY) * dw + dstX) * bpp, dw * bpp,
-                 lines, cols * bpp);
+                 destination->data + (static_cast<size_t>(dstY) * dw + dstX) * bpp, dw * bpp, lines,
+                 cols * bpp);
         return VC_OK;
     }
     if (!VCImage_isYUV420(source->format)) return VC_REPORT(VC_ERROR_UNSUPPORTED);

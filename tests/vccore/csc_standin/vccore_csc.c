@@ -20,7 +20,9 @@ void* vc_csc_init(int width, int height, uint32_t sourceFormat, uint32_t destina
     return state;
 }
 
-void vc_csc_release(void* state) { free(state); }
+void vc_csc_release(void* state) {
+    free(state);
+}
 
 #ifndef KIV_CSC_PARTIAL
 int vc_csc_convert(void* state, const void* source, void* destination) {
