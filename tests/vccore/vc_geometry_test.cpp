@@ -65,6 +65,14 @@ TEST(VCImageScale, RefusesBadInput) {
     EXPECT_TRUE(
         log.contains(VF_LOG_ERROR, "VCImage_scale supports only ANDROID_BITMAP format for now"));
     EXPECT_EQ(nullptr, dst->data);
+
+    // A target too large to allocate reports the allocation's own error.
+    VCImage* huge = VCImage_createEmpty(40000, 40000, VC_FORMAT_RGBA);
+    log.clear();
+    EXPECT_EQ(VC_ERROR_INVALID_PARAM, VCImage_scale(src, huge));
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "VCImage_scale: allocation failed (0 bytes)"));
+    EXPECT_EQ(nullptr, huge->data);
+    VCImage_destroy(huge);
     VCImage_destroy(src);
     VCImage_destroy(dst);
 }
