@@ -5,6 +5,7 @@
 // (full-range BT.601) constants, the equations ours implement.
 #include <benchmark/benchmark.h>
 #include <stdio.h>
+#include <stdlib.h>
 #include <string.h>
 
 #include <initializer_list>
@@ -153,6 +154,9 @@ private:
 int main(int argc, char** argv) {
     // (Pass any --benchmark_* flag to replace the defaults below.)
     VF_LogMsg = silentLog;  // the per-call debug line is not what is measured
+    // KIV_BENCH_CONVERT_LEVEL=0/1/2 caps the vector level (scalar, SSE2, AVX2).
+    const char* cap = getenv("KIV_BENCH_CONVERT_LEVEL");
+    if (cap != nullptr) VCConvert_setLevel(atoi(cap));
     const char* levels[] = {"scalar", "SSE2", "AVX2"};
     printf("vector level: %s\n", levels[VCConvert_level()]);
     for (const Case& c : kCases)
