@@ -452,10 +452,13 @@ VCImage* EglImage::getImageData() {
             VC_REPORT(VC_ERROR_ALLOC_FAILED);
             return nullptr;
         }
+        // The caller's framebuffer stays bound afterwards.
+        GLint previous = 0;
+        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &previous);
         bool ok = GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, mFrameBuffer)) &&
                   GL_CHECK(glReadPixels(0, 0, mWidth, mHeight, GL_RGBA, GL_UNSIGNED_BYTE,
                                         (GLvoid*)(wrap->data)));
-        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, 0));
+        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)previous));
         if (!ok) {
             VCImage_destroy(wrap);
             return nullptr;
@@ -490,10 +493,14 @@ int EglImage::flushCache() {
         return VC_ERROR_INVALID_STATE;
     }
     if (mType == IMAGE_FRAMEBUFFER || mType == IMAGE_EXTERNAL_FRAMEBUFFER) {
+        // Callers flush right before drawing into this framebuffer, so the
+        // binding they made is given back rather than reset to 0.
+        GLint previous = 0;
+        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &previous);
         GLubyte texel[4];
         bool ok = GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, mFrameBuffer)) &&
                   GL_CHECK(glReadPixels(0, 0, 1, 1, GL_RGBA, GL_UNSIGNED_BYTE, &texel));
-        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, 0));
+        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)previous));
         if (!ok) return VC_ERROR_UNKNOWN;
     }
     if (mType == IMAGE_EXTERNAL || mType == IMAGE_EXTERNAL_FRAMEBUFFER) {
