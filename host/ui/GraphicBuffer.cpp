@@ -184,6 +184,12 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
     // GPU rendering into the mirror reaches the CPU copy here.
     if (mMirrorTexture != 0 && (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty)) {
         if (!readback_l()) return UNKNOWN_ERROR;
+        // Kept to spot an unchanged copy at unlock: sending it back up would
+        // cost a transfer, and for YUV would replace the rendered RGBA with a
+        // converted round trip of it.
+        if ((inUsage & USAGE_SW_WRITE_MASK) != 0) {
+            mReadbackCopy.assign(mData, mData + mDataSize);
+        }
         mGpuDirty = false;
     }
     mLockUsage = inUsage;
@@ -227,6 +233,11 @@ status_t GraphicBuffer::unlock() {
     if (mLockUsage == 0) return INVALID_OPERATION;
     bool wrote = (mLockUsage & USAGE_SW_WRITE_MASK) != 0;
     mLockUsage = 0;
+    if (wrote && !mReadbackCopy.empty() &&
+        memcmp(mReadbackCopy.data(), mData, mReadbackCopy.size()) == 0) {
+        wrote = false;  // the mirror already holds exactly this
+    }
+    mReadbackCopy.clear();
     // CPU writes reach the GPU before its next use.
     if (wrote && mMirrorTexture != 0 && !upload_l()) return UNKNOWN_ERROR;
     return NO_ERROR;

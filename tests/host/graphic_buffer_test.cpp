@@ -251,6 +251,19 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     EXPECT_EQ(static_cast<uint8_t*>(address)[1], 255);
     EXPECT_EQ(static_cast<uint8_t*>(address)[0], 0);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+
+    // A read-write lock that changes nothing sends nothing back up; a change does.
+    const uint32_t readWrite =
+        GraphicBuffer::USAGE_SW_READ_OFTEN | GraphicBuffer::USAGE_SW_WRITE_OFTEN;
+    ASSERT_EQ(buffer->lock(readWrite, &address), android::NO_ERROR);
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(buffer->getUploadCount(), 0u);
+    ASSERT_EQ(buffer->lock(readWrite, &address), android::NO_ERROR);
+    static_cast<uint8_t*>(address)[0] = 99;
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(buffer->getUploadCount(), 1u);
+    view.bind();
+    EXPECT_EQ(GlTest_readPixels(1, 1)[0], 99);
 }
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {

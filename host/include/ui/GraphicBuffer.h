@@ -12,7 +12,8 @@
 //    the texture back (RGBA converted to the buffer's format), so GPU
 //    rendering reaches the CPU. A lock on a thread with a current context
 //    fences that context first; any other thread relies on the renderer
-//    having flushed (glFlush, glFinish or a swap), as on a device.
+//    having flushed (glFlush, glFinish or a swap), as on a device. If the
+//    CPU leaves the read-back pixels unchanged, its unlock sends nothing up.
 // Texture-only buffers never read back: their CPU copy is the original and
 // a YUV->RGBA->YUV round trip would lose precision.
 #ifndef KIV_HOST_UI_GRAPHICBUFFER_H
@@ -23,6 +24,7 @@
 #include <atomic>
 #include <mutex>
 #include <string>
+#include <vector>
 
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
@@ -141,6 +143,9 @@ private:
     unsigned int mMirrorTexture;  // GL name in the host graphics context, 0 when none
     int mImageCount;
     bool mGpuDirty;
+    // The CPU copy as the last readback left it, while that lock is held: an
+    // unlock that finds it unchanged has nothing to send back up.
+    std::vector<unsigned char> mReadbackCopy;
     std::atomic<uint32_t> mUploadCount;
     std::atomic<uint32_t> mReadbackCount;
 };
