@@ -1,6 +1,7 @@
 #include "HostGl.h"
 
 #include <dlfcn.h>
+#include <link.h>
 #include <stdlib.h>
 #include <string.h>
 
@@ -191,6 +192,17 @@ std::map<EGLDisplay, int>& references() {
     return *map;
 }
 
+// Mesa loads its DRI driver at the first eglInitialize and unloads it at the
+// last eglTerminate. Unloading throws away the driver's once-only state (each
+// new display pays to rebuild it) and leaves its static allocations pointing
+// from code that is gone, which leak checkers report as ours. Keep it resident.
+int pinDriver(struct dl_phdr_info* info, size_t, void*) {
+    if (info->dlpi_name != nullptr && strstr(info->dlpi_name, "_dri.so") != nullptr) {
+        dlopen(info->dlpi_name, RTLD_NOW | RTLD_NOLOAD | RTLD_NODELETE);
+    }
+    return 0;
+}
+
 template <typename T>
 T nextSymbol(const char* name) {
     return reinterpret_cast<T>(dlsym(RTLD_NEXT, name));
@@ -203,7 +215,7 @@ extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* m
         nextSymbol<EGLBoolean (*)(EGLDisplay, EGLint*, EGLint*)>("eglInitialize");
     std::lock_guard<std::mutex> guard(referencesLock());
     EGLBoolean result = next(display, major, minor);
-    if (result == EGL_TRUE) ++references()[display];
+    if (result == EGL_TRUE && references()[display]++ == 0) dl_iterate_phdr(pinDriver, nullptr);
     return result;
 }
 

@@ -3,6 +3,8 @@
 #ifndef KIV_TESTS_CORE_TEST_EFFECTS_H
 #define KIV_TESTS_CORE_TEST_EFFECTS_H
 
+#include <atomic>
+
 #include "core/KivFilter.h"
 #include "core/KivFilterOptions.h"
 
@@ -44,7 +46,7 @@ public:
     bool wantsWorkImage = true;
     bool valueFlagSupported = true;
 
-    static inline int sLive = 0;  // instances alive, to see deletions
+    static inline std::atomic<int> sLive{0};  // instances alive, to see deletions (any thread)
 
 private:
     int mType;

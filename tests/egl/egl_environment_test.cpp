@@ -44,7 +44,6 @@ TEST(EglEnvironmentTest, InitializeBuildsAnEs2ContextOnAnRgba8888PbufferConfig) 
 
     LogCapture log;
     ASSERT_EQ(env->initialize(), 0);
-    GlTest_keepDriverLoaded();
     EXPECT_TRUE(log.lines().empty());
     EXPECT_TRUE(env->isInitialized());
     EGLDisplay display = env->getEGLDisplay();
@@ -78,7 +77,6 @@ TEST(EglEnvironmentTest, PendingEglErrorIsClearedAndLoggedOnce) {
     LogCapture log;
     sp<EglEnvironment> env = new EglEnvironment();
     ASSERT_EQ(env->initialize(), 0);
-    GlTest_keepDriverLoaded();
     ASSERT_EQ(log.lines().size(), 1u);
     EXPECT_EQ(log.lines()[0].level, VF_LOG_ERROR);
     EXPECT_EQ(log.lines()[0].text.rfind(

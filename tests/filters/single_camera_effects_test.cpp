@@ -1,7 +1,6 @@
 // The fixed single-pass looks: what the factory builds for their ids, and what
 // each renders through EglProgram on llvmpipe compared with the independent
 // CPU statement of its math (tests/support/look_reference).
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -21,17 +20,6 @@
 
 namespace {
 
-// Mesa unloads its DRI driver at eglTerminate, after which whatever the driver
-// still referenced looks leaked to LeakSanitizer. Keeping the driver loaded
-// keeps those references visible, so real leaks stand out.
-[[maybe_unused]] const bool kMesaDriverPinned = [] {
-    for (const char* dir : {"/usr/lib/x86_64-linux-gnu/dri/", "/usr/lib/aarch64-linux-gnu/dri/",
-                            "/usr/lib64/dri/", "/usr/lib/dri/"}) {
-        std::string path = std::string(dir) + "swrast_dri.so";
-        if (dlopen(path.c_str(), RTLD_NOW | RTLD_NODELETE) != nullptr) return true;
-    }
-    return false;
-}();
 
 // A member that keeps the base snippet.
 class BaseSnippetEffect : public SingleCameraEffects {

@@ -2,7 +2,6 @@
 // RGBA, BGRA and NV21 paths compared with the CPU statement of its math, the
 // effect fallbacks, status codes, log lines, and GL objects and memory over
 // many calls.
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <EGL/egl.h>
@@ -24,17 +23,6 @@
 
 namespace {
 
-// Mesa unloads its DRI driver at eglTerminate, after which whatever the driver
-// still referenced looks leaked to LeakSanitizer. Keeping the driver loaded
-// keeps those references visible, so real leaks stand out.
-[[maybe_unused]] const bool kMesaDriverPinned = [] {
-    for (const char* dir : {"/usr/lib/x86_64-linux-gnu/dri/", "/usr/lib/aarch64-linux-gnu/dri/",
-                            "/usr/lib64/dri/", "/usr/lib/dri/"}) {
-        std::string path = std::string(dir) + "swrast_dri.so";
-        if (dlopen(path.c_str(), RTLD_NOW | RTLD_NODELETE) != nullptr) return true;
-    }
-    return false;
-}();
 
 // Compares a rendered RGBA picture with the reference of `look` over `picture`;
 // pixels at a hard threshold of the look are skipped but must stay rare (under

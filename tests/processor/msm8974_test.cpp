@@ -2,7 +2,6 @@
 // around each draw and logs the maximum texture size both ways. Mesa does not
 // know the switch (it records GL_INVALID_ENUM), which must not disturb the
 // draw. Its own program: the platform is detected once per process.
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <GLES2/gl2.h>
@@ -18,17 +17,6 @@
 
 namespace {
 
-// Mesa unloads its DRI driver at eglTerminate, after which whatever the driver
-// still referenced looks leaked to LeakSanitizer. Keeping the driver loaded
-// keeps those references visible, so real leaks stand out.
-[[maybe_unused]] const bool kMesaDriverPinned = [] {
-    for (const char* dir : {"/usr/lib/x86_64-linux-gnu/dri/", "/usr/lib/aarch64-linux-gnu/dri/",
-                            "/usr/lib64/dri/", "/usr/lib/dri/"}) {
-        std::string path = std::string(dir) + "swrast_dri.so";
-        if (dlopen(path.c_str(), RTLD_NOW | RTLD_NODELETE) != nullptr) return true;
-    }
-    return false;
-}();
 }  // namespace
 
 TEST(BufferedProcessorMsm8974, EightKTexturesAroundEachDraw) {

@@ -1,37 +1,16 @@
 #include "support/gl_context.h"
 
-#include <dlfcn.h>
-#include <link.h>
 #include <stdlib.h>
 #include <string.h>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglWindowSurface.h"
 
-namespace {
-
-// Mesa loads its DRI driver when a display is initialised and unloads it at
-// eglTerminate. The driver keeps a few once-only allocations in its static
-// data; unloaded, they look leaked to LeakSanitizer (from code it can no
-// longer name). Keeping the driver resident for the test process keeps them
-// reachable, so leak checking stays on for everything else.
-int pinDriver(struct dl_phdr_info* info, size_t, void*) {
-    if (info->dlpi_name != nullptr && strstr(info->dlpi_name, "_dri.so") != nullptr) {
-        dlopen(info->dlpi_name, RTLD_NOW | RTLD_NOLOAD | RTLD_NODELETE);
-    }
-    return 0;
-}
-
-}  // namespace
-
-void GlTest_keepDriverLoaded() { dl_iterate_phdr(pinDriver, nullptr); }
-
 GlContext::GlContext() : mOk(false) {
     // Test programs may run outside ctest, which sets this for them.
     setenv("EGL_PLATFORM", "surfaceless", 0);
     mEnv = new EglEnvironment();
     if (mEnv->initialize() != 0) return;
-    GlTest_keepDriverLoaded();
     mSurface = new EglWindowSurface(mEnv);
     if (mSurface->initialize() != 0) return;
     if (mSurface->bindSurface() != 0) return;

@@ -41,12 +41,6 @@ private:
     bool mOk;
 };
 
-// Keeps Mesa's DRI driver loaded for the rest of the process once a display
-// is initialised, so that its once-only allocations are not reported as
-// leaks when eglTerminate unloads it. GlContext does this itself; a test that
-// initialises an EglEnvironment directly calls it after initialize().
-void GlTest_keepDriverLoaded();
-
 // A 2D RGBA texture of width x height (nearest filtering, clamped) holding
 // pixels (tightly packed rows, first row at t = 0); pixels may be null.
 GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels);

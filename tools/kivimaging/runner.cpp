@@ -1,7 +1,5 @@
 #include "runner.h"
 
-#include <dlfcn.h>
-#include <link.h>
 #include <string.h>
 
 #include "cli_log.h"
@@ -13,16 +11,6 @@ namespace kivcli {
 namespace {
 
 constexpr int kPassThroughId = 400;
-
-// Mesa unloads its DRI driver at eglTerminate, and the driver's once-only
-// allocations then look leaked to leak checkers (the sanitizer builds of this
-// tool). The process ends soon after anyway, so keep the driver resident.
-int keepDriver(struct dl_phdr_info* info, size_t, void*) {
-    if (info->dlpi_name != nullptr && strstr(info->dlpi_name, "_dri.so") != nullptr) {
-        dlopen(info->dlpi_name, RTLD_NOW | RTLD_NOLOAD | RTLD_NODELETE);
-    }
-    return 0;
-}
 
 }  // namespace
 
@@ -45,7 +33,6 @@ bool EffectRunner::open(std::string* error) {
         return false;
     }
     mProcessor->initialize();
-    dl_iterate_phdr(keepDriver, nullptr);
     return true;
 }
 
