@@ -484,11 +484,11 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     huge[sof + 6] = 0xE8;
 
     VCImage* pngSource = makeRgba(16, 16);
-    PngSpec spec;
-    spec.width = spec.height = 16;
-    spec.samples.assign(pngSource->data, pngSource->data + 16 * 16 * 4);
+    PngPicture picture;
+    picture.width = picture.height = 16;
+    picture.samples.assign(pngSource->data, pngSource->data + 16 * 16 * 4);
     VCImage_destroy(pngSource);
-    Bytes png = makePng(spec);
+    Bytes png = makePng(picture);
     Bytes pngTruncated(png.begin(), png.begin() + png.size() * 2 / 3);
     Bytes pngBadCrc = png;
     pngBadCrc[29] ^= 0x55;  // inside the header chunk's checksum
@@ -529,17 +529,17 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
 }
 
 TEST(VcPng, DecodeKeepsColourOfTransparentPixels) {
-    PngSpec spec;
-    spec.width = 3;
-    spec.height = 1;
-    spec.samples = {200, 100, 50, 0, 10, 20, 30, 128, 1, 2, 3, 255};
-    Bytes png = makePng(spec);
+    PngPicture picture;
+    picture.width = 3;
+    picture.height = 1;
+    picture.samples = {200, 100, 50, 0, 10, 20, 30, 128, 1, 2, 3, 255};
+    Bytes png = makePng(picture);
     int rc = 1;
     VCImage* image = decodeInto(VC_FORMAT_RGBA, png, &rc);
     ASSERT_EQ(rc, 0);
     ASSERT_EQ(image->width, 3);
     ASSERT_EQ(image->height, 1);
-    EXPECT_EQ(Bytes(image->data, image->data + 12), spec.samples);
+    EXPECT_EQ(Bytes(image->data, image->data + 12), picture.samples);
     VCImage_destroy(image);
 
     VCImage* bgra = decodeInto(VC_FORMAT_BGRA, png, &rc);
@@ -552,19 +552,19 @@ TEST(VcPng, DecodeKeepsColourOfTransparentPixels) {
 TEST(VcPng, DecodesEveryColourType) {
     struct Case {
         const char* what;
-        PngSpec spec;
+        PngPicture picture;
         Bytes rgba;
     };
     std::vector<Case> cases;
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 2;
         s.colorType = PNG_COLOR_TYPE_GRAY;
         s.samples = {7, 250};
         cases.push_back({"grey", s, {7, 7, 7, 255, 250, 250, 250, 255}});
     }
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 3;
         s.colorType = PNG_COLOR_TYPE_GRAY;
         s.bitDepth = 1;
@@ -572,21 +572,21 @@ TEST(VcPng, DecodesEveryColourType) {
         cases.push_back({"1-bit grey", s, {255, 255, 255, 255, 0, 0, 0, 255, 255, 255, 255, 255}});
     }
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 1;
         s.colorType = PNG_COLOR_TYPE_GRAY_ALPHA;
         s.samples = {90, 0};
         cases.push_back({"grey and alpha", s, {90, 90, 90, 0}});
     }
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 1;
         s.colorType = PNG_COLOR_TYPE_RGB;
         s.samples = {1, 2, 3};
         cases.push_back({"RGB", s, {1, 2, 3, 255}});
     }
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 1;
         s.colorType = PNG_COLOR_TYPE_RGB;
         s.bitDepth = 16;
@@ -594,7 +594,7 @@ TEST(VcPng, DecodesEveryColourType) {
         cases.push_back({"16-bit RGB", s, {0x80, 0x40, 0xFF, 255}});
     }
     {
-        PngSpec s;
+        PngPicture s;
         s.width = 3;
         s.colorType = PNG_COLOR_TYPE_PALETTE;
         s.palette = {{10, 20, 30}, {40, 50, 60}, {70, 80, 90}};
@@ -604,7 +604,7 @@ TEST(VcPng, DecodesEveryColourType) {
     }
     {
         // Interlaced: the same pixels as written row by row.
-        PngSpec s;
+        PngPicture s;
         s.width = 9;
         s.height = 7;
         s.interlaced = true;
@@ -614,12 +614,12 @@ TEST(VcPng, DecodesEveryColourType) {
         cases.push_back({"interlaced", s, s.samples});
     }
     for (const Case& c : cases) {
-        Bytes png = makePng(c.spec);
+        Bytes png = makePng(c.picture);
         int rc = 1;
         VCImage* image = decodeInto(VC_FORMAT_RGBA, png, &rc);
         ASSERT_EQ(rc, 0) << c.what;
-        EXPECT_EQ(image->width, c.spec.width) << c.what;
-        EXPECT_EQ(image->height, c.spec.height) << c.what;
+        EXPECT_EQ(image->width, c.picture.width) << c.what;
+        EXPECT_EQ(image->height, c.picture.height) << c.what;
         EXPECT_EQ(Bytes(image->data, image->data + VCImage_size(image)), c.rgba) << c.what;
         VCImage_destroy(image);
     }

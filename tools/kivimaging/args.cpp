@@ -12,23 +12,23 @@ std::string ParsedArgs::get(const char* name, const std::string& fallback) const
 
 namespace {
 
-const OptionSpec* findShort(const OptionSpec* specs, size_t count, char c) {
+const OptionSpec* findShort(const OptionSpec* options, size_t count, char c) {
     for (size_t i = 0; i < count; i++) {
-        if (specs[i].shortName != 0 && specs[i].shortName == c) return &specs[i];
+        if (options[i].shortName != 0 && options[i].shortName == c) return &options[i];
     }
     return nullptr;
 }
 
-const OptionSpec* findLong(const OptionSpec* specs, size_t count, const std::string& name) {
+const OptionSpec* findLong(const OptionSpec* options, size_t count, const std::string& name) {
     for (size_t i = 0; i < count; i++) {
-        if (name == specs[i].longName) return &specs[i];
+        if (name == options[i].longName) return &options[i];
     }
     return nullptr;
 }
 
 }  // namespace
 
-bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t count,
+bool parseArgs(int argc, char** argv, int first, const OptionSpec* options, size_t count,
                ParsedArgs* out, std::string* error) {
     bool optionsEnded = false;
     for (int i = first; i < argc; i++) {
@@ -41,7 +41,7 @@ bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t
             optionsEnded = true;
             continue;
         }
-        const OptionSpec* spec = nullptr;
+        const OptionSpec* option = nullptr;
         std::string value;
         bool inlineValue = false;
         if (arg[1] == '-') {
@@ -52,23 +52,23 @@ bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t
                 name = name.substr(0, eq);
                 inlineValue = true;
             }
-            spec = findLong(specs, count, name);
-            if (spec == nullptr) {
+            option = findLong(options, count, name);
+            if (option == nullptr) {
                 *error = "unknown option '--" + name + "'";
                 return false;
             }
-            if (inlineValue && !spec->takesValue) {
+            if (inlineValue && !option->takesValue) {
                 *error = "option '--" + name + "' takes no value";
                 return false;
             }
         } else {
-            spec = findShort(specs, count, arg[1]);
-            if (spec == nullptr) {
+            option = findShort(options, count, arg[1]);
+            if (option == nullptr) {
                 *error = "unknown option '" + arg.substr(0, 2) + "'";
                 return false;
             }
             if (arg.size() > 2) {
-                if (!spec->takesValue) {
+                if (!option->takesValue) {
                     *error = "option '-" + std::string(1, arg[1]) + "' takes no value";
                     return false;
                 }
@@ -76,14 +76,14 @@ bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t
                 inlineValue = true;
             }
         }
-        if (spec->takesValue && !inlineValue) {
+        if (option->takesValue && !inlineValue) {
             if (i + 1 >= argc) {
-                *error = "option '--" + std::string(spec->longName) + "' needs a value";
+                *error = "option '--" + std::string(option->longName) + "' needs a value";
                 return false;
             }
             value = argv[++i];
         }
-        out->values[spec->longName] = value;
+        out->values[option->longName] = value;
     }
     return true;
 }

@@ -27,7 +27,7 @@ struct ParsedArgs {
 
 // Parses argv[first…argc-1]. On a malformed line returns false with a message
 // naming the offending argument. A repeated option keeps its last value.
-bool parseArgs(int argc, char** argv, int first, const OptionSpec* specs, size_t count,
+bool parseArgs(int argc, char** argv, int first, const OptionSpec* options, size_t count,
                ParsedArgs* out, std::string* error);
 
 // A whole decimal integer within [min, max]; false otherwise.

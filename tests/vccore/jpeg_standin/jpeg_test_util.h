@@ -99,7 +99,7 @@ inline bool fileExists(const std::string& path) {
 
 // A PNG stream written directly with libpng. `rows` holds the samples as the
 // colour type and depth lay them out (16-bit samples big-endian).
-struct PngSpec {
+struct PngPicture {
     int width = 1;
     int height = 1;
     int colorType = PNG_COLOR_TYPE_RGB_ALPHA;
@@ -115,24 +115,24 @@ inline void appendToVector(png_structp png, png_bytep data, png_size_t length) {
     out->insert(out->end(), data, data + length);
 }
 
-inline Bytes makePng(const PngSpec& spec) {
+inline Bytes makePng(const PngPicture& picture) {
     Bytes out;
     png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
     png_infop info = png_create_info_struct(png);
     png_set_write_fn(png, &out, appendToVector, nullptr);
-    png_set_IHDR(png, info, spec.width, spec.height, spec.bitDepth, spec.colorType,
-                 spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
+    png_set_IHDR(png, info, picture.width, picture.height, picture.bitDepth, picture.colorType,
+                 picture.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
                  PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
-    if (!spec.palette.empty())
-        png_set_PLTE(png, info, spec.palette.data(), static_cast<int>(spec.palette.size()));
-    if (!spec.paletteAlpha.empty())
-        png_set_tRNS(png, info, spec.paletteAlpha.data(),
-                     static_cast<int>(spec.paletteAlpha.size()), nullptr);
+    if (!picture.palette.empty())
+        png_set_PLTE(png, info, picture.palette.data(), static_cast<int>(picture.palette.size()));
+    if (!picture.paletteAlpha.empty())
+        png_set_tRNS(png, info, picture.paletteAlpha.data(),
+                     static_cast<int>(picture.paletteAlpha.size()), nullptr);
     png_write_info(png, info);
-    size_t stride = spec.samples.size() / spec.height;
-    std::vector<png_bytep> rows(spec.height);
-    for (int y = 0; y < spec.height; ++y)
-        rows[y] = const_cast<png_bytep>(spec.samples.data()) + y * stride;
+    size_t stride = picture.samples.size() / picture.height;
+    std::vector<png_bytep> rows(picture.height);
+    for (int y = 0; y < picture.height; ++y)
+        rows[y] = const_cast<png_bytep>(picture.samples.data()) + y * stride;
     png_write_image(png, rows.data());
     png_write_end(png, nullptr);
     png_destroy_write_struct(&png, &info);
