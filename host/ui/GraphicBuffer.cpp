@@ -3,6 +3,7 @@
 #include <stdlib.h>
 #include <string.h>
 
+#include <memory>
 #include <vector>
 
 #include "../graphics/HostGl.h"
@@ -81,6 +82,11 @@ void restride(const unsigned char* src, const Plane* srcPlanes, unsigned char* d
                    src + srcPlanes[p].offset + row * srcPlanes[p].pitch, srcPlanes[p].bytes);
         }
     }
+}
+
+// Scratch memory that is fully overwritten before it is read: not zeroed.
+std::unique_ptr<unsigned char[]> scratch(size_t bytes) {
+    return std::unique_ptr<unsigned char[]>(new (std::nothrow) unsigned char[bytes]);
 }
 
 }  // namespace
@@ -252,12 +258,13 @@ bool GraphicBuffer::toRgba_l(unsigned char* rgba) const {
         restride(mData, own, rgba, compact, count);
         return true;
     }
-    std::vector<unsigned char> packed;
+    std::unique_ptr<unsigned char[]> packed;
     unsigned char* source = mData;
     if (stride != width) {
-        packed.resize(bytesOf(mFourcc, height, width));
-        restride(mData, own, packed.data(), compact, count);
-        source = packed.data();
+        packed = scratch(bytesOf(mFourcc, height, width));
+        if (packed == nullptr) return false;
+        restride(mData, own, packed.get(), compact, count);
+        source = packed.get();
     }
     VCImage* in = VCImage_createWrap(source, width, height, mFourcc, 0, 0);
     VCImage* out = VCImage_createWrap(rgba, width, height, VC_FORMAT_RGBA, 0, 0);
@@ -281,10 +288,17 @@ bool GraphicBuffer::fromRgba_l(const unsigned char* rgba) {
         restride(rgba, compact, mData, own, count);
         return true;
     }
-    std::vector<unsigned char> packed(bytesOf(mFourcc, height, width));
+    // A compact buffer takes the conversion in place.
+    std::unique_ptr<unsigned char[]> packed;
+    unsigned char* target = mData;
+    if (stride != width) {
+        packed = scratch(bytesOf(mFourcc, height, width));
+        if (packed == nullptr) return false;
+        target = packed.get();
+    }
     VCImage* in =
         VCImage_createWrap(const_cast<unsigned char*>(rgba), width, height, VC_FORMAT_RGBA, 0, 0);
-    VCImage* out = VCImage_createWrap(packed.data(), width, height, mFourcc, 0, 0);
+    VCImage* out = VCImage_createWrap(target, width, height, mFourcc, 0, 0);
     int result =
         (in != nullptr && out != nullptr) ? VCImage_convert(in, out) : VC_ERROR_ALLOC_FAILED;
     VCImage_destroy(in);
@@ -294,15 +308,28 @@ bool GraphicBuffer::fromRgba_l(const unsigned char* rgba) {
                   (const char*)&mFourcc, result);
         return false;
     }
-    restride(packed.data(), compact, mData, own, count);
+    if (packed != nullptr) restride(packed.get(), compact, mData, own, count);
     return true;
+}
+
+bool GraphicBuffer::isCompactRgba_l() const {
+    return mFourcc == VC_FORMAT_RGBA && stride == width;
+}
+
+const unsigned char* GraphicBuffer::rgbaForUpload_l(std::unique_ptr<unsigned char[]>& converted) {
+    // A compact RGBA copy is already what the texture takes.
+    if (isCompactRgba_l()) return mData;
+    converted = scratch((size_t)width * height * 4);
+    if (converted == nullptr || !toRgba_l(converted.get())) return nullptr;
+    return converted.get();
 }
 
 bool GraphicBuffer::ensureMirror_l() {
     if (mMirrorTexture != 0) return true;
     if (!HostGl::get().acquire()) return false;
-    std::vector<unsigned char> rgba((size_t)width * height * 4);
-    if (!toRgba_l(rgba.data())) {
+    std::unique_ptr<unsigned char[]> converted;
+    const unsigned char* rgba = rgbaForUpload_l(converted);
+    if (rgba == nullptr) {
         HostGl::get().release();
         return false;
     }
@@ -317,7 +344,7 @@ bool GraphicBuffer::ensureMirror_l() {
         glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
         glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
         glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE,
-                     rgba.data());
+                     rgba);
         glBindTexture(GL_TEXTURE_2D, 0);
         GLenum error = glGetError();
         if (error != GL_NO_ERROR) {
@@ -337,14 +364,15 @@ bool GraphicBuffer::ensureMirror_l() {
 }
 
 bool GraphicBuffer::upload_l() {
-    std::vector<unsigned char> rgba((size_t)width * height * 4);
-    if (!toRgba_l(rgba.data())) return false;
+    std::unique_ptr<unsigned char[]> converted;
+    const unsigned char* rgba = rgbaForUpload_l(converted);
+    if (rgba == nullptr) return false;
     GLuint texture = mMirrorTexture;
     bool ok = HostGl::get().run([&] {
         glBindTexture(GL_TEXTURE_2D, texture);
         glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
         glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE,
-                        rgba.data());
+                        rgba);
         glBindTexture(GL_TEXTURE_2D, 0);
         return glGetError() == GL_NO_ERROR;
     });
@@ -353,7 +381,14 @@ bool GraphicBuffer::upload_l() {
 }
 
 bool GraphicBuffer::readback_l() {
-    std::vector<unsigned char> rgba((size_t)width * height * 4);
+    // A compact RGBA copy is read straight into; other layouts convert after.
+    std::unique_ptr<unsigned char[]> pixels;
+    unsigned char* rgba = mData;
+    if (!isCompactRgba_l()) {
+        pixels = scratch((size_t)width * height * 4);
+        if (pixels == nullptr) return false;
+        rgba = pixels.get();
+    }
     GLuint texture = mMirrorTexture;
     bool ok = HostGl::get().run([&] {
         HostGl& gl = HostGl::get();
@@ -362,7 +397,7 @@ bool GraphicBuffer::readback_l() {
         bool complete = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
         if (complete) {
             glPixelStorei(GL_PACK_ALIGNMENT, 4);
-            glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, rgba.data());
+            glReadPixels(0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, rgba);
         }
         glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, 0, 0);
         glBindFramebuffer(GL_FRAMEBUFFER, 0);
@@ -373,7 +408,7 @@ bool GraphicBuffer::readback_l() {
         return false;
     }
     ++mReadbackCount;
-    return fromRgba_l(rgba.data());
+    return rgba == mData || fromRgba_l(rgba);
 }
 
 EGLImageKHR GraphicBuffer::createEglImage(EGLDisplay display) {

@@ -22,6 +22,7 @@
 #include <stdint.h>
 
 #include <atomic>
+#include <memory>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -127,6 +128,10 @@ private:
     bool upload_l();
     bool readback_l();
     bool toRgba_l(unsigned char* rgba) const;
+    bool isCompactRgba_l() const;
+    // The pixels to upload: the CPU copy itself, or RGBA converted into
+    // `converted`; null on failure.
+    const unsigned char* rgbaForUpload_l(std::unique_ptr<unsigned char[]>& converted);
     bool fromRgba_l(const unsigned char* rgba);
 
     static void incRef(android_native_base_t* base);
