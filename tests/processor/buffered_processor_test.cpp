@@ -23,26 +23,6 @@
 
 namespace {
 
-
-// Compares a rendered RGBA picture with the reference of `look` over `picture`;
-// pixels at a hard threshold of the look are skipped but must stay rare (under
-// an eighth: the flat patches of the test picture sit on level boundaries).
-void expectLook(int look, const lookref::Picture& picture, const uint8_t* actual, int tolerance,
-                const char* path) {
-    size_t skipped = 0;
-    std::string first;
-    EXPECT_EQ(0u, lookref::compare(look, picture, actual, tolerance, &skipped, &first))
-        << path << " look " << look << ": first bad pixel " << first;
-    EXPECT_LT(skipped * 8, size_t(picture.width()) * picture.height()) << path << " look " << look;
-}
-
-// 2/255 everywhere but Comic: its wrinkle term multiplies the difference of two
-// filtered neighbour samples by 6, and llvmpipe's bilinear weights carry 8
-// fractional bits, so near sharp edges its result may move by up to 4/255.
-int toleranceFor(int look) {
-    return look == 410 ? 4 : 2;
-}
-
 std::vector<uint8_t> swapRB(const std::vector<uint8_t>& in) {
     std::vector<uint8_t> out(in);
     for (size_t i = 0; i < out.size(); i += 4) std::swap(out[i], out[i + 2]);
@@ -71,6 +51,16 @@ Nv21Picture makeNv21(int width, int height) {
     VCImage_destroy(yuv);
     VCImage_destroy(back);
     return p;
+}
+
+// Live GL objects among the first `range` names of each kind.
+int liveGlObjects(int range) {
+    int n = 0;
+    for (GLuint name = 1; name <= GLuint(range); ++name) {
+        n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name) +
+             glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
+    }
+    return n;
 }
 
 class BufferedProcessorTest : public ::testing::Test {
@@ -116,14 +106,11 @@ TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(401, p.getEffect()->getFilterType());
     EXPECT_TRUE(log.contains(1, "virtual int VFilterBufferedProcessorImpl::setEffect(int) : 401"));
-    for (int unknown : {-1, 0, 404, 509, 1999, 123456}) {
+    for (int unknown : {-1, 404, 509, 1999}) {
         EXPECT_EQ(0, p.setEffect(unknown));
         ASSERT_NE(nullptr, p.getEffect());
         EXPECT_EQ(400, p.getEffect()->getFilterType()) << unknown;
     }
-    EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
-    ASSERT_NE(nullptr, p.getEffect());
-    EXPECT_EQ(400, p.getEffect()->getFilterType());
     // A built-in library name goes to its effect id, anything else to a
     // downloadable filter first; here neither exists, so 400 follows.
     auto attempts = [&log]() {
@@ -135,11 +122,11 @@ TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
     log.clear();
     EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
     EXPECT_EQ((std::vector<std::string>{"2000", "400"}), attempts());
+    EXPECT_EQ(400, p.getEffect()->getFilterType());
     log.clear();
     EXPECT_EQ(0, p.setEffect("com.morvane.android.provider.filterprovider,libfilm.so"));
-    std::vector<std::string> tried = attempts();
-    ASSERT_FALSE(tried.empty());
-    EXPECT_EQ("501", tried[0]);
+    ASSERT_FALSE(attempts().empty());
+    EXPECT_EQ("501", attempts()[0]);
     EXPECT_EQ(0, p.setEffect(static_cast<const char*>(nullptr)));
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(400, p.getEffect()->getFilterType());
@@ -184,11 +171,11 @@ TEST_F(BufferedProcessorTest, EveryLookThroughRgbaAndBgra) {
         std::vector<uint8_t> out(w * h * 4, 0x5A);
         ASSERT_EQ(
             0, mProcessor->doProcessRGBA(picture.rgba().data(), w, h, out.data(), VC_FORMAT_RGBA));
-        expectLook(id, picture, out.data(), toleranceFor(id), "RGBA");
+        lookref::expectLook(id, picture, out.data(), "RGBA");
         std::vector<uint8_t> bgraOut(w * h * 4, 0x5A);
         ASSERT_EQ(0,
                   mProcessor->doProcessRGBA(bgraIn.data(), w, h, bgraOut.data(), VC_FORMAT_BGRA));
-        expectLook(id, picture, swapRB(bgraOut).data(), toleranceFor(id), "BGRA");
+        lookref::expectLook(id, picture, swapRB(bgraOut).data(), "BGRA");
     }
 }
 
@@ -207,23 +194,10 @@ TEST_F(BufferedProcessorTest, EveryLookThroughNv21EvenAndOddHeight) {
             ASSERT_EQ(0, mProcessor->setEffect(id));
             std::vector<uint8_t> out(w * 48 * 4, 0x5A);
             ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
-            if (h == 48) {
-                expectLook(id, picture, out.data(), toleranceFor(id), "NV21");
-            } else {
-                // Rows 0..45 see the same neighbourhood as in the full picture
-                // (the looks reach one texel up at most; the last row changed).
-                std::vector<bool> near;
-                std::vector<uint8_t> want = lookref::render(id, picture, &near);
-                size_t bad = 0;
-                for (size_t i = 0; i < size_t(w) * 46; ++i)
-                    for (int ch = 0; ch < 4 && !near[i]; ++ch)
-                        if (std::abs(int(want[i * 4 + ch]) - int(out[i * 4 + ch])) >
-                            toleranceFor(id)) {
-                            ++bad;
-                            break;
-                        }
-                EXPECT_EQ(0u, bad) << "odd-height NV21, look " << id;
-            }
+            // At odd height rows 0..45 see the same neighbourhood as in the full
+            // picture (the looks reach one texel up at most; the last row changed).
+            lookref::expectLook(id, picture, out.data(), h == 48 ? "NV21" : "odd-height NV21",
+                                h == 48 ? -1 : 46);
         }
     }
 }
@@ -249,21 +223,6 @@ TEST_F(BufferedProcessorTest, OddNv21SizesArePaddedToEven) {
                              "char*, int, int, unsigned char*)"));
 }
 
-TEST_F(BufferedProcessorTest, LogsTheDrawAndItsSignature) {
-    std::vector<uint8_t> in(8 * 8 * 4, 100), out(8 * 8 * 4);
-    mProcessor->setEffect(403);
-    LogCapture log;
-    ASSERT_EQ(0, mProcessor->doProcessRGBA(in.data(), 8, 8, out.data(), VC_FORMAT_RGBA));
-    EXPECT_TRUE(log.contains(1,
-                             "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned "
-                             "char*, int, int, unsigned char*, int)"));
-    EXPECT_EQ(1u, log.count("EGL: Synchronously waiting for rendering..."));
-    EXPECT_EQ(155, out[0]);
-    EXPECT_EQ(100, out[3]);
-    // No 8K switch off msm8974.
-    for (const std::string& l : log.texts()) EXPECT_EQ(std::string::npos, l.find("8K_TEXTURES"));
-}
-
 TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
     // Wider than any texture llvmpipe can hold: the buffer-backed images cannot
     // be made, so nothing is drawn or read back.
@@ -285,25 +244,19 @@ TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
     EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), -4, 2, guard.data(), VC_FORMAT_BGRA));
     EXPECT_EQ(-7, mProcessor->doProcessNV21(in.data(), -3, 5, guard.data()));
     EXPECT_EQ(std::vector<uint8_t>(64, 0xC3), guard);
-    // The processor is still usable afterwards.
+    // The processor is still usable afterwards, and logs the draw and its signature.
     std::vector<uint8_t> small(4 * 4 * 4, 10), smallOut(4 * 4 * 4);
+    log.clear();
     EXPECT_EQ(0, mProcessor->doProcessRGBA(small.data(), 4, 4, smallOut.data(), VC_FORMAT_RGBA));
     EXPECT_EQ(245, smallOut[0]);
+    EXPECT_EQ(10, smallOut[3]);
+    EXPECT_TRUE(log.contains(1,
+                             "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned "
+                             "char*, int, int, unsigned char*, int)"));
+    EXPECT_EQ(1u, log.count("EGL: Synchronously waiting for rendering..."));
+    // No 8K switch off msm8974.
+    for (const std::string& l : log.texts()) EXPECT_EQ(std::string::npos, l.find("8K_TEXTURES"));
 }
-
-namespace {
-
-// Live GL objects among the first `range` names of each kind.
-int liveGlObjects(int range) {
-    int n = 0;
-    for (GLuint name = 1; name <= GLuint(range); ++name) {
-        n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name) +
-             glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
-    }
-    return n;
-}
-
-}  // namespace
 
 TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     const int w = 16, h = 12;

@@ -6,9 +6,10 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -83,13 +84,8 @@ protected:
 };
 
 std::vector<uint8_t> fileBytes(const std::string& path) {
-    std::vector<uint8_t> out;
-    FILE* f = fopen(path.c_str(), "rb");
-    if (f == nullptr) return out;
-    int c;
-    while ((c = fgetc(f)) != EOF) out.push_back(static_cast<uint8_t>(c));
-    fclose(f);
-    return out;
+    std::ifstream f(path, std::ios::binary);
+    return std::vector<uint8_t>(std::istreambuf_iterator<char>(f), {});
 }
 
 // The first quantisation table of a JPEG stream, sorted (order does not matter
@@ -152,7 +148,7 @@ TEST_F(JniProcessorTest, ProcessBufferRunsTheLookOverJavaArgbInts) {
     EXPECT_EQ(argb, again);
 }
 
-TEST_F(JniProcessorTest, ProcessBufferFailuresBecomeJavaExceptions) {
+TEST_F(JniProcessorTest, BufferAndFileFailuresBecomeJavaExceptions) {
     EXPECT_EQ(nullptr, mProcessor->processBuffer(mEnv, nullptr, 4, 4));
     EXPECT_EQ("java.lang.NullPointerException: native_process_buffer: jinputbuffer is null",
               KivTestJvm_takeException(mEnv));
@@ -167,6 +163,19 @@ TEST_F(JniProcessorTest, ProcessBufferFailuresBecomeJavaExceptions) {
     EXPECT_EQ(nullptr, uninitialised.processBuffer(mEnv, pixels, 4, 4));
     EXPECT_EQ("java.lang.RuntimeException: native_process_buffer failed",
               KivTestJvm_takeException(mEnv));
+
+    jstring some = mEnv->NewStringUTF((mDir + "/out.jpg").c_str());
+    mProcessor->processFile(mEnv, nullptr, some);
+    EXPECT_EQ("java.lang.NullPointerException: native_process_file: jinputfile is null",
+              KivTestJvm_takeException(mEnv));
+    mProcessor->processFile(mEnv, some, nullptr);
+    EXPECT_EQ("java.lang.NullPointerException: native_process_file: joutfile is null",
+              KivTestJvm_takeException(mEnv));
+    mProcessor->processFile(mEnv, mEnv->NewStringUTF((mDir + "/missing.jpg").c_str()), some);
+    EXPECT_EQ(
+        "java.lang.RuntimeException: native_process_file: VCImage_decodeFromJpeg(inputfile) "
+        "failed",
+        KivTestJvm_takeException(mEnv));
 }
 
 TEST_F(JniProcessorTest, ProcessBitmapReturnsANewArgb8888Bitmap) {
@@ -265,21 +274,6 @@ TEST_F(JniProcessorTest, ProcessFileWritesAQuality98Jpeg) {
     }
     EXPECT_LE(worst, 6);
     VCImage_destroy(result);
-}
-
-TEST_F(JniProcessorTest, ProcessFileFailuresBecomeJavaExceptions) {
-    jstring some = mEnv->NewStringUTF((mDir + "/out.jpg").c_str());
-    mProcessor->processFile(mEnv, nullptr, some);
-    EXPECT_EQ("java.lang.NullPointerException: native_process_file: jinputfile is null",
-              KivTestJvm_takeException(mEnv));
-    mProcessor->processFile(mEnv, some, nullptr);
-    EXPECT_EQ("java.lang.NullPointerException: native_process_file: joutfile is null",
-              KivTestJvm_takeException(mEnv));
-    mProcessor->processFile(mEnv, mEnv->NewStringUTF((mDir + "/missing.jpg").c_str()), some);
-    EXPECT_EQ(
-        "java.lang.RuntimeException: native_process_file: VCImage_decodeFromJpeg(inputfile) "
-        "failed",
-        KivTestJvm_takeException(mEnv));
 }
 
 TEST_F(JniProcessorTest, ProcessImageReturnsADirectJpegBuffer) {

@@ -15,10 +15,6 @@
 #include "support/log_capture.h"
 #include "vccore/vc_image.h"
 
-namespace {
-
-}  // namespace
-
 TEST(BufferedProcessorMsm8974, EightKTexturesAroundEachDraw) {
     setenv("KIV_PROP_ro_board_platform", "msm8974", 1);
     ASSERT_EQ(6, static_cast<int>(Platform::getCurrentPlatform()));
