@@ -8,6 +8,7 @@
 
 #include "jpeg_standin/jpeg_test_util.h"
 #include "support/log_capture.h"
+#include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 
@@ -59,95 +60,29 @@ Bytes encodeBytes(const VCImage* image, int quality) {
     return out;
 }
 
-int clamp255(int v) {
-    return v < 0 ? 0 : (v > 255 ? 255 : v);
-}
-
-// Full-range equations of the image core.
-void rgbToYuv(const unsigned char* p, int* y, int* u, int* v) {
-    *y = clamp255((19595 * p[0] + 38470 * p[1] + 7471 * p[2]) >> 16);
-    *u = clamp255(((36962 * (p[2] - *y)) >> 16) + 128);
-    *v = clamp255(((46727 * (p[0] - *y)) >> 16) + 128);
-}
-
-void yuvToRgb(int y, int u, int v, unsigned char* out) {
-    double du = u - 128.0;
-    double dv = v - 128.0;
-    out[0] = static_cast<unsigned char>(clamp255(static_cast<int>(y + 1.402 * dv)));
-    out[1] =
-        static_cast<unsigned char>(clamp255(static_cast<int>(y - 0.34414 * du - 0.71414 * dv)));
-    out[2] = static_cast<unsigned char>(clamp255(static_cast<int>(y + 1.772 * du)));
-}
-
-double meanAbsDiff(const unsigned char* a, int aStep, const unsigned char* b, int bStep,
-                   size_t pixels, int channels) {
+double meanAbsDiff(const unsigned char* a, const unsigned char* b, size_t n) {
     double sum = 0;
-    for (size_t i = 0; i < pixels; ++i)
-        for (int c = 0; c < channels; ++c) sum += std::abs(a[i * aStep + c] - b[i * bStep + c]);
-    return sum / (pixels * channels);
+    for (size_t i = 0; i < n; ++i) sum += std::abs(a[i] - b[i]);
+    return sum / n;
 }
 
-// Y, U, V planes (chroma per 2×2 block, point-sampled) of the gradient picture.
-struct YuvPicture {
-    int w, h;
-    Bytes y, u, v;
-};
-
-YuvPicture makeYuv(int w, int h) {
-    YuvPicture pic{w, h, Bytes(w * h), Bytes(w * h / 4), Bytes(w * h / 4)};
-    unsigned char p[4];
-    for (int row = 0; row < h; ++row)
-        for (int x = 0; x < w; ++x) {
-            gradientPixel(x, row, w, h, p);
-            int y, u, v;
-            rgbToYuv(p, &y, &u, &v);
-            pic.y[row * w + x] = static_cast<unsigned char>(y);
-            if (row % 2 == 0 && x % 2 == 0) {
-                pic.u[(row / 2) * (w / 2) + x / 2] = static_cast<unsigned char>(u);
-                pic.v[(row / 2) * (w / 2) + x / 2] = static_cast<unsigned char>(v);
-            }
-        }
-    return pic;
-}
-
-// The picture laid out in a 4:2:0 format, chroma starting at `chromaAt`.
-Bytes layout420(const YuvPicture& pic, uint32_t format, size_t chromaAt) {
-    size_t luma = pic.y.size();
-    size_t quarter = luma / 4;
-    Bytes out(chromaAt + 2 * quarter, 0xEE);
-    memcpy(out.data(), pic.y.data(), luma);
-    unsigned char* c = out.data() + chromaAt;
-    for (size_t i = 0; i < quarter; ++i) {
-        switch (format) {
-            case VC_FORMAT_NV21:
-                c[2 * i] = pic.v[i];
-                c[2 * i + 1] = pic.u[i];
-                break;
-            case VC_FORMAT_NV12:
-                c[2 * i] = pic.u[i];
-                c[2 * i + 1] = pic.v[i];
-                break;
-            case VC_FORMAT_YV12:
-                c[i] = pic.v[i];
-                c[quarter + i] = pic.u[i];
-                break;
-            case VC_FORMAT_YUVP:
-                c[i] = pic.u[i];
-                c[quarter + i] = pic.v[i];
-                break;
-        }
-    }
+// `source` converted by the image core (whose arithmetic has its own suite)
+// into `format`, optionally with the chroma plane displaced to `chromaAt`.
+Bytes convertTo(const VCImage* source, uint32_t format, uint32_t chromaAt = 0) {
+    const size_t need = VCImage_requiredSize(source->width, source->height, format);
+    const size_t luma = static_cast<size_t>(source->width) * source->height;
+    Bytes out(chromaAt != 0 ? chromaAt + need - luma : need, 0xEE);
+    VCImage* target = VCImage_createWrap(out.data(), source->width, source->height, format,
+                                         static_cast<int>(out.size()), chromaAt);
+    EXPECT_EQ(VC_OK, VCImage_convert(source, target));
+    VCImage_destroy(target);
     return out;
 }
 
-// The RGB picture that a YUV picture stands for (chroma shared per 2×2 block).
-Bytes yuvAsRgb(const YuvPicture& pic) {
-    Bytes out(pic.y.size() * 3);
-    for (int row = 0; row < pic.h; ++row)
-        for (int x = 0; x < pic.w; ++x) {
-            size_t c = (row / 2) * (pic.w / 2) + x / 2;
-            yuvToRgb(pic.y[row * pic.w + x], pic.u[c], pic.v[c], &out[(row * pic.w + x) * 3]);
-        }
+Bytes convertBytes(Bytes& pixels, int w, int h, uint32_t from, uint32_t to) {
+    VCImage* image = VCImage_createWrap(pixels.data(), w, h, from, 0, 0);
+    Bytes out = convertTo(image, to);
+    VCImage_destroy(image);
     return out;
 }
 
@@ -164,10 +99,6 @@ size_t findMarker(const Bytes& jpeg, unsigned char marker) {
     return 0;
 }
 
-void putBe32(Bytes& out, uint32_t v) {
-    for (int s = 24; s >= 0; s -= 8) out.push_back(static_cast<unsigned char>(v >> s));
-}
-
 // PNG chunk checksum (CRC-32, reflected polynomial 0xEDB88320).
 uint32_t crc32Of(const unsigned char* p, size_t n) {
     uint32_t crc = 0xFFFFFFFFu;
@@ -178,24 +109,17 @@ uint32_t crc32Of(const unsigned char* p, size_t n) {
     return crc ^ 0xFFFFFFFFu;
 }
 
-void appendChunk(Bytes& png, const char* type, const Bytes& body) {
-    putBe32(png, static_cast<uint32_t>(body.size()));
-    size_t start = png.size();
-    png.insert(png.end(), type, type + 4);
-    png.insert(png.end(), body.begin(), body.end());
-    putBe32(png, crc32Of(png.data() + start, png.size() - start));
-}
-
-// A well-formed PNG whose header declares width×height RGBA, with a tiny IDAT.
+// A well-formed 1×1 PNG whose header is rewritten to declare width×height.
 Bytes pngDeclaring(uint32_t width, uint32_t height) {
-    Bytes png = {0x89, 'P', 'N', 'G', '\r', '\n', 0x1A, '\n'};
-    Bytes ihdr;
-    putBe32(ihdr, width);
-    putBe32(ihdr, height);
-    ihdr.insert(ihdr.end(), {8, 6, 0, 0, 0});
-    appendChunk(png, "IHDR", ihdr);
-    appendChunk(png, "IDAT", {0x78, 0x9C, 0x63, 0x00, 0x00, 0x00, 0x01, 0x00, 0x01});
-    appendChunk(png, "IEND", {});
+    PngPicture tiny;
+    tiny.samples = {1, 2, 3, 4};
+    Bytes png = makePng(tiny);
+    auto put = [&](size_t at, uint32_t v) {
+        for (int k = 0; k < 4; ++k) png[at + k] = static_cast<unsigned char>(v >> (24 - 8 * k));
+    };
+    put(16, width);
+    put(20, height);
+    put(29, crc32Of(&png[12], 17));  // over the chunk type and header fields
     return png;
 }
 
@@ -217,44 +141,65 @@ TEST(VcJpeg, EncodeMakesJpegRecordWithClampedQuality) {
     EXPECT_EQ(jpeg->data[jpeg->size - 2], 0xFF);
     EXPECT_EQ(jpeg->data[jpeg->size - 1], 0xD9);
     int w = 0, h = 0, subsampling = -1;
-    Bytes decoded = turboDecode(bytesOf(jpeg), TJPF_RGBA, &w, &h, &subsampling);
+    turboDecode(bytesOf(jpeg), TJPF_RGBA, &w, &h, &subsampling);
     EXPECT_EQ(w, 64);
     EXPECT_EQ(h, 48);
     EXPECT_EQ(subsampling, TJSAMP_420);
     VCImage_destroy(jpeg);
 
-    Bytes q85 = encodeBytes(image, 85);
-    EXPECT_EQ(lumaDcQuantizer(q85), expectedDc(85));
-    EXPECT_EQ(lumaDcQuantizer(encodeBytes(image, 100)), expectedDc(100));
-    EXPECT_EQ(lumaDcQuantizer(encodeBytes(image, 1)), expectedDc(1));
-    EXPECT_EQ(lumaDcQuantizer(encodeBytes(image, 50)), expectedDc(50));
+    for (int quality : {1, 50, 85, 100})
+        EXPECT_EQ(lumaDcQuantizer(encodeBytes(image, quality)), expectedDc(quality)) << quality;
     // Out-of-range qualities are 85, not clamped to the nearest end.
-    EXPECT_EQ(encodeBytes(image, 0), q85);
-    EXPECT_EQ(encodeBytes(image, 101), q85);
-    EXPECT_EQ(encodeBytes(image, -7), q85);
-    EXPECT_NE(encodeBytes(image, 100), q85);
+    Bytes q85 = encodeBytes(image, 85);
+    for (int quality : {0, 101, -7}) EXPECT_EQ(encodeBytes(image, quality), q85) << quality;
     VCImage_destroy(image);
 }
 
-TEST(VcJpeg, DecodeRoundTripRgba) {
+TEST(VcJpeg, DecodeIntoEachFormat) {
     REQUIRE_GENERAL_CODECS();
     VCImage* source = makeRgba(64, 48);
     Bytes jpeg = encodeBytes(source, 95);
     ASSERT_FALSE(jpeg.empty());
-    int rc = 1;
-    VCImage* image = decodeInto(VC_FORMAT_RGBA, jpeg, &rc);
+    int w, h, s, rc = 1;
+    Bytes ref = turboDecode(jpeg, TJPF_RGBA, &w, &h, &s);
+    const size_t n = 64 * 48;
+
+    VCImage* rgba = decodeInto(VC_FORMAT_RGBA, jpeg, &rc);
     ASSERT_EQ(rc, 0);
-    EXPECT_EQ(image->width, 64);
-    EXPECT_EQ(image->height, 48);
-    EXPECT_EQ(image->wrapped, 0);
-    ASSERT_EQ(VCImage_size(image), 64u * 48 * 4);
-    int w, h, s;
-    Bytes reference = turboDecode(jpeg, TJPF_RGBA, &w, &h, &s);
-    EXPECT_EQ(0, memcmp(image->data, reference.data(), reference.size()));
-    EXPECT_LT(meanAbsDiff(image->data, 4, source->data, 4, 64 * 48, 3), 4.0);
-    for (size_t i = 0; i < 64 * 48; ++i) ASSERT_EQ(image->data[i * 4 + 3], 255) << i;
-    VCImage_destroy(image);
-    VCImage_destroy(source);
+    EXPECT_EQ(rgba->width, 64);
+    EXPECT_EQ(rgba->height, 48);
+    EXPECT_EQ(rgba->wrapped, 0);
+    ASSERT_EQ(VCImage_size(rgba), n * 4);
+    EXPECT_EQ(0, memcmp(rgba->data, ref.data(), ref.size()));
+    for (size_t i = 0; i < n; ++i) ASSERT_EQ(rgba->data[i * 4 + 3], 255) << i;
+    double diff = 0;
+    for (size_t i = 0; i < n * 4; ++i) diff += std::abs(rgba->data[i] - source->data[i]);
+    EXPECT_LT(diff / (n * 3), 4.0);  // alpha adds nothing
+
+    VCImage* bgr = decodeInto(VC_FORMAT_BGR8, jpeg, &rc);
+    ASSERT_EQ(rc, 0);
+    ASSERT_EQ(VCImage_size(bgr), n * 3);
+    for (size_t i = 0; i < n; ++i) {
+        ASSERT_EQ(bgr->data[i * 3 + 0], ref[i * 4 + 2]) << i;
+        ASSERT_EQ(bgr->data[i * 3 + 1], ref[i * 4 + 1]) << i;
+        ASSERT_EQ(bgr->data[i * 3 + 2], ref[i * 4 + 0]) << i;
+    }
+
+    VCImage* nv21 = decodeInto(VC_FORMAT_NV21, jpeg, &rc);
+    ASSERT_EQ(rc, 0);
+    EXPECT_EQ(nv21->width, 64);
+    EXPECT_EQ(nv21->height, 48);
+    ASSERT_EQ(VCImage_size(nv21), n * 3 / 2);
+    EXPECT_EQ(bytesOf(nv21), convertBytes(ref, 64, 48, VC_FORMAT_RGBA, VC_FORMAT_NV21));
+
+    // An odd-sized picture cannot become NV21: the record is left untouched.
+    VCImage* odd = makeRgba(63, 48);
+    VCImage* refused = decodeInto(VC_FORMAT_NV21, encodeBytes(odd, 90), &rc);
+    EXPECT_EQ(rc, VC_ERROR_INVALID_SIZE);
+    EXPECT_EQ(refused->data, nullptr);
+    EXPECT_EQ(refused->width, 0);
+    EXPECT_EQ(refused->height, 0);
+    for (VCImage* i : {source, rgba, bgr, nv21, odd, refused}) VCImage_destroy(i);
 }
 
 TEST(VcJpeg, DecodeIntoExistingBuffers) {
@@ -287,74 +232,24 @@ TEST(VcJpeg, DecodeIntoExistingBuffers) {
     LogCapture log;
     Bytes small(400, 0x5A);
     VCImage* tooSmall = VCImage_createWrap(small.data(), 10, 10, VC_FORMAT_RGBA, 400, 0);
-    EXPECT_EQ(VCImage_decodeFromJpeg(tooSmall, jpeg.data(), length), VC_ERROR_INVALID_SIZE);
-    EXPECT_EQ(tooSmall->width, 10);
-    EXPECT_EQ(tooSmall->height, 10);
-    EXPECT_EQ(small, Bytes(400, 0x5A));
     VCImage* sizeless = VCImage_createWrap(small.data(), 10, 10, VC_FORMAT_RGBA, 0, 0);
-    EXPECT_EQ(VCImage_decodeFromJpeg(sizeless, jpeg.data(), length), VC_ERROR_INVALID_SIZE);
-    EXPECT_EQ(sizeless->width, 10);
-    EXPECT_EQ(small, Bytes(400, 0x5A));
-    EXPECT_EQ(countErrors(log, "VC_ERROR_INVALID_SIZE", -4), 2);
-
-    for (VCImage* i : {owned, wrapped, tooSmall, sizeless, source}) VCImage_destroy(i);
-}
-
-TEST(VcJpeg, DecodeIntoOtherFormats) {
-    REQUIRE_GENERAL_CODECS();
-    VCImage* source = makeRgba(64, 48);
-    Bytes jpeg = encodeBytes(source, 90);
-    int w, h, s;
-    Bytes ref = turboDecode(jpeg, TJPF_RGBA, &w, &h, &s);
-    const size_t n = 64 * 48;
-
-    int rc = 1;
-    VCImage* bgr = decodeInto(VC_FORMAT_BGR8, jpeg, &rc);
-    ASSERT_EQ(rc, 0);
-    ASSERT_EQ(VCImage_size(bgr), n * 3);
-    for (size_t i = 0; i < n; ++i) {
-        ASSERT_EQ(bgr->data[i * 3 + 0], ref[i * 4 + 2]) << i;
-        ASSERT_EQ(bgr->data[i * 3 + 1], ref[i * 4 + 1]) << i;
-        ASSERT_EQ(bgr->data[i * 3 + 2], ref[i * 4 + 0]) << i;
+    for (VCImage* image : {tooSmall, sizeless}) {
+        EXPECT_EQ(VCImage_decodeFromJpeg(image, jpeg.data(), length), VC_ERROR_INVALID_SIZE);
+        EXPECT_EQ(image->width, 10);
+        EXPECT_EQ(image->height, 10);
+        EXPECT_EQ(small, Bytes(400, 0x5A));
     }
-
-    VCImage* nv21 = decodeInto(VC_FORMAT_NV21, jpeg, &rc);
-    ASSERT_EQ(rc, 0);
-    EXPECT_EQ(nv21->width, 64);
-    EXPECT_EQ(nv21->height, 48);
-    ASSERT_EQ(VCImage_size(nv21), n * 3 / 2);
-    for (int y = 0; y < 48; ++y)
-        for (int x = 0; x < 64; ++x) {
-            int Y, U, V;
-            rgbToYuv(&ref[(y * 64 + x) * 4], &Y, &U, &V);
-            ASSERT_EQ(nv21->data[y * 64 + x], Y) << x << "," << y;
-            if (x % 2 == 0 && y % 2 == 0) {
-                const unsigned char* c = nv21->data + n + (y / 2) * 64 + x;
-                ASSERT_EQ(c[0], V) << x << "," << y;
-                ASSERT_EQ(c[1], U) << x << "," << y;
-            }
-        }
-
-    // An odd-sized picture cannot become NV21: the record is left untouched.
-    VCImage* odd = makeRgba(63, 48);
-    Bytes oddJpeg = encodeBytes(odd, 90);
-    VCImage* refused = decodeInto(VC_FORMAT_NV21, oddJpeg, &rc);
-    EXPECT_EQ(rc, VC_ERROR_INVALID_SIZE);
-    EXPECT_EQ(refused->data, nullptr);
-    EXPECT_EQ(refused->width, 0);
-    EXPECT_EQ(refused->height, 0);
-
-    for (VCImage* i : {source, bgr, nv21, odd, refused}) VCImage_destroy(i);
+    EXPECT_EQ(countErrors(log, "VC_ERROR_INVALID_SIZE", -4), 2);
+    for (VCImage* i : {owned, wrapped, tooSmall, sizeless, source}) VCImage_destroy(i);
 }
 
 TEST(VcJpeg, EncodesYuvPictures) {
     REQUIRE_GENERAL_CODECS();
     const int w = 64, h = 48;
-    YuvPicture pic = makeYuv(w, h);
-    Bytes rgb = yuvAsRgb(pic);
-    size_t luma = static_cast<size_t>(w) * h;
-
-    Bytes nv21 = layout420(pic, VC_FORMAT_NV21, luma);
+    const size_t luma = static_cast<size_t>(w) * h;
+    VCImage* source = makeRgba(w, h);
+    Bytes nv21 = convertTo(source, VC_FORMAT_NV21);
+    Bytes rgb = convertBytes(nv21, w, h, VC_FORMAT_NV21, VC_FORMAT_RGB8);  // what it stands for
     VCImage* image = VCImage_createWrap(nv21.data(), w, h, VC_FORMAT_NV21, 0, 0);
     Bytes fromNv21 = encodeBytes(image, 95);
     VCImage_destroy(image);
@@ -363,52 +258,40 @@ TEST(VcJpeg, EncodesYuvPictures) {
     Bytes decoded = turboDecode(fromNv21, TJPF_RGB, &dw, &dh, &sub);
     ASSERT_EQ(dw, w);
     EXPECT_EQ(sub, TJSAMP_420);
-    EXPECT_LT(meanAbsDiff(decoded.data(), 3, rgb.data(), 3, luma, 3), 3.0);
+    EXPECT_LT(meanAbsDiff(decoded.data(), rgb.data(), luma * 3), 3.0);
 
     // The same samples in any 4:2:0 layout, or behind a displaced chroma
     // plane, make the very same stream.
-    for (uint32_t format : {VC_FORMAT_NV12, VC_FORMAT_YV12, VC_FORMAT_YUVP}) {
-        Bytes laid = layout420(pic, format, luma);
-        VCImage* other = VCImage_createWrap(laid.data(), w, h, format, 0, 0);
+    for (uint32_t format : {VC_FORMAT_NV12, VC_FORMAT_YV12, VC_FORMAT_YUVP, VC_FORMAT_NV21}) {
+        const uint32_t chromaAt = format == VC_FORMAT_NV21 ? luma + 256 : 0;
+        Bytes laid = convertTo(source, format, chromaAt);
+        VCImage* other =
+            VCImage_createWrap(laid.data(), w, h, format, static_cast<int>(laid.size()), chromaAt);
         EXPECT_EQ(encodeBytes(other, 95), fromNv21) << std::string((const char*)&format, 4);
         VCImage_destroy(other);
     }
-    Bytes padded = layout420(pic, VC_FORMAT_NV21, luma + 256);
-    VCImage* displaced =
-        VCImage_createWrap(padded.data(), w, h, VC_FORMAT_NV21, static_cast<int>(padded.size()),
-                           static_cast<uint32_t>(luma + 256));
-    EXPECT_EQ(encodeBytes(displaced, 95), fromNv21);
-    VCImage_destroy(displaced);
 
-    // Packed 4:2:2: chroma per horizontal pair (the first row of each pair of rows).
+    // Packed 4:2:2 keeps its horizontal subsampling.
     for (uint32_t format : {VC_FORMAT_YUYV, VC_FORMAT_YVYU}) {
-        Bytes packed(luma * 2);
-        for (int y = 0; y < h; ++y)
-            for (int x = 0; x < w; x += 2) {
-                size_t c = (y / 2) * (w / 2) + x / 2;
-                unsigned char* p = &packed[(y * w + x) * 2];
-                p[0] = pic.y[y * w + x];
-                p[2] = pic.y[y * w + x + 1];
-                p[1] = format == VC_FORMAT_YUYV ? pic.u[c] : pic.v[c];
-                p[3] = format == VC_FORMAT_YUYV ? pic.v[c] : pic.u[c];
-            }
+        Bytes packed = convertTo(source, format);
+        Bytes packedRgb = convertBytes(packed, w, h, format, VC_FORMAT_RGB8);
         VCImage* yuyv = VCImage_createWrap(packed.data(), w, h, format, 0, 0);
-        Bytes stream = encodeBytes(yuyv, 95);
+        Bytes back = turboDecode(encodeBytes(yuyv, 95), TJPF_RGB, &dw, &dh, &sub);
         VCImage_destroy(yuyv);
-        Bytes back = turboDecode(stream, TJPF_RGB, &dw, &dh, &sub);
-        ASSERT_EQ(back.size(), rgb.size());
+        ASSERT_EQ(back.size(), packedRgb.size());
         EXPECT_EQ(sub, TJSAMP_422);
-        EXPECT_LT(meanAbsDiff(back.data(), 3, rgb.data(), 3, luma, 3), 3.0);
+        EXPECT_LT(meanAbsDiff(back.data(), packedRgb.data(), luma * 3), 3.0);
     }
 
     // Grey pictures make one-component streams.
-    VCImage* grey = VCImage_createWrap(pic.y.data(), w, h, VC_FORMAT_GREY, 0, 0);
-    Bytes greyStream = encodeBytes(grey, 95);
+    Bytes greyPixels = convertTo(source, VC_FORMAT_GREY);
+    VCImage* grey = VCImage_createWrap(greyPixels.data(), w, h, VC_FORMAT_GREY, 0, 0);
+    Bytes greyBack = turboDecode(encodeBytes(grey, 95), TJPF_GRAY, &dw, &dh, &sub);
     VCImage_destroy(grey);
-    Bytes greyBack = turboDecode(greyStream, TJPF_GRAY, &dw, &dh, &sub);
     EXPECT_EQ(sub, TJSAMP_GRAY);
     ASSERT_EQ(greyBack.size(), luma);
-    EXPECT_LT(meanAbsDiff(greyBack.data(), 1, pic.y.data(), 1, luma, 1), 2.0);
+    EXPECT_LT(meanAbsDiff(greyBack.data(), greyPixels.data(), luma), 2.0);
+    VCImage_destroy(source);
 
     // 4:2:0 needs even sizes.
     LogCapture log;
@@ -469,8 +352,6 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     EXPECT_EQ(countErrors(log, "VC_ERROR_NULL_PARAM", -2), 3);
     EXPECT_EQ(VCImage_decodeFromJpeg(image, jpeg.data(), -3), VC_ERROR_INVALID_PARAM);
 
-    Bytes truncated(jpeg.begin(), jpeg.begin() + jpeg.size() / 2);
-    Bytes markerOnly = {0xFF, 0xD8};
     Bytes badTable = jpeg;
     size_t dqt = findMarker(badTable, 0xDB);
     ASSERT_NE(dqt, 0u);
@@ -478,18 +359,12 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     Bytes huge = jpeg;
     size_t sof = findMarker(huge, 0xC0);
     ASSERT_NE(sof, 0u);
-    huge[sof + 3] = 0xFD;  // 65000 × 65000: no 32-bit size holds its pixels
-    huge[sof + 4] = 0xE8;
-    huge[sof + 5] = 0xFD;
-    huge[sof + 6] = 0xE8;
+    for (int i = 3; i < 7; ++i) huge[sof + i] = i % 2 ? 0xFD : 0xE8;  // 65000 × 65000
 
-    VCImage* pngSource = makeRgba(16, 16);
     PngPicture picture;
     picture.width = picture.height = 16;
-    picture.samples.assign(pngSource->data, pngSource->data + 16 * 16 * 4);
-    VCImage_destroy(pngSource);
+    picture.samples.assign(16 * 16 * 4, 0x80);
     Bytes png = makePng(picture);
-    Bytes pngTruncated(png.begin(), png.begin() + png.size() * 2 / 3);
     Bytes pngBadCrc = png;
     pngBadCrc[29] ^= 0x55;  // inside the header chunk's checksum
 
@@ -499,11 +374,11 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
         Bytes data;
     } cases[] = {
         {"garbage", Bytes(garbage, garbage + sizeof(garbage))},
-        {"truncated JPEG", truncated},
-        {"marker only", markerOnly},
+        {"truncated JPEG", Bytes(jpeg.begin(), jpeg.begin() + jpeg.size() / 2)},
+        {"marker only", {0xFF, 0xD8}},
         {"bad quantisation table", badTable},
         {"enormous JPEG", huge},
-        {"truncated PNG", pngTruncated},
+        {"truncated PNG", Bytes(png.begin(), png.begin() + png.size() * 2 / 3)},
         {"PNG with a bad checksum", pngBadCrc},
         {"PNG of 50000x30000", pngDeclaring(50000, 30000)},
         {"PNG of 2000000x2", pngDeclaring(2000000, 2)},
@@ -528,91 +403,49 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     VCImage_destroy(image);
 }
 
-TEST(VcPng, DecodeKeepsColourOfTransparentPixels) {
-    PngPicture picture;
-    picture.width = 3;
-    picture.height = 1;
-    picture.samples = {200, 100, 50, 0, 10, 20, 30, 128, 1, 2, 3, 255};
-    Bytes png = makePng(picture);
-    int rc = 1;
-    VCImage* image = decodeInto(VC_FORMAT_RGBA, png, &rc);
-    ASSERT_EQ(rc, 0);
-    ASSERT_EQ(image->width, 3);
-    ASSERT_EQ(image->height, 1);
-    EXPECT_EQ(Bytes(image->data, image->data + 12), picture.samples);
-    VCImage_destroy(image);
+namespace {
 
-    VCImage* bgra = decodeInto(VC_FORMAT_BGRA, png, &rc);
-    ASSERT_EQ(rc, 0);
-    EXPECT_EQ(Bytes(bgra->data, bgra->data + 12),
-              Bytes({50, 100, 200, 0, 30, 20, 10, 128, 3, 2, 1, 255}));
-    VCImage_destroy(bgra);
+PngPicture pngOf(int width, int height, int colorType, int bitDepth, Bytes samples) {
+    PngPicture p;
+    p.width = width;
+    p.height = height;
+    p.colorType = colorType;
+    p.bitDepth = bitDepth;
+    p.samples = std::move(samples);
+    return p;
 }
 
-TEST(VcPng, DecodesEveryColourType) {
+}  // namespace
+
+TEST(VcPng, DecodesEveryColourTypeKeepingColourUnderTransparency) {
+    PngPicture palette = pngOf(3, 1, PNG_COLOR_TYPE_PALETTE, 8, {2, 0, 1});
+    palette.palette = {{10, 20, 30}, {40, 50, 60}, {70, 80, 90}};
+    palette.paletteAlpha = {0, 77};
+    PngPicture interlaced = pngOf(9, 7, PNG_COLOR_TYPE_RGB_ALPHA, 8, Bytes(9 * 7 * 4));
+    interlaced.interlaced = true;
+    for (int y = 0; y < 7; ++y)
+        for (int x = 0; x < 9; ++x) gradientPixel(x, y, 9, 7, &interlaced.samples[(y * 9 + x) * 4]);
     struct Case {
         const char* what;
         PngPicture picture;
         Bytes rgba;
+    } cases[] = {
+        // Unpremultiplied: a transparent pixel keeps its colour.
+        {"RGBA",
+         pngOf(3, 1, PNG_COLOR_TYPE_RGB_ALPHA, 8, {200, 100, 50, 0, 10, 20, 30, 128, 1, 2, 3, 255}),
+         {200, 100, 50, 0, 10, 20, 30, 128, 1, 2, 3, 255}},
+        {"grey", pngOf(2, 1, PNG_COLOR_TYPE_GRAY, 8, {7, 250}), {7, 7, 7, 255, 250, 250, 250, 255}},
+        {"1-bit grey",
+         pngOf(3, 1, PNG_COLOR_TYPE_GRAY, 1, {0xA0}),
+         {255, 255, 255, 255, 0, 0, 0, 255, 255, 255, 255, 255}},
+        {"grey and alpha", pngOf(1, 1, PNG_COLOR_TYPE_GRAY_ALPHA, 8, {90, 0}), {90, 90, 90, 0}},
+        {"RGB", pngOf(1, 1, PNG_COLOR_TYPE_RGB, 8, {1, 2, 3}), {1, 2, 3, 255}},
+        {"16-bit RGB",
+         pngOf(1, 1, PNG_COLOR_TYPE_RGB, 16, {0x80, 0x80, 0x40, 0x40, 0xFF, 0xFF}),
+         {0x80, 0x40, 0xFF, 255}},
+        {"palette", palette, {70, 80, 90, 255, 10, 20, 30, 0, 40, 50, 60, 77}},
+        {"interlaced", interlaced, interlaced.samples},
     };
-    std::vector<Case> cases;
-    {
-        PngPicture s;
-        s.width = 2;
-        s.colorType = PNG_COLOR_TYPE_GRAY;
-        s.samples = {7, 250};
-        cases.push_back({"grey", s, {7, 7, 7, 255, 250, 250, 250, 255}});
-    }
-    {
-        PngPicture s;
-        s.width = 3;
-        s.colorType = PNG_COLOR_TYPE_GRAY;
-        s.bitDepth = 1;
-        s.samples = {0xA0};  // 1, 0, 1
-        cases.push_back({"1-bit grey", s, {255, 255, 255, 255, 0, 0, 0, 255, 255, 255, 255, 255}});
-    }
-    {
-        PngPicture s;
-        s.width = 1;
-        s.colorType = PNG_COLOR_TYPE_GRAY_ALPHA;
-        s.samples = {90, 0};
-        cases.push_back({"grey and alpha", s, {90, 90, 90, 0}});
-    }
-    {
-        PngPicture s;
-        s.width = 1;
-        s.colorType = PNG_COLOR_TYPE_RGB;
-        s.samples = {1, 2, 3};
-        cases.push_back({"RGB", s, {1, 2, 3, 255}});
-    }
-    {
-        PngPicture s;
-        s.width = 1;
-        s.colorType = PNG_COLOR_TYPE_RGB;
-        s.bitDepth = 16;
-        s.samples = {0x80, 0x80, 0x40, 0x40, 0xFF, 0xFF};
-        cases.push_back({"16-bit RGB", s, {0x80, 0x40, 0xFF, 255}});
-    }
-    {
-        PngPicture s;
-        s.width = 3;
-        s.colorType = PNG_COLOR_TYPE_PALETTE;
-        s.palette = {{10, 20, 30}, {40, 50, 60}, {70, 80, 90}};
-        s.paletteAlpha = {0, 77};
-        s.samples = {2, 0, 1};
-        cases.push_back({"palette", s, {70, 80, 90, 255, 10, 20, 30, 0, 40, 50, 60, 77}});
-    }
-    {
-        // Interlaced: the same pixels as written row by row.
-        PngPicture s;
-        s.width = 9;
-        s.height = 7;
-        s.interlaced = true;
-        s.samples.resize(9 * 7 * 4);
-        for (int y = 0; y < 7; ++y)
-            for (int x = 0; x < 9; ++x) gradientPixel(x, y, 9, 7, &s.samples[(y * 9 + x) * 4]);
-        cases.push_back({"interlaced", s, s.samples});
-    }
     for (const Case& c : cases) {
         Bytes png = makePng(c.picture);
         int rc = 1;
@@ -623,4 +456,11 @@ TEST(VcPng, DecodesEveryColourType) {
         EXPECT_EQ(Bytes(image->data, image->data + VCImage_size(image)), c.rgba) << c.what;
         VCImage_destroy(image);
     }
+
+    int rc = 1;
+    VCImage* bgra = decodeInto(VC_FORMAT_BGRA, makePng(cases[0].picture), &rc);
+    ASSERT_EQ(rc, 0);
+    EXPECT_EQ(Bytes(bgra->data, bgra->data + 12),
+              Bytes({50, 100, 200, 0, 30, 20, 10, 128, 3, 2, 1, 255}));
+    VCImage_destroy(bgra);
 }

@@ -39,18 +39,6 @@ bool matches(const std::string& text, const char* pattern) {
 
 }  // namespace
 
-TEST(VcLog, LevelTable) {
-    EXPECT_STREQ("[V]", VF_LogLabel(0));
-    EXPECT_STREQ("[D]", VF_LogLabel(1));
-    EXPECT_STREQ("[I]", VF_LogLabel(2));
-    EXPECT_STREQ("[W]", VF_LogLabel(3));
-    EXPECT_STREQ("[E]", VF_LogLabel(4));
-    EXPECT_STREQ("[V]", VF_LogLabel(5));
-    EXPECT_STREQ("[V]", VF_LogLabel(7));
-    const int expected[] = {3, 3, 4, 5, 6, 3, 3};
-    for (int level = 0; level < 7; ++level) EXPECT_EQ(expected[level], VF_LogPriority(level));
-}
-
 TEST(VcLog, DefaultIsAndroidAndPrintsLabelThenMessage) {
     EXPECT_EQ(reinterpret_cast<void*>(AndroidLogMsg), reinterpret_cast<void*>(VF_LogMsg));
     __android_log_set_logger(recordLogger);
@@ -58,18 +46,20 @@ TEST(VcLog, DefaultIsAndroidAndPrintsLabelThenMessage) {
     gSent.clear();
 
     testing::internal::CaptureStdout();
-    AndroidLogMsg(7, "value %d of %s", 42, "x");
+    AndroidLogMsg(5, "value %d of %s", 42, "x");  // first level past the table
     AndroidLogMsg(VF_LOG_ERROR, "broken");
     AndroidLogMsg(VF_LOG_INFO, "info");
     AndroidLogMsg(VF_LOG_WARNING, "warn");
     AndroidLogMsg(VF_LOG_VERBOSE, "verbose");
-    EXPECT_EQ("[V] value 42 of x\n[E] broken\n[I] info\n[W] warn\n[V] verbose\n",
+    AndroidLogMsg(VF_LOG_DEBUG, "debug");
+    EXPECT_EQ("[V] value 42 of x\n[E] broken\n[I] info\n[W] warn\n[V] verbose\n[D] debug\n",
               testing::internal::GetCapturedStdout());
 
-    ASSERT_EQ(5u, gSent.size());
+    // Unknown levels print as verbose; verbose and debug both go out at debug priority.
+    ASSERT_EQ(6u, gSent.size());
     const int priorities[] = {ANDROID_LOG_DEBUG, ANDROID_LOG_ERROR, ANDROID_LOG_INFO,
-                              ANDROID_LOG_WARN, ANDROID_LOG_DEBUG};
-    const char* messages[] = {"value 42 of x", "broken", "info", "warn", "verbose"};
+                              ANDROID_LOG_WARN,  ANDROID_LOG_DEBUG, ANDROID_LOG_DEBUG};
+    const char* messages[] = {"value 42 of x", "broken", "info", "warn", "verbose", "debug"};
     for (size_t i = 0; i < gSent.size(); ++i) {
         EXPECT_EQ(priorities[i], gSent[i].priority) << i;
         EXPECT_EQ("kivcamera", gSent[i].tag);
@@ -148,9 +138,7 @@ TEST(VcLog, TraceMarkersGoToTheTraceFile) {
     setenv("KIV_TRACE_FILE", path, 1);
     VF_TraceBegin("KI-render");
     VF_TraceEnd();
-    {
-        VFTraceSection section("KI-onDrawFrame");
-    }
+    { VFTraceSection section("KI-onDrawFrame"); }
     std::string longName(3000, 'n');
     VF_TraceBegin(longName.c_str());
 
