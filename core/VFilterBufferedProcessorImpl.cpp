@@ -6,6 +6,8 @@
 
 #include <new>
 
+#include <ui/GraphicBuffer.h>
+
 #include "core/KivBuiltInFilterCatalog.h"
 #include "core/KivEffectSelection.h"
 #include "core/KivFilter.h"
@@ -66,6 +68,8 @@ VFilterBufferedProcessorImpl::~VFilterBufferedProcessorImpl() {
     // GL objects were released by release(); only references are dropped here.
     // The effect holds no GL object of its own once its program is gone.
     deleteEffect();
+    mSourceBuffer.clear();
+    mTargetBuffer.clear();
     mCatalog.clear();
     mProgram.clear();
     mSurface.clear();
@@ -92,6 +96,8 @@ int VFilterBufferedProcessorImpl::initializeGL() {
 int VFilterBufferedProcessorImpl::release() {
     EglLog(VF_LOG_DEBUG, "%s", "virtual int VFilterBufferedProcessorImpl::release()");
     deleteEffect();
+    mSourceBuffer.clear();
+    mTargetBuffer.clear();
     releaseFromGL();
     return 0;
 }
@@ -194,8 +200,7 @@ VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source
                          int height) {
     program.setCameraGeometry(width, height, 0, 0);
     program.setPreviewGeometry(width, height, false);
-    target.flushCache();
-    // flushCache() leaves the default framebuffer bound: draw into the target.
+    // Nothing was drawn into the target yet, so there is no cache to flush.
     if (target.bindFrameBuffer() != 0) return nullptr;
     program.onDrawFrame();
     glFinish();
@@ -211,6 +216,15 @@ VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source
         VC_REPORT(VC_ERROR_UNKNOWN);
     }
     return pixels;
+}
+
+// Initializes `image` over `kept` when that buffer fits it, and keeps the
+// image's buffer for the next call.
+int initializeReusing(EglImage& image, android::sp<android::GraphicBuffer>& kept) {
+    image.reuseGraphicBuffer(kept);
+    int result = image.initialize();
+    kept = image.getGraphicBuffer();
+    return result;
 }
 
 void releaseImage(android::sp<EglImage>& image) {
@@ -279,12 +293,12 @@ int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char* input, int 
         unbindGLEnvironment();
         return VC_REPORT(VC_ERROR_INVALID_STATE);
     }
-    target->initialize();
+    initializeReusing(*target, mTargetBuffer);
     source = new (std::nothrow)
         EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL, width, height, VC_FORMAT_RGBA);
 
     glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
+    if (source != nullptr && initializeReusing(*source, mSourceBuffer) == 0 && source->bindTexture() == 0 &&
         source->setImageData(*rgba, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
         readBack = drawAndReadBack(*mProgram, *target, *source, width, height);
     }
@@ -359,7 +373,7 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
         destroyImage(nv21);
         return VC_REPORT(VC_ERROR_INVALID_STATE);
     }
-    target->initialize();
+    initializeReusing(*target, mTargetBuffer);
 
     uint32_t textureFormat = VC_FORMAT_NV21;
     if (!Platform::isNativeInputFormat(VC_FORMAT_NV21)) {
@@ -375,7 +389,7 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
 
     VCImage* readBack = nullptr;
     glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
+    if (source != nullptr && initializeReusing(*source, mSourceBuffer) == 0 && source->bindTexture() == 0 &&
         source->setImageData(*nv21, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
         readBack = drawAndReadBack(*mProgram, *target, *source, w, h);
     }

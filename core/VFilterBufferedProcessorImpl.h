@@ -18,6 +18,9 @@
 
 class EglEnvironment;
 class EglWindowSurface;
+namespace android {
+class GraphicBuffer;
+}
 class EglProgram;
 class KivBuiltInFilterCatalog;
 class KivFilter;
@@ -83,6 +86,10 @@ private:
     android::sp<KivBuiltInFilterCatalog> mCatalog;
     KivFilter* mFilter;
     int32_t mMaxTextureSize;
+    // The last call's source and target buffers (CPU pixels, no GL object of
+    // this context): a run of same-size pictures reuses them.
+    android::sp<android::GraphicBuffer> mSourceBuffer;
+    android::sp<android::GraphicBuffer> mTargetBuffer;
 };
 
 #endif

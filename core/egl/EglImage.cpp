@@ -99,6 +99,12 @@ EglImage::EglImage(const android::sp<EglEnvironment>& env, IMAGE_TYPE type, int 
 
 EglImage::~EglImage() {}
 
+void EglImage::reuseGraphicBuffer(const android::sp<GraphicBuffer>& buffer) {
+    if (!mInitialized && (mType == IMAGE_EXTERNAL || mType == IMAGE_EXTERNAL_FRAMEBUFFER)) {
+        mGraphicBuffer = buffer;
+    }
+}
+
 int EglImage::onDrawFrame() {
     return 0;
 }
@@ -174,15 +180,23 @@ int EglImage::initializeGraphicBuffer_l() {
     }
 
     uint32_t usage = usageOf(mType);
-    EglLog(VF_LOG_DEBUG, "EglImage: Creating GraphicBuffer %dx%d %4.4s (format %d, usage 0x%08x)",
-           mWidth, mHeight, (const char*)&format, pixelFormat, usage);
-    mGraphicBuffer =
-        new GraphicBuffer((uint32_t)mWidth, (uint32_t)mHeight, pixelFormat, usage, "EglImage");
-    android::status_t status = mGraphicBuffer->initCheck();
-    if (status != android::NO_ERROR) {
-        EglLog(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: %s.", strerror(-status));
-        mGraphicBuffer.clear();
-        return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    bool fits = mGraphicBuffer != nullptr && mGraphicBuffer->getWidth() == (uint32_t)mWidth &&
+                mGraphicBuffer->getHeight() == (uint32_t)mHeight &&
+                mGraphicBuffer->getPixelFormat() == pixelFormat &&
+                mGraphicBuffer->getUsage() == usage;
+    if (!fits) {
+        EglLog(VF_LOG_DEBUG,
+               "EglImage: Creating GraphicBuffer %dx%d %4.4s (format %d, usage 0x%08x)", mWidth,
+               mHeight, (const char*)&format, pixelFormat, usage);
+        mGraphicBuffer =
+            new GraphicBuffer((uint32_t)mWidth, (uint32_t)mHeight, pixelFormat, usage, "EglImage");
+        android::status_t status = mGraphicBuffer->initCheck();
+        if (status != android::NO_ERROR) {
+            EglLog(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: %s.",
+                   strerror(-status));
+            mGraphicBuffer.clear();
+            return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+        }
     }
 
     EGLDisplay display = mEglEnv->getEGLDisplay();
@@ -470,8 +484,12 @@ VCImage* EglImage::getImageData() {
         EglLog(VF_LOG_ERROR, "EGL: Graphic buffer is NULL");
         return nullptr;
     }
-    VCImage* image = Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_COMPACT,
-                                                 Platform::kImplementationDefinedFormat);
+    // Unlocked before returning, so writes to the image never reach the GPU:
+    // a read lock spares the buffer from watching for them.
+    VCImage* image =
+        Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_COMPACT,
+                                    Platform::kImplementationDefinedFormat,
+                                    GraphicBuffer::USAGE_SW_READ_OFTEN);
     if (image == nullptr) {
         EglLog(VF_LOG_ERROR, "EGL: Failed to lock the graphic buffer");
         return nullptr;

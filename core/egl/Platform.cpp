@@ -185,7 +185,7 @@ int Platform::getMaximumTextureSize() {
 }
 
 VCImage* Platform::lockGraphicBuffer(const android::sp<android::GraphicBuffer>& buffer, int mode,
-                                     int format) {
+                                     int format, uint32_t usage) {
     if (buffer == nullptr) return nullptr;
     int pixelFormat = buffer->getPixelFormat();
     if (pixelFormat == kImplementationDefinedFormat) pixelFormat = format;
@@ -205,7 +205,7 @@ VCImage* Platform::lockGraphicBuffer(const android::sp<android::GraphicBuffer>& 
     if ((platform == PLATFORM_TAVRIX3 || platform == PLATFORM_TAVRIX5) &&
         (fourcc == VC_FORMAT_NV21 || fourcc == VC_FORMAT_NV12)) {
         android_ycbcr ycbcr;
-        if (buffer->lockYCbCr(kLockUsage, &ycbcr) != android::NO_ERROR) return nullptr;
+        if (buffer->lockYCbCr(usage, &ycbcr) != android::NO_ERROR) return nullptr;
         unsigned char* luma = static_cast<unsigned char*>(ycbcr.y);
         // The chroma plane starts at the first of its interleaved samples.
         unsigned char* chroma =
@@ -233,7 +233,7 @@ VCImage* Platform::lockGraphicBuffer(const android::sp<android::GraphicBuffer>& 
     VCImage* image = VCImage_createEmpty(width, height, fourcc);
     if (image == nullptr) return nullptr;
     void* address = nullptr;
-    if (buffer->lock(kLockUsage, &address) != android::NO_ERROR) {
+    if (buffer->lock(usage, &address) != android::NO_ERROR) {
         VCImage_destroy(image);
         return nullptr;
     }

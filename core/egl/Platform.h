@@ -63,9 +63,9 @@ public:
     static int getMaximumTextureSize();
 
     // A new image over the locked buffer (the caller unlocks the buffer and
-    // destroys the image), or null.
+    // destroys the image), or null. `usage` is the lock's software usage.
     static VCImage* lockGraphicBuffer(const android::sp<android::GraphicBuffer>& buffer, int mode,
-                                      int format);
+                                      int format, uint32_t usage = kLockUsage);
 
     // Forgets every cached answer, so tests can change the properties.
     static void resetForTesting();
