@@ -76,13 +76,18 @@ TEST(VCConverterCsc, AbsentLibraryClearsTheFlagForGood) {
     VCConverter_release(nullptr);
     VCImage_destroy(img);
 
-    // The hardware pair flags the missing module and falls back to the CPU.
+    // The hardware pair flags the missing module, and the conversion falls back to the CPU.
     HardwarePair pair;
     log.clear();
     EXPECT_EQ(VC_ERROR_UNSUPPORTED, csc_run(pair.in, pair.out));
     EXPECT_EQ(1u, errorLines(log, "VC_ERROR_NOT_IMPLEMENTED", "vccore/src/vc_csc"));
     EXPECT_EQ(1u, errorLines(log, "VC_ERROR_UNSUPPORTED", "vccore/src/vc_csc"));
     EXPECT_EQ(0xEE, pair.dst[0]);
+    log.clear();
+    ASSERT_EQ(VC_OK, VCImage_convert(pair.in, pair.out));
+    EXPECT_EQ(1u, errorLines(log, "VC_ERROR_NOT_IMPLEMENTED", "vccore/src/vc_csc"));
+    EXPECT_FALSE(log.contains(kExternalOk));
+    EXPECT_EQ((38470 * 0x34 + 7471 * 0x12) >> 16, pair.dst[0]);
     // Other pairs are refused without a word.
     log.clear();
     pair.out->format = VC_FORMAT_NV21;
