@@ -38,30 +38,27 @@ TEST(EglEnvironmentTest, AttributeListsAreExact) {
 TEST(EglEnvironmentTest, InitializeBuildsAnEs2ContextOnAnRgba8888PbufferConfig) {
     setenv("EGL_PLATFORM", "surfaceless", 0);
     sp<EglEnvironment> env = new EglEnvironment();
-    EXPECT_EQ(env->getEGLDisplay(), EGL_NO_DISPLAY);
-    EXPECT_EQ(env->getEGLContext(), EGL_NO_CONTEXT);
     EXPECT_FALSE(env->isInitialized());
-
+    EXPECT_EQ(env->getEGLDisplay(), EGL_NO_DISPLAY);
     LogCapture log;
     ASSERT_EQ(env->initialize(), 0);
     EXPECT_TRUE(log.lines().empty());
     EXPECT_TRUE(env->isInitialized());
     EGLDisplay display = env->getEGLDisplay();
+    EGLConfig config = env->getEGLConfig();
     ASSERT_NE(display, EGL_NO_DISPLAY);
-    ASSERT_NE(env->getEGLContext(), EGL_NO_CONTEXT);
-    ASSERT_NE(env->getEGLConfig(), nullptr);
+    ASSERT_NE(config, nullptr);
 
     EGLint value = 0;
     EXPECT_TRUE(eglQueryContext(display, env->getEGLContext(), EGL_CONTEXT_CLIENT_VERSION, &value));
     EXPECT_EQ(value, 2);
-    const EGLint sizes[] = {EGL_RED_SIZE, EGL_GREEN_SIZE, EGL_BLUE_SIZE, EGL_ALPHA_SIZE};
-    for (EGLint attrib : sizes) {
-        EXPECT_TRUE(eglGetConfigAttrib(display, env->getEGLConfig(), attrib, &value));
+    for (EGLint attrib : {EGL_RED_SIZE, EGL_GREEN_SIZE, EGL_BLUE_SIZE, EGL_ALPHA_SIZE}) {
+        EXPECT_TRUE(eglGetConfigAttrib(display, config, attrib, &value));
         EXPECT_EQ(value, 8) << std::hex << attrib;
     }
-    EXPECT_TRUE(eglGetConfigAttrib(display, env->getEGLConfig(), EGL_SURFACE_TYPE, &value));
+    EXPECT_TRUE(eglGetConfigAttrib(display, config, EGL_SURFACE_TYPE, &value));
     EXPECT_NE(value & EGL_PBUFFER_BIT, 0);
-    EXPECT_TRUE(eglGetConfigAttrib(display, env->getEGLConfig(), EGL_RENDERABLE_TYPE, &value));
+    EXPECT_TRUE(eglGetConfigAttrib(display, config, EGL_RENDERABLE_TYPE, &value));
     EXPECT_NE(value & EGL_OPENGL_ES2_BIT, 0);
 
     EXPECT_EQ(env->release(), 0);
@@ -71,7 +68,7 @@ TEST(EglEnvironmentTest, InitializeBuildsAnEs2ContextOnAnRgba8888PbufferConfig) 
     EXPECT_EQ(eglGetError(), EGL_NOT_INITIALIZED);
 }
 
-TEST(EglEnvironmentTest, PendingEglErrorIsClearedAndLoggedOnce) {
+TEST(EglEnvironmentTest, PendingEglAndGlErrorsAreClearedAndLoggedOnce) {
     setenv("EGL_PLATFORM", "surfaceless", 0);
     eglMakeCurrent(nullptr, EGL_NO_SURFACE, EGL_NO_SURFACE, EGL_NO_CONTEXT);  // EGL_BAD_DISPLAY
     LogCapture log;
@@ -84,13 +81,12 @@ TEST(EglEnvironmentTest, PendingEglErrorIsClearedAndLoggedOnce) {
               0u)
         << log.lines()[0].text;
     env->release();
-}
 
-TEST(EglEnvironmentTest, PendingGlErrorOfTheCurrentContextIsClearedToo) {
+    // A GL error left pending in the current context is drained too.
     GlContext gl;
     ASSERT_TRUE(gl.ok());
-    glBindTexture(0x1234, 0);  // GL_INVALID_ENUM, left pending
-    LogCapture log;
+    glBindTexture(0x1234, 0);  // GL_INVALID_ENUM
+    log.clear();
     sp<EglEnvironment> other = new EglEnvironment();
     ASSERT_EQ(other->initialize(), 0);
     ASSERT_EQ(log.lines().size(), 1u);
@@ -110,8 +106,7 @@ TEST(EglEnvironmentTest, RepeatedSetUpAndTearDownKeepsWorking) {
         EXPECT_EQ(eglGetCurrentContext(), gl.env()->getEGLContext());
         glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
         glClear(GL_COLOR_BUFFER_BIT);
-        std::vector<uint8_t> px = GlTest_readPixels(1, 1);
-        EXPECT_EQ(px, (std::vector<uint8_t>{0, 255, 0, 255})) << "cycle " << i;
+        EXPECT_EQ(GlTest_readPixels(1, 1), (std::vector<uint8_t>{0, 255, 0, 255})) << i;
         gl.release();
         EXPECT_EQ(eglGetCurrentContext(), EGL_NO_CONTEXT);
     }

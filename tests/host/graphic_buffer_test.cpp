@@ -18,22 +18,20 @@ using android::sp;
 
 namespace {
 
-const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE |
-                               GraphicBuffer::USAGE_SW_READ_OFTEN |
-                               GraphicBuffer::USAGE_SW_WRITE_OFTEN;
+const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
+const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
+const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
 const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
 
 int clamp255(double v) {
     return v < 0 ? 0 : v > 255 ? 255 : (int)v;
 }
 
-// Full-range YUV -> RGB, truncated then clamped.
-void yuvToRgb(int y, int u, int v, int* rgb) {
-    double cu = u - 128.0;
-    double cv = v - 128.0;
-    rgb[0] = clamp255((double)(int)(y + 1.402 * cv));
-    rgb[1] = clamp255((double)(int)(y - 0.34414 * cu - 0.71414 * cv));
-    rgb[2] = clamp255((double)(int)(y + 1.772 * cu));
+// Locks and returns the CPU pixels (null on failure, which fails the test).
+uint8_t* lock(const sp<GraphicBuffer>& buffer, uint32_t usage) {
+    void* address = nullptr;
+    EXPECT_EQ(buffer->lock(usage, &address), android::NO_ERROR);
+    return static_cast<uint8_t*>(address);
 }
 
 // The buffer's GPU storage as this context sees it: its EGL image bound to a
@@ -49,7 +47,7 @@ public:
         glBindRenderbuffer(GL_RENDERBUFFER, mRenderbuffer);
         target(GL_RENDERBUFFER, static_cast<GLeglImageOES>(mImage));
         glGenFramebuffers(1, &mFramebuffer);
-        glBindFramebuffer(GL_FRAMEBUFFER, mFramebuffer);
+        bind();
         glFramebufferRenderbuffer(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER,
                                   mRenderbuffer);
         mOk = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
@@ -66,8 +64,7 @@ public:
 private:
     EGLDisplay mDisplay;
     EGLImageKHR mImage = EGL_NO_IMAGE_KHR;
-    GLuint mRenderbuffer = 0;
-    GLuint mFramebuffer = 0;
+    GLuint mRenderbuffer = 0, mFramebuffer = 0;
     bool mOk = false;
 };
 
@@ -86,9 +83,8 @@ void renderHalves(int w, int h) {
 void expectHalves(const uint8_t* pixels, int w, int h, size_t pitch) {
     for (int y = 0; y < h; ++y) {
         const uint8_t* p = pixels + y * pitch + (w - 1) * 4;
-        bool lower = y < h / 2;
-        ASSERT_EQ(p[0], lower ? 255 : 0) << "row " << y;
-        ASSERT_EQ(p[2], lower ? 0 : 255) << "row " << y;
+        ASSERT_EQ(p[0], y < h / 2 ? 255 : 0) << "row " << y;
+        ASSERT_EQ(p[2], y < h / 2 ? 0 : 255) << "row " << y;
         ASSERT_EQ(p[3], 255) << "row " << y;
     }
 }
@@ -97,16 +93,13 @@ TEST(GraphicBufferLayout, AllocationLocksAndPlanes) {
     sp<GraphicBuffer> empty = new GraphicBuffer();
     EXPECT_EQ(empty->initCheck(), android::NO_INIT);
     void* pixels = nullptr;
-    EXPECT_EQ(empty->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), android::NO_INIT);
-
-    sp<GraphicBuffer> oddNv21 =
-        new GraphicBuffer(7, 4, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
-    EXPECT_EQ(oddNv21->initCheck(), android::BAD_VALUE);  // odd 4:2:0 width
-    sp<GraphicBuffer> rgb565 = new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGB_565, kTextureUsage);
-    EXPECT_EQ(rgb565->initCheck(), android::BAD_VALUE);
-    sp<GraphicBuffer> narrow =
-        new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 6u, "t");
-    EXPECT_EQ(narrow->initCheck(), android::BAD_VALUE);  // stride below width
+    EXPECT_EQ(empty->lock(kRead, &pixels), android::NO_INIT);
+    // Odd 4:2:0 width, unsupported format, stride below width.
+    sp<GraphicBuffer> bad[] = {
+        new GraphicBuffer(7, 4, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage),
+        new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGB_565, kTextureUsage),
+        new GraphicBuffer(8, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 6u, "t")};
+    for (const auto& b : bad) EXPECT_EQ(b->initCheck(), android::BAD_VALUE);
 
     sp<GraphicBuffer> rgba =
         new GraphicBuffer(10, 4, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 16u, "t");
@@ -114,44 +107,29 @@ TEST(GraphicBufferLayout, AllocationLocksAndPlanes) {
     EXPECT_EQ(rgba->getStride(), 16u);
     EXPECT_EQ(rgba->lock(GraphicBuffer::USAGE_HW_TEXTURE, &pixels), android::BAD_VALUE);
     EXPECT_EQ(rgba->unlock(), android::INVALID_OPERATION);
-    ASSERT_EQ(rgba->lock(GraphicBuffer::USAGE_SW_WRITE_OFTEN, &pixels), android::NO_ERROR);
-    ASSERT_NE(pixels, nullptr);
-    EXPECT_EQ(rgba->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), android::INVALID_OPERATION);
+    ASSERT_NE(lock(rgba, kWrite), nullptr);
+    EXPECT_EQ(rgba->lock(kRead, &pixels), android::INVALID_OPERATION);
     android_ycbcr ycbcr;
-    EXPECT_EQ(rgba->lockYCbCr(GraphicBuffer::USAGE_SW_READ_OFTEN, &ycbcr), android::BAD_VALUE);
+    EXPECT_EQ(rgba->lockYCbCr(kRead, &ycbcr), android::BAD_VALUE);
     EXPECT_EQ(rgba->unlock(), android::NO_ERROR);
 
-    // NV21: V first in the interleaved plane right after the luma rows.
-    sp<GraphicBuffer> nv21 = new GraphicBuffer(8, 6, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
-    ASSERT_EQ(nv21->lockYCbCr(GraphicBuffer::USAGE_SW_READ_OFTEN, &ycbcr), android::NO_ERROR);
-    uint8_t* y = static_cast<uint8_t*>(ycbcr.y);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cr), y + 48);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cb), y + 49);
-    EXPECT_EQ(ycbcr.ystride, 8u);
-    EXPECT_EQ(ycbcr.cstride, 8u);
-    EXPECT_EQ(ycbcr.chroma_step, 2u);
-    EXPECT_EQ(nv21->unlock(), android::NO_ERROR);
-
-    sp<GraphicBuffer> nv12 =
-        new GraphicBuffer(8, 6, HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP, kTextureUsage);
-    ASSERT_EQ(nv12->lockYCbCr(GraphicBuffer::USAGE_SW_READ_OFTEN, &ycbcr), android::NO_ERROR);
-    y = static_cast<uint8_t*>(ycbcr.y);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cb), y + 48);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cr), y + 49);
-    EXPECT_EQ(nv12->unlock(), android::NO_ERROR);
-
-    // YV12: V plane, then U plane, each a quarter of the luma.
-    sp<GraphicBuffer> yv12 = new GraphicBuffer(8, 6, HAL_PIXEL_FORMAT_YV12, kTextureUsage);
-    ASSERT_EQ(yv12->lockYCbCr(GraphicBuffer::USAGE_SW_READ_OFTEN, &ycbcr), android::NO_ERROR);
-    y = static_cast<uint8_t*>(ycbcr.y);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cr), y + 48);
-    EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cb), y + 60);
-    EXPECT_EQ(ycbcr.cstride, 4u);
-    EXPECT_EQ(ycbcr.chroma_step, 1u);
-    EXPECT_EQ(yv12->unlock(), android::NO_ERROR);
-
-    // A plain CPU buffer never touches GL.
-    EXPECT_EQ(nv21->getUploadCount() + nv21->getReadbackCount(), 0u);
+    // Chroma planes of 8x6 buffers: {format, cr offset, cb offset, cstride, step}.
+    const int planes[3][5] = {{HAL_PIXEL_FORMAT_YCrCb_420_SP, 48, 49, 8, 2},  // V first
+                              {HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP, 49, 48, 8, 2},
+                              {HAL_PIXEL_FORMAT_YV12, 48, 60, 4, 1}};  // V plane, then U
+    for (const auto& p : planes) {
+        sp<GraphicBuffer> yuv = new GraphicBuffer(8, 6, p[0], kTextureUsage);
+        ASSERT_EQ(yuv->lockYCbCr(kRead, &ycbcr), android::NO_ERROR) << p[0];
+        uint8_t* y = static_cast<uint8_t*>(ycbcr.y);
+        EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cr), y + p[1]) << p[0];
+        EXPECT_EQ(static_cast<uint8_t*>(ycbcr.cb), y + p[2]) << p[0];
+        EXPECT_EQ(ycbcr.ystride, 8u);
+        EXPECT_EQ(ycbcr.cstride, (size_t)p[3]) << p[0];
+        EXPECT_EQ(ycbcr.chroma_step, (size_t)p[4]) << p[0];
+        EXPECT_EQ(yuv->unlock(), android::NO_ERROR);
+        // A plain CPU buffer never touches GL.
+        EXPECT_EQ(yuv->getUploadCount() + yuv->getReadbackCount(), 0u);
+    }
 }
 
 class GraphicBufferSyncTest : public GlContextTest {
@@ -160,16 +138,14 @@ protected:
 };
 
 TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
-    const int w = 6;
-    const int h = 4;
+    const int w = 6, h = 4;
     sp<GraphicBuffer> buffer =
         new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 8u, "t");
     BufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
 
-    void* address = nullptr;
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_WRITE_OFTEN, &address), android::NO_ERROR);
-    uint8_t* rows = static_cast<uint8_t*>(address);
+    uint8_t* rows = lock(buffer, kWrite);
+    ASSERT_NE(rows, nullptr);
     std::vector<uint8_t> expected;
     for (int yy = 0; yy < h; ++yy) {
         for (int x = 0; x < 8; ++x) {
@@ -181,28 +157,24 @@ TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
     EXPECT_EQ(buffer->getUploadCount(), 0u);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getUploadCount(), 1u);
-
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), expected);
 
-    // A read-only lock sends nothing back up.
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
+    // A read-only lock sends nothing back up; texture-only buffers are never read back.
+    lock(buffer, kRead);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getUploadCount(), 1u);
-    // Texture-only buffers are never read back.
     EXPECT_EQ(buffer->getReadbackCount(), 0u);
 }
 
 TEST_F(GraphicBufferSyncTest, Nv21WritesReachTheGpuAsFullRangeRgba) {
-    const int w = 8;
-    const int h = 4;
+    const int w = 8, h = 4;
     sp<GraphicBuffer> buffer =
         new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
     BufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
-    void* address = nullptr;
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_WRITE_OFTEN, &address), android::NO_ERROR);
-    uint8_t* nv21 = static_cast<uint8_t*>(address);
+    uint8_t* nv21 = lock(buffer, kWrite);
+    ASSERT_NE(nv21, nullptr);
     for (int i = 0; i < w * h; ++i) nv21[i] = (uint8_t)(16 + i * 7);
     for (int i = 0; i < w * h / 2; ++i)
         nv21[w * h + i] = (uint8_t)(i % 2 ? 40 + i * 9 : 230 - i * 11);
@@ -212,25 +184,25 @@ TEST_F(GraphicBufferSyncTest, Nv21WritesReachTheGpuAsFullRangeRgba) {
     std::vector<uint8_t> gpu = GlTest_readPixels(w, h);
     for (int yy = 0; yy < h; ++yy) {
         for (int x = 0; x < w; ++x) {
+            // Full-range YUV -> RGB, truncated then clamped.
             const uint8_t* vu = nv21 + w * h + (yy / 2) * w + (x / 2) * 2;
-            int rgb[3];
-            yuvToRgb(nv21[yy * w + x], vu[1], vu[0], rgb);
+            double luma = nv21[yy * w + x], u = vu[1] - 128.0, v = vu[0] - 128.0;
+            int rgb[3] = {clamp255((int)(luma + 1.402 * v)),
+                          clamp255((int)(luma - 0.34414 * u - 0.71414 * v)),
+                          clamp255((int)(luma + 1.772 * u))};
             const uint8_t* p = &gpu[(yy * w + x) * 4];
             for (int c = 0; c < 3; ++c) EXPECT_NEAR(p[c], rgb[c], 1) << x << "," << yy << " c" << c;
             EXPECT_EQ(p[3], 255);
         }
     }
-    // The CPU copy is the original: a later lock does not replace it with
-    // the (lossy) RGBA mirror.
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
-    EXPECT_EQ(static_cast<uint8_t*>(address)[5], 16 + 5 * 7);
+    // The CPU copy is the original, not the (lossy) RGBA mirror.
+    EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getReadbackCount(), 0u);
 }
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
-    const int w = 8;
-    const int h = 6;
+    const int w = 8, h = 6;
     sp<GraphicBuffer> buffer =
         new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage, 12u, "t");
     BufferView view(display(), buffer);
@@ -238,28 +210,25 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     view.bind();
     renderHalves(w, h);
     // No flush here: the lock fences the current context itself.
-    void* address = nullptr;
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
-    expectHalves(static_cast<uint8_t*>(address), w, h, 12 * 4);
+    uint8_t* pixels = lock(buffer, kRead);
+    ASSERT_NE(pixels, nullptr);
+    expectHalves(pixels, w, h, 12 * 4);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getReadbackCount(), 1u);
     // The caller's context and framebuffer binding are as they were.
     EXPECT_EQ(eglGetCurrentContext(), mGl->env()->getEGLContext());
     glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
     glClear(GL_COLOR_BUFFER_BIT);
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
-    EXPECT_EQ(static_cast<uint8_t*>(address)[1], 255);
-    EXPECT_EQ(static_cast<uint8_t*>(address)[0], 0);
+    pixels = lock(buffer, kRead);
+    EXPECT_EQ(pixels[0], 0);
+    EXPECT_EQ(pixels[1], 255);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
 
     // A read-write lock that changes nothing sends nothing back up; a change does.
-    const uint32_t readWrite =
-        GraphicBuffer::USAGE_SW_READ_OFTEN | GraphicBuffer::USAGE_SW_WRITE_OFTEN;
-    ASSERT_EQ(buffer->lock(readWrite, &address), android::NO_ERROR);
+    lock(buffer, kRead | kWrite);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getUploadCount(), 0u);
-    ASSERT_EQ(buffer->lock(readWrite, &address), android::NO_ERROR);
-    static_cast<uint8_t*>(address)[0] = 99;
+    lock(buffer, kRead | kWrite)[0] = 99;
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(buffer->getUploadCount(), 1u);
     view.bind();
@@ -267,8 +236,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
 }
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
-    const int w = 10;
-    const int h = 8;
+    const int w = 10, h = 8;
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     {
         BufferView view(display(), buffer);
@@ -281,9 +249,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
         EGLContext threadContext = EGL_NO_CONTEXT;
         std::thread reader([&] {
             void* address = nullptr;
-            if (buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address) != android::NO_ERROR) {
-                return;
-            }
+            if (buffer->lock(kRead, &address) != android::NO_ERROR) return;
             const uint8_t* p = static_cast<uint8_t*>(address);
             copy.assign(p, p + w * h * 4);
             buffer->unlock();
@@ -292,20 +258,16 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
         reader.join();
         ASSERT_EQ(copy.size(), static_cast<size_t>(w * h * 4));
         expectHalves(copy.data(), w, h, w * 4);
-        // The borrowed context was given back.
-        EXPECT_EQ(threadContext, EGL_NO_CONTEXT);
+        EXPECT_EQ(threadContext, EGL_NO_CONTEXT);  // the borrowed context was given back
     }
     // Rendered before the image went away: still read back on the next lock.
     EXPECT_EQ(buffer->getReadbackCount(), 1u);
 }
 
 TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDisplay) {
-    const int w = 4;
-    const int h = 4;
+    const int w = 4, h = 4;
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
-    void* address = nullptr;
-    ASSERT_EQ(buffer->lock(GraphicBuffer::USAGE_SW_WRITE_OFTEN, &address), android::NO_ERROR);
-    memset(address, 77, w * h * 4);
+    memset(lock(buffer, kWrite), 77, w * h * 4);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
     {
         BufferView view(display(), buffer);  // makes the mirror
@@ -345,8 +307,7 @@ TEST(HostEglDisplayTest, TerminationEndsTheDisplayOnlyWithItsLastUser) {
     GlTest_deleteTarget(&target);
     EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);
     first.release();
-    // The last reference ends it.
-    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
+    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);  // the last reference ends it
 }
 
 }  // namespace
