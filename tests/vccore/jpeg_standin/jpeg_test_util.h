@@ -10,6 +10,8 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <fstream>
+#include <iterator>
 #include <regex>
 #include <string>
 #include <vector>
@@ -44,17 +46,21 @@ inline VCImage* makeRgba(int w, int h) {
     return image;
 }
 
-inline bool isErrorLine(const std::string& text, const char* name, int code) {
-    std::regex pattern(std::string("^") + name + " \\(" + std::to_string(code) +
-                       "\\): vccore/src/vc_image:[0-9]+$");
-    return std::regex_match(text, pattern);
+// The pixels of a record (VCImage_size bytes) and its geometry as "WxH".
+inline Bytes bytesOf(const VCImage* image) {
+    return Bytes(image->data, image->data + VCImage_size(image));
+}
+inline std::string shapeOf(const VCImage* image) {
+    return std::to_string(image->width) + "x" + std::to_string(image->height);
 }
 
 // Number of error-level lines reporting `code` under the image core's source name.
 inline int countErrors(const LogCapture& log, const char* name, int code) {
+    std::regex pattern(std::string("^") + name + " \\(" + std::to_string(code) +
+                       "\\): vccore/src/vc_image:[0-9]+$");
     int n = 0;
     for (const LoggedLine& line : log.lines())
-        if (line.level == 4 && isErrorLine(line.text, name, code)) ++n;
+        if (line.level == 4 && std::regex_match(line.text, pattern)) ++n;
     return n;
 }
 
@@ -76,21 +82,14 @@ private:
 };
 
 inline Bytes readFile(const std::string& path) {
-    Bytes out;
-    FILE* f = fopen(path.c_str(), "rb");
-    if (f == nullptr) return out;
-    unsigned char buffer[65536];
-    size_t n;
-    while ((n = fread(buffer, 1, sizeof(buffer), f)) > 0) out.insert(out.end(), buffer, buffer + n);
-    fclose(f);
-    return out;
+    std::ifstream in(path, std::ios::binary);
+    return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
 }
 
 inline void writeFile(const std::string& path, const Bytes& bytes) {
-    FILE* f = fopen(path.c_str(), "wb");
-    if (f == nullptr) return;
-    if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
-    fclose(f);
+    std::ofstream(path, std::ios::binary)
+        .write(reinterpret_cast<const char*>(bytes.data()),
+               static_cast<std::streamsize>(bytes.size()));
 }
 
 inline bool fileExists(const std::string& path) {
