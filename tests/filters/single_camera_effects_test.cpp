@@ -170,8 +170,8 @@ TEST_F(GlContextTest, BaseSnippetDrawsAndBrokenSnippetsFallBack) {
         EXPECT_TRUE(log.contains(4, "SingleEffect: could not load this shader"));
         size_t reports = 0;
         for (const std::string& line : log.texts())
-            reports += line.rfind("VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:",
-                                  0) == 0;
+            reports +=
+                line.rfind("VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:", 0) == 0;
         EXPECT_EQ(1u, reports);
         EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
         EXPECT_EQ(opaque, r.pixels);

@@ -77,10 +77,8 @@ TEST(Args, Numbers) {
     EXPECT_TRUE(parseInt("-5", -10, 10, &v));
     EXPECT_EQ(-5, v);
     v = 42;
-    EXPECT_FALSE(parseInt("101", 1, 100, &v));
-    EXPECT_FALSE(parseInt("0", 1, 100, &v));
-    EXPECT_FALSE(parseInt("12abc", 1, 100, &v));
-    EXPECT_FALSE(parseInt("", 1, 100, &v));
+    for (const char* bad : {"101", "0", "12abc", ""})
+        EXPECT_FALSE(parseInt(bad, 1, 100, &v)) << bad;
     EXPECT_FALSE(parseInt("99999999999999999999", 1, 2147483647, &v));
     EXPECT_EQ(42, v);  // untouched on failure
 
@@ -90,10 +88,8 @@ TEST(Args, Numbers) {
     EXPECT_EQ(480, h);
     EXPECT_TRUE(parseSize("100X64", 64, 8192, &w, &h));
     EXPECT_EQ(64, h);
-    EXPECT_FALSE(parseSize("640", 64, 8192, &w, &h));
-    EXPECT_FALSE(parseSize("640x", 64, 8192, &w, &h));
-    EXPECT_FALSE(parseSize("63x100", 64, 8192, &w, &h));
-    EXPECT_FALSE(parseSize("640x480x2", 64, 8192, &w, &h));
+    for (const char* bad : {"640", "640x", "63x100", "640x480x2"})
+        EXPECT_FALSE(parseSize(bad, 64, 8192, &w, &h)) << bad;
 }
 
 TEST(Progress, Line) {

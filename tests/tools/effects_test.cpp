@@ -38,29 +38,25 @@ TEST_F(Effects, ListMatchesTheFactory) {
         EXPECT_EQ(f->getFilterType(), e.filterType);
         EXPECT_EQ(KivImaging_getOptionsCount(f), static_cast<int>(e.options.size())) << e.id;
         KivImaging_destroy(f);
-        if (e.id == 400) {
-            sawNoEffect = true;
-            EXPECT_EQ("NoEffect", e.className);
-            EXPECT_EQ(400, e.filterType);
-        }
+        sawNoEffect |= e.id == 400 && e.className == "NoEffect" && e.filterType == 400;
     }
     EXPECT_TRUE(sawNoEffect);
-    // Ids between the ranges and the downloadable filter are not listed.
-    for (const EffectInfo& e : list) {
-        EXPECT_NE(2000, e.id);
-        EXPECT_FALSE(e.id > 213 && e.id < 400);
+    // And nothing the factory serves below the downloadable filter is missing.
+    size_t served = 0;
+    for (int id = 0; id < 1000; id++) {
+        KivFilter* f = KivImaging_create(id, nullptr);
+        served += f != nullptr;
+        KivImaging_destroy(f);
     }
-}
-
-TEST_F(Effects, ClassNameOfAnObject) {
-    KivFilter* f = KivImaging_create(403, nullptr);
-    ASSERT_NE(nullptr, f);
-    EXPECT_EQ("Negative", effectClassName(f));
-    KivImaging_destroy(f);
-    EXPECT_EQ("", effectClassName(nullptr));
+    EXPECT_EQ(served, list.size());
 }
 
 TEST_F(Effects, ResolvesIdsAndNames) {
+    KivFilter* f = KivImaging_create(403, nullptr);
+    EXPECT_EQ("Negative", effectClassName(f));
+    KivImaging_destroy(f);
+    EXPECT_EQ("", effectClassName(nullptr));
+
     EffectChoice c;
     std::string error;
     ASSERT_TRUE(effectResolve("403", &c, &error)) << error;
@@ -78,7 +74,6 @@ TEST_F(Effects, ResolvesIdsAndNames) {
     } bad[] = {
         {"404", "no effect has id 404 (see 'kivimaging effects')"},
         {"2000", "no effect has id 2000 (see 'kivimaging effects')"},
-        {"-1", "no effect has id -1 (see 'kivimaging effects')"},
         {"Sepiaa", "unknown effect 'Sepiaa' (see 'kivimaging effects')"},
         {"", "empty effect name"},
     };

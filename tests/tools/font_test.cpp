@@ -50,19 +50,8 @@ TEST(Font, TableCoversPrintableAsciiWithDistinctWellFormedGlyphs) {
 }
 
 TEST(Font, GlyphShapes) {
-    // Capital A: a rounded top, the crossbar on row 3, open legs down to row 6.
-    EXPECT_EQ(
-        ".###."
-        "#...#"
-        "#...#"
-        "#####"
-        "#...#"
-        "#...#"
-        "#...#"
-        "....."
-        ".....",
-        glyphBits('A'));
-    // Lower-case g: bowl on rows 2-6, tail on rows 7-8.
+    // Lower-case g (not mirror-symmetric, so column or row order mix-ups show):
+    // bowl on rows 2-6, tail on rows 7-8.
     EXPECT_EQ(
         "....."
         "....."
@@ -78,17 +67,12 @@ TEST(Font, GlyphShapes) {
     EXPECT_FALSE(fontGlyphPixel('H', -1, 0));
     EXPECT_FALSE(fontGlyphPixel('H', kGlyphWidth, 0));
     EXPECT_FALSE(fontGlyphPixel('H', 0, kGlyphHeight));
-    // Descenders reach the two bottom rows; capitals and digits never do.
-    for (char c : std::string("gjpqy")) {
-        bool below = fontGlyphPixel(c, 0, 7) || fontGlyphPixel(c, 1, 7) ||
-                     fontGlyphPixel(c, 2, 7) || fontGlyphPixel(c, 3, 7) || fontGlyphPixel(c, 4, 7);
-        EXPECT_TRUE(below) << c;
-    }
-    for (char c = 'A'; c <= 'Z'; c++) {
-        for (int col = 0; col < kGlyphWidth; col++) {
-            EXPECT_FALSE(fontGlyphPixel(c, col, 7) || fontGlyphPixel(c, col, 8)) << c;
-        }
-    }
+    // Descenders reach row 7; capitals never go below row 6.
+    auto below = [](char c, int row) {
+        return glyphBits(c).find('#', row * kGlyphWidth) != std::string::npos;
+    };
+    for (char c : std::string("gjpqy")) EXPECT_TRUE(below(c, 7)) << c;
+    for (char c = 'A'; c <= 'Z'; c++) EXPECT_FALSE(below(c, 7)) << c;
     // Zero and capital O differ by the zero's diagonal.
     EXPECT_TRUE(fontGlyphPixel('0', 2, 3));
     EXPECT_FALSE(fontGlyphPixel('O', 2, 3));
@@ -123,13 +107,7 @@ TEST(Font, DrawsGlyphPixelsAtScaleAndAdvance) {
             ASSERT_EQ(expected, lit(image, x, y)) << "pixel " << x << "," << y;
         }
     }
-    // A few spot checks written out: A's top row is .###., so its corners are dark.
-    EXPECT_FALSE(lit(image, x0, y0));
-    EXPECT_TRUE(lit(image, x0 + 2, y0));
-    EXPECT_TRUE(lit(image, x0 + 3, y0 + 1));
-    // '1' begins one advance (12 pixels at scale 2) later; its stem is column 2.
-    EXPECT_TRUE(lit(image, x0 + 12 + 4, y0 + 4));
-    EXPECT_EQ(255, at(image, x0 + 2, y0)[3]);
+    EXPECT_EQ(255, at(image, x0 + 2, y0)[3]);  // A's top row is .###.
     VCImage_destroy(image);
 }
 

@@ -2,28 +2,19 @@
 // colours it promises.
 #include <gtest/gtest.h>
 
+#include <vector>
+
 #include "sample_image.h"
 
 namespace {
 
 using namespace kivcli;
-
-struct Rgb {
-    int r, g, b;
-};
+using Rgb = std::vector<int>;
 
 Rgb pixel(const VCImage* image, int x, int y) {
     const uint8_t* p = image->data + (static_cast<size_t>(y) * image->width + x) * 4;
     return {p[0], p[1], p[2]};
 }
-
-void expectRgb(const VCImage* image, int x, int y, int r, int g, int b) {
-    Rgb p = pixel(image, x, y);
-    EXPECT_EQ(r, p.r) << "at " << x << "," << y;
-    EXPECT_EQ(g, p.g) << "at " << x << "," << y;
-    EXPECT_EQ(b, p.b) << "at " << x << "," << y;
-}
-
 int centreX(const Rect& r) {
     return r.x + r.width / 2;
 }
@@ -37,15 +28,12 @@ TEST(Sample, LayoutTilesThePicture) {
         SampleLayout l = sampleLayout(w, h);
         const Rect all[] = {l.bars,      l.greyRamp, l.hueRamp, l.stripes,   l.checker,
                             l.skinLight, l.skinDark, l.redRamp, l.greenRamp, l.blueRamp};
-        // Each pixel belongs to exactly one patch.
+        // Non-empty patches inside the picture whose areas add up to it.
         long long area = 0;
         for (const Rect& r : all) {
-            EXPECT_GT(r.width, 0);
-            EXPECT_GT(r.height, 0);
-            EXPECT_GE(r.x, 0);
-            EXPECT_GE(r.y, 0);
-            EXPECT_LE(r.x + r.width, w);
-            EXPECT_LE(r.y + r.height, h);
+            EXPECT_TRUE(r.width > 0 && r.height > 0 && r.x >= 0 && r.y >= 0 && r.x + r.width <= w &&
+                        r.y + r.height <= h)
+                << w << "x" << h << " patch at " << r.x << "," << r.y;
             area += static_cast<long long>(r.width) * r.height;
         }
         EXPECT_EQ(static_cast<long long>(w) * h, area) << w << "x" << h;
@@ -67,56 +55,55 @@ TEST(Sample, PatchesHoldTheirColours) {
     SampleLayout l = sampleLayout(w, h);
 
     // Eight bars of 40 pixels: white, yellow, cyan, green, magenta, red, blue, black.
-    const int bars[8][3] = {{255, 255, 255}, {255, 255, 0}, {0, 255, 255}, {0, 255, 0},
-                            {255, 0, 255},   {255, 0, 0},   {0, 0, 255},   {0, 0, 0}};
+    const Rgb bars[8] = {{255, 255, 255}, {255, 255, 0}, {0, 255, 255}, {0, 255, 0},
+                         {255, 0, 255},   {255, 0, 0},   {0, 0, 255},   {0, 0, 0}};
     for (int i = 0; i < 8; i++) {
-        expectRgb(image, i * 40 + 20, 40, bars[i][0], bars[i][1], bars[i][2]);
-        expectRgb(image, i * 40, 0, bars[i][0], bars[i][1], bars[i][2]);
-        expectRgb(image, i * 40 + 39, 79, bars[i][0], bars[i][1], bars[i][2]);
+        EXPECT_EQ(bars[i], pixel(image, i * 40, 0)) << i;
+        EXPECT_EQ(bars[i], pixel(image, i * 40 + 39, 79)) << i;
     }
     // Grey ramp: black at the left edge, white at the right edge, grey in between.
-    expectRgb(image, l.greyRamp.x, centreY(l.greyRamp), 0, 0, 0);
-    expectRgb(image, l.greyRamp.x + l.greyRamp.width - 1, centreY(l.greyRamp), 255, 255, 255);
-    Rgb mid = pixel(image, centreX(l.greyRamp), centreY(l.greyRamp));
-    EXPECT_NEAR(128, mid.r, 2);
-    EXPECT_EQ(mid.r, mid.g);
-    EXPECT_EQ(mid.r, mid.b);
+    const int gy = centreY(l.greyRamp);
+    EXPECT_EQ((Rgb{0, 0, 0}), pixel(image, l.greyRamp.x, gy));
+    EXPECT_EQ((Rgb{255, 255, 255}), pixel(image, l.greyRamp.x + l.greyRamp.width - 1, gy));
+    Rgb mid = pixel(image, centreX(l.greyRamp), gy);
+    EXPECT_NEAR(128, mid[0], 2);
+    EXPECT_EQ((Rgb{mid[0], mid[0], mid[0]}), mid);
     // Hue ramp starts at pure red; a third of the way along it is green.
-    expectRgb(image, l.hueRamp.x, centreY(l.hueRamp), 255, 0, 0);
+    EXPECT_EQ((Rgb{255, 0, 0}), pixel(image, l.hueRamp.x, centreY(l.hueRamp)));
     Rgb third = pixel(image, l.hueRamp.x + l.hueRamp.width / 3, centreY(l.hueRamp));
-    EXPECT_EQ(255, third.g);
-    EXPECT_LE(third.r, 10);
-    EXPECT_EQ(0, third.b);
+    EXPECT_EQ(255, third[1]);
+    EXPECT_LE(third[0], 10);
+    EXPECT_EQ(0, third[2]);
     // Stripes alternate per column, the checkerboard per column and row.
+    const Rgb white{255, 255, 255}, black{0, 0, 0};
     int sy = centreY(l.stripes);
-    expectRgb(image, l.stripes.x, sy, 255, 255, 255);
-    expectRgb(image, l.stripes.x + 1, sy, 0, 0, 0);
-    expectRgb(image, l.stripes.x + 1, sy + 1, 0, 0, 0);
+    EXPECT_EQ(white, pixel(image, l.stripes.x, sy));
+    EXPECT_EQ(black, pixel(image, l.stripes.x + 1, sy));
+    EXPECT_EQ(black, pixel(image, l.stripes.x + 1, sy + 1));
     int cx = l.checker.x, cy = l.checker.y;
-    expectRgb(image, cx, cy, 255, 255, 255);
-    expectRgb(image, cx + 1, cy, 0, 0, 0);
-    expectRgb(image, cx, cy + 1, 0, 0, 0);
-    expectRgb(image, cx + 1, cy + 1, 255, 255, 255);
-    // Skin tones, and the three primary ramps ending at full strength.
-    expectRgb(image, centreX(l.skinLight), centreY(l.skinLight), 232, 190, 160);
-    expectRgb(image, centreX(l.skinDark), centreY(l.skinDark), 141, 85, 54);
+    EXPECT_EQ(white, pixel(image, cx, cy));
+    EXPECT_EQ(black, pixel(image, cx + 1, cy));
+    EXPECT_EQ(black, pixel(image, cx, cy + 1));
+    EXPECT_EQ(white, pixel(image, cx + 1, cy + 1));
+    // Skin tones, and the three primary ramps from black to full strength.
+    EXPECT_EQ((Rgb{232, 190, 160}), pixel(image, centreX(l.skinLight), centreY(l.skinLight)));
+    EXPECT_EQ((Rgb{141, 85, 54}), pixel(image, centreX(l.skinDark), centreY(l.skinDark)));
     int right = l.redRamp.x + l.redRamp.width - 1;
-    expectRgb(image, right, centreY(l.redRamp), 255, 0, 0);
-    expectRgb(image, right, centreY(l.greenRamp), 0, 255, 0);
-    expectRgb(image, right, centreY(l.blueRamp), 0, 0, 255);
-    expectRgb(image, l.redRamp.x, centreY(l.redRamp), 0, 0, 0);
+    EXPECT_EQ((Rgb{255, 0, 0}), pixel(image, right, centreY(l.redRamp)));
+    EXPECT_EQ((Rgb{0, 255, 0}), pixel(image, right, centreY(l.greenRamp)));
+    EXPECT_EQ((Rgb{0, 0, 255}), pixel(image, right, centreY(l.blueRamp)));
+    EXPECT_EQ(black, pixel(image, l.redRamp.x, centreY(l.redRamp)));
     // Opaque everywhere.
     for (int i = 0; i < w * h; i++) ASSERT_EQ(255, image->data[i * 4 + 3]) << "pixel " << i;
     VCImage_destroy(image);
-}
 
-TEST(Sample, RefusesTinySizes) {
+    // 64x64 is the smallest picture made.
     EXPECT_EQ(nullptr, sampleCreate(63, 100));
     EXPECT_EQ(nullptr, sampleCreate(100, 0));
     EXPECT_EQ(nullptr, sampleCreate(-5, -5));
-    VCImage* smallest = sampleCreate(64, 64);
-    EXPECT_NE(nullptr, smallest);
-    VCImage_destroy(smallest);
+    image = sampleCreate(64, 64);
+    EXPECT_NE(nullptr, image);
+    VCImage_destroy(image);
 }
 
 }  // namespace
