@@ -36,10 +36,8 @@ TEST_F(GlContextTest, ShaderBuildsLinksAndDrawsThroughItsIndex) {
 
     ASSERT_EQ(shader->initialize(true), 0);
     GLuint program = shader->getProgramId();
-    ASSERT_NE(program, 0u);
-    EXPECT_TRUE(glIsProgram(program));
+    ASSERT_TRUE(glIsProgram(program));
     EXPECT_TRUE(glIsShader(shader->getVertexId()));
-
     unsigned int fragment = shader->loadShader(GL_FRAGMENT_SHADER, kSolidFragment);
     ASSERT_NE(fragment, 0u);
     ASSERT_EQ(shader->bindFragmentShader(fragment, true), 0);
@@ -49,9 +47,9 @@ TEST_F(GlContextTest, ShaderBuildsLinksAndDrawsThroughItsIndex) {
 
     ASSERT_EQ(shader->bindProgram(EglShader::SHADER_PRECISION_MEDIUM), 0);
     EXPECT_EQ(shader->addNameIndexer("a_position", EglShader::INDEX_ATTRIBUTE, 206), 1);
-    EXPECT_EQ(shader->addNameIndexer("u_color", EglShader::INDEX_UNIFORM, 0), 1);
-    EXPECT_EQ(shader->addNameIndexer("u_alpha", EglShader::INDEX_UNIFORM, 0), 1);
-    EXPECT_EQ(shader->addNameIndexer("u_missing", EglShader::INDEX_UNIFORM, 0), 1);
+    for (const char* name : {"u_color", "u_alpha", "u_missing"}) {
+        EXPECT_EQ(shader->addNameIndexer(name, EglShader::INDEX_UNIFORM, 0), 1) << name;
+    }
     const EglShader::NameIndex* pos = shader->getNameIndexer("a_position");
     ASSERT_NE(pos, nullptr);
     EXPECT_EQ(pos->mKind, EglShader::INDEX_ATTRIBUTE);
@@ -76,20 +74,15 @@ TEST_F(GlContextTest, ShaderBuildsLinksAndDrawsThroughItsIndex) {
     shader->unBindVertexAttrib("a_position");
     EXPECT_TRUE(log.lines().empty());
     EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));
-    std::vector<uint8_t> px = GlTest_readPixels(2, 2);
-    for (int i = 0; i < 4; i++) {
-        EXPECT_EQ(px[i * 4 + 0], 255);
-        EXPECT_EQ(px[i * 4 + 1], 0);
-        EXPECT_EQ(px[i * 4 + 2], 255);
-        EXPECT_EQ(px[i * 4 + 3], 255);
-    }
+    std::vector<uint8_t> magenta(16, 255);
+    for (int i = 1; i < 16; i += 4) magenta[i] = 0;
+    EXPECT_EQ(GlTest_readPixels(2, 2), magenta);
     // Alpha through the 1-component vector setter.
-    const float half = 0.0f;
-    shader->setUniformfv("u_alpha", 1, 1, &half);
+    const float zero = 0.0f;
+    shader->setUniformfv("u_alpha", 1, 1, &zero);
     shader->bindVertexAttrib("a_position", 3, kQuad);
     glDrawArrays(GL_TRIANGLE_STRIP, 0, 4);
-    px = GlTest_readPixels(1, 1);
-    EXPECT_EQ(px[3], 0);
+    EXPECT_EQ(GlTest_readPixels(1, 1)[3], 0);
 
     shader->clearIndexer();
     EXPECT_EQ(shader->getNameIndexer("a_position"), nullptr);
@@ -110,18 +103,15 @@ TEST_F(GlContextTest, CompileAndLinkFailuresAreReported) {
     const char* broken = "void main() { gl_FragColor = nonsense; }";
     EXPECT_EQ(shader->loadShader(GL_FRAGMENT_SHADER, broken), 0u);
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, std::string("Failed to compile shader: ") + broken));
-
-    log.clear();
     EXPECT_EQ(shader->loadShader(0x1234, "void main() {}"), 0u);
     EXPECT_TRUE(log.contains("Failed to create a shader of type 0x1234 (GL_VERTEX_SHADER)"));
 
-    // A vertex stage whose varying the fragment stage reads with another type.
-    const char* mismatched =
+    // The fragment stage reads the vertex stage's varying with another type.
+    unsigned int fragment = shader->loadShader(
+        GL_FRAGMENT_SHADER,
         "precision mediump float; varying highp vec3 v_texcoord; void main() { gl_FragColor = "
-        "vec4(v_texcoord, 1.0); }";
-    unsigned int fragment = shader->loadShader(GL_FRAGMENT_SHADER, mismatched);
+        "vec4(v_texcoord, 1.0); }");
     ASSERT_NE(fragment, 0u);
-    log.clear();
     EXPECT_EQ(shader->bindFragmentShader(fragment, true), -1);
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "GL Error: Program failed to link."));
     shader->release();
@@ -140,7 +130,6 @@ TEST_F(GlContextTest, ReplacingAStageDeletesTheOldShader) {
     GLint attached = 0;
     glGetProgramiv(shader->getProgramId(), GL_ATTACHED_SHADERS, &attached);
     EXPECT_EQ(attached, 2);
-
     shader->unBindFragmentShader();
     EXPECT_FALSE(glIsShader(second));
     EXPECT_EQ(shader->getFragmentId(), 0u);
@@ -159,9 +148,8 @@ TEST_F(GlContextTest, CreateReleaseCyclesLeaveNoLiveObject) {
         programs.push_back(shader->getProgramId());
         shaders.push_back(shader->getVertexId());
         shaders.push_back(fragment);
-        // Released twice on purpose: the second call must be harmless.
         shader->release();
-        shader->release();
+        shader->release();  // the second call must be harmless
     }
     for (GLuint p : programs) EXPECT_FALSE(glIsProgram(p)) << p;
     for (GLuint s : shaders) EXPECT_FALSE(glIsShader(s)) << s;

@@ -1,4 +1,5 @@
-// EglWindowSurface as a 1x1 pbuffer: size rules, binding, swapping, release.
+// EglWindowSurface: the 1x1 pbuffer (size rules, binding, swapping, release)
+// and the window kinds on the host window.
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
 #include <gtest/gtest.h>
@@ -21,53 +22,40 @@ using android::sp;
 
 namespace {
 
-TEST_F(GlContextTest, PbufferIsOneByOneWhateverTheRequestedSize) {
+TEST_F(GlContextTest, PbufferIsOneByOneBindsSwapsAndReleases) {
     const sp<EglWindowSurface>& surface = mGl->surface();
+    EGLDisplay display = mGl->env()->getEGLDisplay();
     EXPECT_EQ(surface->getSurfaceType(), EglWindowSurface::SURFACE_PBUFFER);
-    surface->setSize(640, 480);
+    surface->setSize(640, 480);  // ignored
     EXPECT_EQ(surface->getWidth(), 1);
     EXPECT_EQ(surface->getHeight(), 1);
     EGLint w = 0, h = 0;
-    EGLDisplay display = mGl->env()->getEGLDisplay();
     EXPECT_TRUE(eglQuerySurface(display, surface->getEGLSurface(), EGL_WIDTH, &w));
     EXPECT_TRUE(eglQuerySurface(display, surface->getEGLSurface(), EGL_HEIGHT, &h));
-    EXPECT_EQ(w, 1);
-    EXPECT_EQ(h, 1);
-}
-
-TEST_F(GlContextTest, BindUnbindAndSwap) {
-    const sp<EglWindowSurface>& surface = mGl->surface();
-    EGLSurface egl = surface->getEGLSurface();
-    EXPECT_EQ(eglGetCurrentContext(), mGl->env()->getEGLContext());
-    EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), egl);
-    EXPECT_EQ(eglGetCurrentSurface(EGL_READ), egl);
+    EXPECT_EQ(std::make_pair(w, h), std::make_pair(1, 1));
+    EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), surface->getEGLSurface());
+    EXPECT_EQ(eglGetCurrentSurface(EGL_READ), surface->getEGLSurface());
     EXPECT_EQ(surface->swapSurface(), 0);
-
     EXPECT_EQ(surface->unbindSurface(), 0);
     EXPECT_EQ(eglGetCurrentContext(), EGL_NO_CONTEXT);
     EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), EGL_NO_SURFACE);
     EXPECT_EQ(surface->bindSurface(), 0);
     EXPECT_EQ(eglGetCurrentContext(), mGl->env()->getEGLContext());
-}
 
-TEST_F(GlContextTest, SecondPbufferSharesTheContextAndReleasesCleanly) {
+    // A second pbuffer on the same environment.
     sp<EglWindowSurface> second = new EglWindowSurface(mGl->env());
     ASSERT_EQ(second->initialize(), 0);
     EGLSurface egl = second->getEGLSurface();
-    ASSERT_NE(egl, EGL_NO_SURFACE);
     ASSERT_EQ(second->bindSurface(), 0);
     EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), egl);
-    ASSERT_EQ(mGl->surface()->bindSurface(), 0);
-
+    ASSERT_EQ(surface->bindSurface(), 0);
     LogCapture log;
     second->release();
     EXPECT_TRUE(log.lines().empty());
     EXPECT_EQ(second->getEGLSurface(), EGL_NO_SURFACE);
-    EGLint w = 0;
-    EXPECT_FALSE(eglQuerySurface(mGl->env()->getEGLDisplay(), egl, EGL_WIDTH, &w));
+    EXPECT_FALSE(eglQuerySurface(display, egl, EGL_WIDTH, &w));
     EXPECT_EQ(eglGetError(), EGL_BAD_SURFACE);
-    // Released for good: the environment reference is gone.
-    EXPECT_NE(second->bindSurface(), 0);
+    EXPECT_NE(second->bindSurface(), 0);  // the environment reference is gone
 }
 
 TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
@@ -83,9 +71,9 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed."));
     bool sawCheckLine = false;
     for (const auto& l : log.texts()) {
-        if (l.rfind("EGL Error: 0x3001 'EGL_NOT_INITIALIZED' - result = eglDestroySurface(", 0) ==
-            0)
-            sawCheckLine = true;
+        sawCheckLine |=
+            l.rfind("EGL Error: 0x3001 'EGL_NOT_INITIALIZED' - result = eglDestroySurface(", 0) ==
+            0;
     }
     EXPECT_TRUE(sawCheckLine);
     EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
@@ -110,7 +98,6 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
 TEST_F(GlContextTest, PreviewWindowGetsThreeBuffersAndReceivesSwappedFrames) {
     sp<HostWindow> window = new HostWindow(8, 4);
     ASSERT_EQ(native_window_set_buffer_count(window.get(), 5), 0);
-    ASSERT_EQ(window->getBufferCount(), 5);
     const uint64_t usage = window->getConsumerUsage();
     sp<EglWindowSurface> surface =
         new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
@@ -128,16 +115,11 @@ TEST_F(GlContextTest, PreviewWindowGetsThreeBuffersAndReceivesSwappedFrames) {
     ASSERT_EQ(surface->swapSurface(), 0);
     ASSERT_EQ(window->queuedFrameCount(), 1u);
     sp<GraphicBuffer> frame;
-    uint64_t number = 0;
-    int64_t timestamp = 0;
-    ASSERT_EQ(window->acquireFrame(&frame, &number, &timestamp), 0);
+    ASSERT_EQ(window->acquireFrame(&frame, nullptr, nullptr), 0);
     void* pixels = nullptr;
     ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), 0);
     const uint8_t* p = static_cast<const uint8_t*>(pixels);
-    EXPECT_EQ(p[0], 255);
-    EXPECT_EQ(p[1], 0);
-    EXPECT_EQ(p[2], 0);
-    EXPECT_EQ(p[3], 255);
+    EXPECT_EQ(std::vector<uint8_t>(p, p + 4), (std::vector<uint8_t>{255, 0, 0, 255}));
     frame->unlock();
     window->releaseFrame(frame);
 
@@ -145,26 +127,10 @@ TEST_F(GlContextTest, PreviewWindowGetsThreeBuffersAndReceivesSwappedFrames) {
     surface->release();
     EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
     EXPECT_EQ(window->getConnectedApi(), 0);
-    // The surface gave its window reference back.
-    EXPECT_EQ(window->getStrongCount(), 1);
+    EXPECT_EQ(window->getStrongCount(), 1);  // the surface gave its reference back
 }
 
-TEST_F(GlContextTest, WindowSizeIsAskedOfTheWindow) {
-    sp<HostWindow> window = new HostWindow(8, 4);
-    sp<EglWindowSurface> surface =
-        new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_RECORDING);
-    ASSERT_EQ(surface->initialize(), 0);
-    surface->setSize(32, 16);
-    EXPECT_EQ(surface->getWidth(), 32);
-    EXPECT_EQ(surface->getHeight(), 16);
-    // The window changed behind the surface's back: asked again, not cached.
-    ASSERT_EQ(native_window_set_buffers_dimensions(window.get(), 10, 6), 0);
-    EXPECT_EQ(surface->getWidth(), 10);
-    EXPECT_EQ(surface->getHeight(), 6);
-    surface->release();
-}
-
-TEST_F(GlContextTest, RecordingLeavesTheWindowAloneAndSoftwarePreviewSetsItsUsage) {
+TEST_F(GlContextTest, RecordingAsksTheWindowAndSoftwarePreviewSetsItsUsage) {
     sp<HostWindow> recorder = new HostWindow(8, 4);
     ASSERT_EQ(native_window_set_buffer_count(recorder.get(), 5), 0);
     const uint64_t usage = recorder->getConsumerUsage();
@@ -175,6 +141,13 @@ TEST_F(GlContextTest, RecordingLeavesTheWindowAloneAndSoftwarePreviewSetsItsUsag
     EXPECT_FALSE(log.contains("Setting max buffer count to 3"));
     EXPECT_EQ(recorder->getBufferCount(), 5);
     EXPECT_EQ(recorder->getConsumerUsage(), usage);
+    recording->setSize(32, 16);
+    EXPECT_EQ(recording->getWidth(), 32);
+    EXPECT_EQ(recording->getHeight(), 16);
+    // The window changed behind the surface's back: asked again, not cached.
+    ASSERT_EQ(native_window_set_buffers_dimensions(recorder.get(), 10, 6), 0);
+    EXPECT_EQ(recording->getWidth(), 10);
+    EXPECT_EQ(recording->getHeight(), 6);
     recording->release();
 
     sp<HostWindow> preview = new HostWindow(8, 4);
