@@ -3,6 +3,7 @@
 #include <utils/StrongPointer.h>
 
 #include <string>
+#include <utility>
 
 #include "core/KivBuiltInFilterCatalog.h"
 
@@ -57,16 +58,12 @@ TEST(KivBuiltInFilterCatalog, AddReleaseAndOtherTypes) {
     EXPECT_FALSE(catalog->addBuiltInFilter((kMaker + ",libdawn.so").c_str(), 400));
     EXPECT_EQ(catalog->getBuiltInFilterId((kMaker + ",libdawn.so").c_str()), 508);
     // Inserted out of order, all found: the vector stays sorted.
-    EXPECT_TRUE(catalog->addBuiltInFilter("zz.last", 3));
-    EXPECT_TRUE(catalog->addBuiltInFilter("AA.first", 1));
-    EXPECT_TRUE(catalog->addBuiltInFilter("m.middle", 2));
-    EXPECT_TRUE(catalog->addBuiltInFilter("M.middle", 4));
+    const std::pair<const char*, int> added[] = {
+        {"zz.last", 3}, {"AA.first", 1}, {"m.middle", 2}, {"M.middle", 4}};
+    for (const auto& [name, id] : added) EXPECT_TRUE(catalog->addBuiltInFilter(name, id));
     EXPECT_FALSE(catalog->addBuiltInFilter("m.middle", 9));
     EXPECT_EQ(catalog->size(), 12u);
-    EXPECT_EQ(catalog->getBuiltInFilterId("zz.last"), 3);
-    EXPECT_EQ(catalog->getBuiltInFilterId("AA.first"), 1);
-    EXPECT_EQ(catalog->getBuiltInFilterId("m.middle"), 2);
-    EXPECT_EQ(catalog->getBuiltInFilterId("M.middle"), 4);
+    for (const auto& [name, id] : added) EXPECT_EQ(catalog->getBuiltInFilterId(name), id);
     EXPECT_EQ(catalog->getBuiltInFilterId((kMaker + ",libfilm.so").c_str()), 501);
 
     catalog->release();

@@ -14,27 +14,7 @@
 
 namespace {
 
-// What each served id's effect reports from getFilterType(). Where it differs
-// from the id it does so on purpose: processors compare it with a requested id.
-const std::map<int, int> kReportedType = {
-    {200, 200}, {201, 201}, {202, 202},
-    {204, 204}, {206, 206}, {208, 208},
-    {209, 209}, {210, 210}, {212, -1318387531 /* 0xB16B00B5 */},
-    {213, 213}, {400, 400}, {401, 401},
-    {402, 402}, {403, 403}, {406, 406},
-    {408, 408}, {410, 410}, {411, 411},
-    {412, 412}, {414, 414}, {415, 415},
-    {416, 416}, {417, 417}, {422, 422},
-    {425, 425}, {426, 426}, {427, 427},
-    {428, 428}, {429, 429}, {430, 430},
-    {431, 432}, {432, 432}, {433, 433},
-    {434, 434}, {435, 425}, {436, 436},
-    {440, 440}, {441, 441}, {442, 442},
-    {443, 443}, {444, 444}, {445, 445},
-    {446, 446}, {447, 447},
-};
-
-TEST(KivFilterFactory, UnservedIdsYieldNull) {
+TEST(KivFilterFactory, UnservedIdsYieldNullAndServedIdsReportTheirType) {
     LogCapture log;
     for (int id : {-1,  0,   199, 203, 205, 207, 211, 214, 399, 404, 405,  407, 409,
                    413, 418, 421, 423, 424, 437, 439, 448, 499, 509, 1999, 2001}) {
@@ -42,21 +22,19 @@ TEST(KivFilterFactory, UnservedIdsYieldNull) {
         EXPECT_TRUE(
             log.contains(VF_LOG_DEBUG, "Trying to instantiate effect " + std::to_string(id)));
     }
-}
-
-TEST(KivFilterFactory, ServedIdsReportTheirType) {
-    // Effects join the table family by family; each one present must report
-    // the agreed type and start without images.
+    // Served effects report their id, except these on purpose (processors
+    // compare the reported type with a requested id), and start without images.
+    const std::map<int, int> quirks = {{212, -1318387531 /* 0xB16B00B5 */}, {431, 432}, {435, 425}};
     int served = 0;
-    for (const auto& [id, type] : kReportedType) {
+    for (int id = 0; id < 1000; ++id) {
         std::unique_ptr<KivFilter> f(KivFilterFactory::create(id, nullptr));
         if (!f) continue;
         ++served;
-        EXPECT_EQ(f->getFilterType(), type) << "id " << id;
+        EXPECT_EQ(f->getFilterType(), quirks.count(id) ? quirks.at(id) : id) << "id " << id;
         EXPECT_EQ(f->getValue(102, -7), -7) << "id " << id;
     }
     RecordProperty("served_ids", served);
-    if (served == 0) GTEST_SKIP() << "no effect class is in the factory table yet";
+    EXPECT_GT(served, 0);  // at least the pass-through look every processor falls back to
 }
 
 class NamedProbe : public ProbeEffect {
