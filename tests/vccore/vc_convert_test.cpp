@@ -5,11 +5,11 @@
 #include <string.h>
 
 #include <random>
-#include <regex>
 #include <string>
 #include <vector>
 
 #include "support/log_capture.h"
+#include "vc_error_lines.h"
 #include "vc_csc.h"
 #include "vc_image_convert_fast.h"
 #include "vccore/vc_convert.h"
@@ -24,14 +24,6 @@ struct ScalarOnly {
     ScalarOnly() { VCConvert_setLevel(kVCConvertScalar); }
     ~ScalarOnly() { VCConvert_setLevel(VCConvert_cpuLevel()); }
 };
-
-bool hasErrorLine(const LogCapture& log, const char* name, int code, const char* source) {
-    const std::regex re(std::string(name) + " \\(" + std::to_string(code) + "\\): " + source +
-                        ":[0-9]+");
-    for (const LoggedLine& l : log.lines())
-        if (l.level == VF_LOG_ERROR && std::regex_match(l.text, re)) return true;
-    return false;
-}
 
 int clampTo8(int v) {
     return v < 0 ? 0 : (v > 255 ? 255 : v);
@@ -111,7 +103,7 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
 
     EXPECT_EQ(VC_ERROR_NULL_PARAM, VCImage_convert(nullptr, nv21));
     EXPECT_EQ(VC_ERROR_NULL_PARAM, VCImage_convert(rgba, nullptr));
-    EXPECT_TRUE(hasErrorLine(log, "VC_ERROR_NULL_PARAM", -2, "vccore/src/vc_image"));
+    EXPECT_TRUE(countErrors(log, "VC_ERROR_NULL_PARAM", -2, "vccore/src/vc_image"));
     EXPECT_FALSE(log.contains("[VCImage] Converting from 2x2 RGBA to 2x2 NV21"));
 
     // The debug line comes before the data check.
@@ -119,7 +111,7 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     log.clear();
     EXPECT_EQ(VC_ERROR_INVALID_PARAM, VCImage_convert(rgba, header));
     EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "[VCImage] Converting from 2x2 RGBA to 2x2 NV21"));
-    EXPECT_TRUE(hasErrorLine(log, "VC_ERROR_INVALID_PARAM", -3, "vccore/src/vc_image"));
+    EXPECT_TRUE(countErrors(log, "VC_ERROR_INVALID_PARAM", -3, "vccore/src/vc_image"));
     VCImage_destroy(header);
 
     // A target without a required size.
@@ -129,7 +121,7 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     log.clear();
     EXPECT_EQ(VC_ERROR_UNSUPPORTED, VCImage_convert(jpeg, rgba));
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "[VCImage] Can not convert JPEG into RGBA"));
-    EXPECT_TRUE(hasErrorLine(log, "VC_ERROR_UNSUPPORTED", -6, "vccore/src/vc_image"));
+    EXPECT_TRUE(countErrors(log, "VC_ERROR_UNSUPPORTED", -6, "vccore/src/vc_image"));
     VCImage_destroy(jpeg);
 
     // Odd width of a YUV target; odd height only matters for 4:2:0.
@@ -158,7 +150,7 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_convert(square, tight));
     EXPECT_EQ(7, tight->width);
     EXPECT_EQ(1, tight->height);
-    EXPECT_TRUE(hasErrorLine(log, "VC_ERROR_INVALID_SIZE", -4, "vccore/src/vc_image"));
+    EXPECT_TRUE(countErrors(log, "VC_ERROR_INVALID_SIZE", -4, "vccore/src/vc_image"));
     // With no size field the computed size of its own geometry counts.
     VCImage* smallHeader = VCImage_createWrap(small, 1, 3, VC_FORMAT_RGBA, 0, 0);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_convert(square, smallHeader));

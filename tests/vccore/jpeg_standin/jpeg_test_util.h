@@ -12,11 +12,11 @@
 
 #include <fstream>
 #include <iterator>
-#include <regex>
 #include <string>
 #include <vector>
 
 #include "support/log_capture.h"
+#include "../vc_error_lines.h"
 #include "vccore/vc_image.h"
 
 namespace jpegtest {
@@ -52,16 +52,6 @@ inline Bytes bytesOf(const VCImage* image) {
 }
 inline std::string shapeOf(const VCImage* image) {
     return std::to_string(image->width) + "x" + std::to_string(image->height);
-}
-
-// Number of error-level lines reporting `code` under the image core's source name.
-inline int countErrors(const LogCapture& log, const char* name, int code) {
-    std::regex pattern(std::string("^") + name + " \\(" + std::to_string(code) +
-                       "\\): vccore/src/vc_image:[0-9]+$");
-    int n = 0;
-    for (const LoggedLine& line : log.lines())
-        if (line.level == 4 && std::regex_match(line.text, pattern)) ++n;
-    return n;
 }
 
 class TempDir {
