@@ -68,18 +68,7 @@ private:
     bool mOk = false;
 };
 
-// Red in the lower half of GL rows (memory rows 0..h/2-1), blue above.
-void renderHalves(int w, int h) {
-    glViewport(0, 0, w, h);
-    glClearColor(0.0f, 0.0f, 1.0f, 1.0f);
-    glClear(GL_COLOR_BUFFER_BIT);
-    glEnable(GL_SCISSOR_TEST);
-    glScissor(0, 0, w, h / 2);
-    glClearColor(1.0f, 0.0f, 0.0f, 1.0f);
-    glClear(GL_COLOR_BUFFER_BIT);
-    glDisable(GL_SCISSOR_TEST);
-}
-
+// After GlTest_fillHalves: memory rows 0..h/2-1 red, the rest blue.
 void expectHalves(const uint8_t* pixels, int w, int h, size_t pitch) {
     for (int y = 0; y < h; ++y) {
         const uint8_t* p = pixels + y * pitch + (w - 1) * 4;
@@ -208,7 +197,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     BufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
     view.bind();
-    renderHalves(w, h);
+    GlTest_fillHalves(w, h);
     // No flush here: the lock fences the current context itself.
     uint8_t* pixels = lock(buffer, kRead);
     ASSERT_NE(pixels, nullptr);
@@ -242,7 +231,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
         BufferView view(display(), buffer);
         ASSERT_TRUE(view.ok());
         view.bind();
-        renderHalves(w, h);
+        GlTest_fillHalves(w, h);
         glFlush();  // the hand-over to another thread, as on a device
 
         std::vector<uint8_t> copy;

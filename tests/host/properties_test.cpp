@@ -13,32 +13,29 @@ TEST(PropertiesTest, ReadsTheMappedVariableOrTheDefault) {
     unsetenv("KIV_PROP_ro_board_platform");
     EXPECT_EQ(property_get("ro.board.platform", value, ""), 0);
     EXPECT_STREQ(value, "");
-    EXPECT_EQ(property_get("ro.board.platform", value, "fallback"), 8);
-    EXPECT_STREQ(value, "fallback");
     EXPECT_EQ(property_get("ro.board.platform", value, nullptr), 0);
     EXPECT_STREQ(value, "");
+    EXPECT_EQ(property_get("ro.board.platform", value, "fallback"), 8);
+    EXPECT_STREQ(value, "fallback");
 
     setenv("KIV_PROP_ro_board_platform", "msm8974", 1);
     EXPECT_EQ(property_get("ro.board.platform", value, "fallback"), 7);
     EXPECT_STREQ(value, "msm8974");
-    // Dots become underscores, so this spelling names the same variable;
-    // any other key does not.
+    // Dots become underscores, so this spelling names the same variable.
     EXPECT_EQ(property_get("ro_board_platform", value, "x"), 7);
     EXPECT_EQ(property_get("ro.board.platforms", value, "x"), 1);
     EXPECT_STREQ(value, "x");
+    unsetenv("KIV_PROP_ro_board_platform");
 
-    // An empty variable reads as unset.
-    setenv("KIV_PROP_ro_chipname", "", 1);
+    setenv("KIV_PROP_ro_chipname", "", 1);  // empty reads as unset
     EXPECT_EQ(property_get("ro.chipname", value, "dflt"), 4);
     EXPECT_STREQ(value, "dflt");
-    unsetenv("KIV_PROP_ro_board_platform");
     unsetenv("KIV_PROP_ro_chipname");
 }
 
 TEST(PropertiesTest, LongValuesAreCutAndBadArgumentsAreSafe) {
     char value[PROPERTY_VALUE_MAX];
-    std::string longValue(200, 'a');
-    setenv("KIV_PROP_test_long", longValue.c_str(), 1);
+    setenv("KIV_PROP_test_long", std::string(200, 'a').c_str(), 1);
     EXPECT_EQ(property_get("test.long", value, ""), PROPERTY_VALUE_MAX - 1);
     EXPECT_EQ(std::string(value), std::string(PROPERTY_VALUE_MAX - 1, 'a'));
     unsetenv("KIV_PROP_test_long");
@@ -46,8 +43,7 @@ TEST(PropertiesTest, LongValuesAreCutAndBadArgumentsAreSafe) {
     EXPECT_EQ(property_get(nullptr, value, "d"), 1);
     EXPECT_STREQ(value, "d");
     EXPECT_EQ(property_get("a.b", nullptr, "d"), 0);
-    std::string hugeKey(500, 'k');
-    EXPECT_EQ(property_get(hugeKey.c_str(), value, "d"), 1);
+    EXPECT_EQ(property_get(std::string(500, 'k').c_str(), value, "d"), 1);
 }
 
 }  // namespace

@@ -6,7 +6,7 @@
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglWindowSurface.h"
 
-GlContext::GlContext() : mOk(false) {
+GlContext::GlContext() {
     // Test programs may run outside ctest, which sets this for them.
     setenv("EGL_PLATFORM", "surfaceless", 0);
     mEnv = new EglEnvironment();
@@ -32,14 +32,22 @@ void GlContext::release() {
     mOk = false;
 }
 
+namespace {
+
+void nearestClamped(GLenum target) {
+    glTexParameteri(target, GL_TEXTURE_MIN_FILTER, GL_NEAREST);
+    glTexParameteri(target, GL_TEXTURE_MAG_FILTER, GL_NEAREST);
+    glTexParameteri(target, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+    glTexParameteri(target, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+}
+
+}  // namespace
+
 GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels) {
     GLuint texture = 0;
     glGenTextures(1, &texture);
     glBindTexture(GL_TEXTURE_2D, texture);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_NEAREST);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_NEAREST);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    nearestClamped(GL_TEXTURE_2D);
     glPixelStorei(GL_UNPACK_ALIGNMENT, 1);
     glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE, pixels);
     glBindTexture(GL_TEXTURE_2D, 0);
@@ -56,17 +64,13 @@ bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
 
     out->storage = GlTest_makeTexture2D(width, height, pixels);
     const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_NONE};
-    out->image = createImage(eglGetCurrentDisplay(), eglGetCurrentContext(),
-                             EGL_GL_TEXTURE_2D_KHR,
-                             reinterpret_cast<EGLClientBuffer>(static_cast<uintptr_t>(out->storage)),
-                             attribs);
+    out->image = createImage(
+        eglGetCurrentDisplay(), eglGetCurrentContext(), EGL_GL_TEXTURE_2D_KHR,
+        reinterpret_cast<EGLClientBuffer>(static_cast<uintptr_t>(out->storage)), attribs);
     if (out->image == EGL_NO_IMAGE_KHR) return false;
     glGenTextures(1, &out->external);
     glBindTexture(GL_TEXTURE_EXTERNAL_OES, out->external);
-    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_NEAREST);
-    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_NEAREST);
-    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-    glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    nearestClamped(GL_TEXTURE_EXTERNAL_OES);
     targetTexture(GL_TEXTURE_EXTERNAL_OES, static_cast<GLeglImageOES>(out->image));
     glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
     return glGetError() == GL_NO_ERROR;
@@ -98,6 +102,17 @@ void GlTest_deleteTarget(GlTarget* target) {
     if (target->framebuffer != 0) glDeleteFramebuffers(1, &target->framebuffer);
     if (target->texture != 0) glDeleteTextures(1, &target->texture);
     *target = GlTarget();
+}
+
+void GlTest_fillHalves(int width, int height) {
+    glViewport(0, 0, width, height);
+    glClearColor(0.0f, 0.0f, 1.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    glEnable(GL_SCISSOR_TEST);
+    glScissor(0, 0, width, height / 2);
+    glClearColor(1.0f, 0.0f, 0.0f, 1.0f);
+    glClear(GL_COLOR_BUFFER_BIT);
+    glDisable(GL_SCISSOR_TEST);
 }
 
 std::vector<uint8_t> GlTest_readPixels(int width, int height) {

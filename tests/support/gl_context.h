@@ -1,6 +1,6 @@
-// A real GL context for tests: an EglEnvironment with a bound 1x1 pbuffer
-// EglWindowSurface (Mesa llvmpipe on a headless host), and small plain-GL
-// helpers to make input textures and render targets and read them back.
+// A real GL context for tests (Mesa llvmpipe, headless): an EglEnvironment
+// with a bound 1x1 pbuffer EglWindowSurface, and plain-GL helpers to make
+// input textures and render targets and read them back.
 #ifndef KIV_TESTS_GL_CONTEXT_H
 #define KIV_TESTS_GL_CONTEXT_H
 
@@ -17,37 +17,31 @@
 class EglEnvironment;
 class EglWindowSurface;
 
-// Owns the environment and the surface; current on the constructing thread
-// from construction until destruction (or release()).
+// Current on the constructing thread from construction until release().
 class GlContext {
 public:
     GlContext();
     ~GlContext();
-
-    // True when the environment and the surface came up and are bound.
     bool ok() const { return mOk; }
     // Unbinds and releases the surface, then the environment. Idempotent.
     void release();
-
     const android::sp<EglEnvironment>& env() const { return mEnv; }
     const android::sp<EglWindowSurface>& surface() const { return mSurface; }
-
     GlContext(const GlContext&) = delete;
     GlContext& operator=(const GlContext&) = delete;
 
 private:
     android::sp<EglEnvironment> mEnv;
     android::sp<EglWindowSurface> mSurface;
-    bool mOk;
+    bool mOk = false;
 };
 
-// A 2D RGBA texture of width x height (nearest filtering, clamped) holding
-// pixels (tightly packed rows, first row at t = 0); pixels may be null.
+// A clamped, nearest-filtered 2D RGBA texture; pixels (tight rows, first row
+// at t = 0) may be null.
 GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels);
 
-// An external (GL_TEXTURE_EXTERNAL_OES) texture whose storage is a 2D RGBA
-// texture with the given pixels, shared through an EGLImageKHR. Release with
-// GlTest_deleteExternalTexture.
+// An external texture whose storage is a 2D RGBA texture holding pixels,
+// shared through an EGLImageKHR.
 struct GlExternalTexture {
     GLuint external = 0;
     GLuint storage = 0;
@@ -57,7 +51,7 @@ bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
                                 GlExternalTexture* out);
 void GlTest_deleteExternalTexture(GlExternalTexture* texture);
 
-// An RGBA framebuffer of width x height (texture colour attachment), bound.
+// An RGBA framebuffer with a texture colour attachment, left bound.
 struct GlTarget {
     GLuint framebuffer = 0;
     GLuint texture = 0;
@@ -66,6 +60,8 @@ struct GlTarget {
 };
 bool GlTest_makeTarget(int width, int height, GlTarget* out);
 void GlTest_deleteTarget(GlTarget* target);
+// Clears the bound framebuffer's lower half of GL rows red, the rest blue.
+void GlTest_fillHalves(int width, int height);
 // Reads the bound framebuffer; row 0 is the bottom row (GL order).
 std::vector<uint8_t> GlTest_readPixels(int width, int height);
 
