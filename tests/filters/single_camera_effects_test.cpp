@@ -1,6 +1,7 @@
-// The fixed single-pass looks: what the factory builds for their ids, and what
-// each renders through EglProgram on llvmpipe compared with the independent
-// CPU statement of its math (tests/support/look_reference).
+// The fixed single-pass looks: what the factory builds for their ids, the band
+// edges of the quantising looks, and the base and broken snippets drawn through
+// EglProgram on llvmpipe. Every look's whole picture is compared with its CPU
+// statement through the buffered processor (tests/processor).
 #include <gtest/gtest.h>
 
 #include <cstring>
@@ -95,25 +96,6 @@ TEST(SingleCameraEffects, FactoryBuildsEachLookWithItsOwnSnippet) {
     EXPECT_EQ(0, sepia.releaseGL(*recycler));
     EXPECT_EQ(VC_ERROR_UNSUPPORTED, sepia.doEffect());
     EXPECT_TRUE(sepia.isGLPreviewSupported() && sepia.isGLPictureSupported());
-}
-
-TEST_F(GlContextTest, EveryLookMatchesItsCpuStatement) {
-    // Odd sizes on purpose: no symmetry can hide a row or column mix-up.
-    const int w = 61, h = 47;
-    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
-    for (int id : lookref::lookIds()) {
-        KivFilter* f = KivImaging_create(id, nullptr);
-        ASSERT_NE(nullptr, f);
-        LogCapture log;
-        Rendered r = renderWithProgram(f, picture);
-        EXPECT_EQ(0, r.drawResult) << id;
-        // The effect's own shader was used, not the default fallback.
-        EXPECT_FALSE(log.contains("GL Error: failed to load effect shader. Loading default."))
-            << id;
-        ASSERT_EQ(size_t(w) * h * 4, r.pixels.size());
-        lookref::expectLook(id, picture, r.pixels.data(), "EglProgram");
-        KivImaging_destroy(f);
-    }
 }
 
 TEST_F(GlContextTest, EdgeValuesOfTheQuantisingLooks) {
