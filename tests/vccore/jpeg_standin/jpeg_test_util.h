@@ -10,6 +10,7 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <string>
@@ -54,6 +55,7 @@ inline std::string shapeOf(const VCImage* image) {
     return std::to_string(image->width) + "x" + std::to_string(image->height);
 }
 
+// A fresh directory under /tmp, removed with its content at the end of the scope.
 class TempDir {
 public:
     TempDir() {
@@ -61,8 +63,8 @@ public:
         mPath = mkdtemp(pattern);
     }
     ~TempDir() {
-        std::string command = "rm -rf '" + mPath + "'";
-        if (system(command.c_str()) != 0) fprintf(stderr, "could not remove %s\n", mPath.c_str());
+        std::error_code ignored;  // a destructor must not throw
+        std::filesystem::remove_all(mPath, ignored);
     }
     std::string file(const std::string& name) const { return mPath + "/" + name; }
     const std::string& path() const { return mPath; }
