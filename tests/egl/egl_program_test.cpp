@@ -32,8 +32,13 @@ public:
     int getFilterType() const override { return mType; }
     int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int& id) override {
         loads++;
-        program.setDrawFlag(true);
-        id = program.loadFragmentShader(mCode, false);
+        if (sabotage) {  // takes the vertex stage away: even the default cannot link
+            program.getShader()->unBindVertexShader();
+            return -1;
+        }
+        program.setDrawFlag(!selfDrawing);
+        id = selfDrawing ? 0 : program.loadFragmentShader(mCode, false);
+        if (selfDrawing) return 0;
         return id == 0 ? -1 : program.bindFragmentShader(id);
     }
     int loadExtFragmentShader(EglProgram& program) override {
@@ -42,6 +47,10 @@ public:
     }
     int onDrawFrame(EglProgram&) override {
         draws++;
+        if (selfDrawing) {  // draws cyan on its own
+            glClearColor(0.0f, 1.0f, 1.0f, 1.0f);
+            glClear(GL_COLOR_BUFFER_BIT);
+        }
         return drawResult;
     }
     int releaseGL(EglRecycler& recycler) override {
@@ -52,6 +61,7 @@ public:
     const char* mCode;
     int mType;
     int loads = 0, draws = 0, drawResult = 0;
+    bool sabotage = false, selfDrawing = false;
     EglRecycler* releasedWith = nullptr;
 };
 
@@ -326,18 +336,9 @@ TEST_F(EglProgramTest, DownloadableEffectSuppliesACompleteShader) {
     EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
 }
 
-// Takes the program's vertex stage away: even the default cannot link.
-class SabotageFilter : public TestFilter {
-public:
-    SabotageFilter() : TestFilter("") {}
-    int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int&) override {
-        program.getShader()->unBindVertexShader();
-        return -1;
-    }
-};
-
 TEST_F(EglProgramTest, UnlinkableDefaultMeansABlackScreen) {
-    SabotageFilter filter;
+    TestFilter filter("");
+    filter.sabotage = true;
     mProgram->setFilter(&filter);
     LogCapture log;
     EXPECT_EQ(mProgram->initialize(10, false), -1);
@@ -347,24 +348,9 @@ TEST_F(EglProgramTest, UnlinkableDefaultMeansABlackScreen) {
     EXPECT_EQ(mProgram->getProgramID(), 0u);
 }
 
-// Does all its drawing itself (draw flag cleared).
-class SelfDrawingFilter : public TestFilter {
-public:
-    SelfDrawingFilter() : TestFilter("") {}
-    int loadPartialFragmentShader(EglProgram& program, const char*, unsigned int& id) override {
-        program.setDrawFlag(false);
-        id = 0;
-        return 0;
-    }
-    int onDrawFrame(EglProgram&) override {
-        glClearColor(0.0f, 1.0f, 1.0f, 1.0f);
-        glClear(GL_COLOR_BUFFER_BIT);
-        return 0;
-    }
-};
-
 TEST_F(EglProgramTest, WithTheDrawFlagClearedTheEffectDrawsAlone) {
-    SelfDrawingFilter filter;
+    TestFilter filter("");
+    filter.selfDrawing = true;
     mProgram->setFilter(&filter);
     ASSERT_EQ(mProgram->initialize(10, false), 0);
     EXPECT_FALSE(mProgram->getDrawFlag());
