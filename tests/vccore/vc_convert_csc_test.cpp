@@ -84,6 +84,7 @@ TEST(VCConverterCsc, AbsentLibraryClearsTheFlagForGood) {
     log.clear();
     pair.out->format = VC_FORMAT_NV21;
     EXPECT_EQ(VC_ERROR_UNSUPPORTED, csc_run(pair.in, pair.out));
+    EXPECT_EQ(VC_ERROR_UNSUPPORTED, csc_run(pair.out, pair.in));
     EXPECT_TRUE(log.lines().empty());
 }
 

@@ -70,6 +70,9 @@ TEST(VcImage, Families) {
     VCYuvLayout yuv;
     EXPECT_FALSE(VCImage_rgbLayout(VC_FORMAT_NV21, &rgb));
     EXPECT_FALSE(VCImage_yuvLayout(nullptr, &yuv));
+    VCImage* rgba = VCImage_createEmpty(2, 2, VC_FORMAT_RGBA);
+    EXPECT_FALSE(VCImage_yuvLayout(rgba, &yuv));
+    VCImage_destroy(rgba);
 }
 
 TEST(VcImage, CreateAndWrapStates) {
@@ -122,6 +125,8 @@ TEST(VcImage, AllocateWrapDeallocate) {
 
     VCImage* image = VCImage_createEmpty(3, 3, VC_FORMAT_NV21);
     EXPECT_EQ(nullptr, image->data);
+    EXPECT_EQ(0, image->wrapped);
+    EXPECT_EQ(0u, image->size);
     EXPECT_EQ(14, VCImage_allocate(image));
     EXPECT_EQ(14u, image->size);
     unsigned char* owned = image->data;
