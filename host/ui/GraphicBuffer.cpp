@@ -316,19 +316,25 @@ bool GraphicBuffer::isCompactRgba_l() const {
     return mFourcc == VC_FORMAT_RGBA && stride == width;
 }
 
-const unsigned char* GraphicBuffer::rgbaForUpload_l(std::unique_ptr<unsigned char[]>& converted) {
+unsigned char* GraphicBuffer::rgbaScratch_l() {
+    // Kept for the buffer's life: a buffer is usually transferred many times,
+    // and fresh memory of this size costs a page fault per page.
+    if (mRgbaScratch == nullptr) mRgbaScratch = scratch((size_t)width * height * 4);
+    return mRgbaScratch.get();
+}
+
+const unsigned char* GraphicBuffer::rgbaForUpload_l() {
     // A compact RGBA copy is already what the texture takes.
     if (isCompactRgba_l()) return mData;
-    converted = scratch((size_t)width * height * 4);
-    if (converted == nullptr || !toRgba_l(converted.get())) return nullptr;
-    return converted.get();
+    unsigned char* rgba = rgbaScratch_l();
+    if (rgba == nullptr || !toRgba_l(rgba)) return nullptr;
+    return rgba;
 }
 
 bool GraphicBuffer::ensureMirror_l() {
     if (mMirrorTexture != 0) return true;
     if (!HostGl::get().acquire()) return false;
-    std::unique_ptr<unsigned char[]> converted;
-    const unsigned char* rgba = rgbaForUpload_l(converted);
+    const unsigned char* rgba = rgbaForUpload_l();
     if (rgba == nullptr) {
         HostGl::get().release();
         return false;
@@ -364,8 +370,7 @@ bool GraphicBuffer::ensureMirror_l() {
 }
 
 bool GraphicBuffer::upload_l() {
-    std::unique_ptr<unsigned char[]> converted;
-    const unsigned char* rgba = rgbaForUpload_l(converted);
+    const unsigned char* rgba = rgbaForUpload_l();
     if (rgba == nullptr) return false;
     GLuint texture = mMirrorTexture;
     bool ok = HostGl::get().run([&] {
@@ -382,13 +387,8 @@ bool GraphicBuffer::upload_l() {
 
 bool GraphicBuffer::readback_l() {
     // A compact RGBA copy is read straight into; other layouts convert after.
-    std::unique_ptr<unsigned char[]> pixels;
-    unsigned char* rgba = mData;
-    if (!isCompactRgba_l()) {
-        pixels = scratch((size_t)width * height * 4);
-        if (pixels == nullptr) return false;
-        rgba = pixels.get();
-    }
+    unsigned char* rgba = isCompactRgba_l() ? mData : rgbaScratch_l();
+    if (rgba == nullptr) return false;
     GLuint texture = mMirrorTexture;
     bool ok = HostGl::get().run([&] {
         HostGl& gl = HostGl::get();

@@ -129,9 +129,11 @@ private:
     bool readback_l();
     bool toRgba_l(unsigned char* rgba) const;
     bool isCompactRgba_l() const;
-    // The pixels to upload: the CPU copy itself, or RGBA converted into
-    // `converted`; null on failure.
-    const unsigned char* rgbaForUpload_l(std::unique_ptr<unsigned char[]>& converted);
+    // width x height RGBA staging memory (kept), or null.
+    unsigned char* rgbaScratch_l();
+    // The pixels to upload: the CPU copy itself, or RGBA converted into the
+    // staging memory; null on failure.
+    const unsigned char* rgbaForUpload_l();
     bool fromRgba_l(const unsigned char* rgba);
 
     static void incRef(android_native_base_t* base);
@@ -151,6 +153,8 @@ private:
     // The CPU copy as the last readback left it, while that lock is held: an
     // unlock that finds it unchanged has nothing to send back up.
     std::vector<unsigned char> mReadbackCopy;
+    // RGBA staging between a CPU copy of another layout and the mirror.
+    std::unique_ptr<unsigned char[]> mRgbaScratch;
     std::atomic<uint32_t> mUploadCount;
     std::atomic<uint32_t> mReadbackCount;
 };
