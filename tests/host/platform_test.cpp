@@ -179,6 +179,9 @@ TEST_F(PlatformTest, LockCompactsPaddedRowsWrapsOrLeavesEmpty) {
         image = Platform::lockGraphicBuffer(buffer, modes[i], 0);
         ASSERT_NE(image, nullptr);
         EXPECT_EQ(image->data, wants[i]);
+        if (i == 0) {
+            EXPECT_EQ(image->wrapped, 1);
+        }
         VCImage_destroy(image);
         buffer->unlock();
     }
