@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 #include <string.h>
 
-#include <memory>
 #include <random>
 #include <vector>
 
@@ -31,6 +30,8 @@ std::vector<int> vectorLevels() {
     return out;
 }
 
+using Bytes = std::vector<uint8_t>;
+
 int clampTo8(int v) {
     return v < 0 ? 0 : (v > 255 ? 255 : v);
 }
@@ -40,12 +41,6 @@ void doubleRgb(int y, int u, int v, int out[3]) {
     out[1] = clampTo8(static_cast<int>(y - 0.34414 * (u - 128) - 0.71414 * (v - 128)));
     out[2] = clampTo8(static_cast<int>(y + 1.772 * (u - 128)));
 }
-
-struct Buffer {
-    explicit Buffer(size_t n) : bytes(new uint8_t[n]), size(n) {}
-    std::unique_ptr<uint8_t[]> bytes;
-    size_t size;
-};
 
 }  // namespace
 
@@ -78,44 +73,44 @@ TEST(VCConvertFast, YuvToRgbKernelsEqualDoubleForAllTriples) {
     // pixels, which between them carry all 256 luma values.
     const int w = 4096, h = 4096;
     const size_t luma = static_cast<size_t>(w) * h;
-    Buffer yuv(luma * 3 / 2);
+    Bytes yuv(luma * 3 / 2);
     for (int cy = 0; cy < h / 2; ++cy) {
         for (int cx = 0; cx < w / 2; ++cx) {
             const uint32_t k = static_cast<uint32_t>(cy) * (w / 2) + cx;
             const uint32_t uv = k / 64;
             const int base = static_cast<int>(k % 64) * 4;
-            uint8_t* y0 = yuv.bytes.get() + static_cast<size_t>(2 * cy) * w + 2 * cx;
+            uint8_t* y0 = yuv.data() + static_cast<size_t>(2 * cy) * w + 2 * cx;
             y0[0] = static_cast<uint8_t>(base);
             y0[1] = static_cast<uint8_t>(base + 1);
             y0[w] = static_cast<uint8_t>(base + 2);
             y0[w + 1] = static_cast<uint8_t>(base + 3);
-            uint8_t* c = yuv.bytes.get() + luma + static_cast<size_t>(cy) * w + 2 * cx;
+            uint8_t* c = yuv.data() + luma + static_cast<size_t>(cy) * w + 2 * cx;
             c[0] = static_cast<uint8_t>(uv & 0xff);
             c[1] = static_cast<uint8_t>(uv >> 8);
         }
     }
-    Buffer rgba(luma * 4);
+    Bytes rgba(luma * 4);
     for (uint32_t format : {VC_FORMAT_NV12, VC_FORMAT_NV21}) {
         VCImage* src =
-            VCImage_createWrap(yuv.bytes.get(), w, h, format, static_cast<int>(yuv.size), 0);
-        VCImage* dst = VCImage_createWrap(rgba.bytes.get(), w, h, VC_FORMAT_RGBA,
-                                          static_cast<int>(rgba.size), 0);
+            VCImage_createWrap(yuv.data(), w, h, format, static_cast<int>(yuv.size()), 0);
+        VCImage* dst =
+            VCImage_createWrap(rgba.data(), w, h, VC_FORMAT_RGBA, static_cast<int>(rgba.size()), 0);
         for (int level : vectorLevels()) {
             ASSERT_EQ(level, VCConvert_setLevel(level));
-            memset(rgba.bytes.get(), 0, rgba.size);
+            memset(rgba.data(), 0, rgba.size());
             // Straight into the vector path: a fallback to the reference
             // loops must not pass for it.
             ASSERT_TRUE(VCConvert_fast(src, dst));
             long mismatches = 0;
             for (int y = 0; y < h; ++y) {
-                const uint8_t* c = yuv.bytes.get() + luma + static_cast<size_t>(y / 2) * w;
+                const uint8_t* c = yuv.data() + luma + static_cast<size_t>(y / 2) * w;
                 for (int x = 0; x < w; ++x) {
                     const int first = c[x & ~1], second = c[(x & ~1) + 1];
                     const int u = format == VC_FORMAT_NV12 ? first : second;
                     const int v = format == VC_FORMAT_NV12 ? second : first;
                     int want[3];
-                    doubleRgb(yuv.bytes[static_cast<size_t>(y) * w + x], u, v, want);
-                    const uint8_t* px = rgba.bytes.get() + (static_cast<size_t>(y) * w + x) * 4;
+                    doubleRgb(yuv[static_cast<size_t>(y) * w + x], u, v, want);
+                    const uint8_t* px = rgba.data() + (static_cast<size_t>(y) * w + x) * 4;
                     if (px[0] != want[0] || px[1] != want[1] || px[2] != want[2] || px[3] != 255)
                         ++mismatches;
                 }
@@ -131,8 +126,8 @@ TEST(VCConvertFast, RgbToYuvKernelsEqualTheEquationsForAllTriples) {
     Quiet quiet;
     const int w = 4096, h = 4096;
     const size_t luma = static_cast<size_t>(w) * h;
-    Buffer rgba(luma * 4);
-    Buffer nv12(luma * 3 / 2);
+    Bytes rgba(luma * 4);
+    Bytes nv12(luma * 3 / 2);
     for (int level : vectorLevels()) {
         ASSERT_EQ(level, VCConvert_setLevel(level));
         // Four passes move every colour through the chroma-giving corner of
@@ -142,27 +137,27 @@ TEST(VCConvertFast, RgbToYuvKernelsEqualTheEquationsForAllTriples) {
                 for (int x = 0; x < w; ++x) {
                     const uint32_t t =
                         static_cast<uint32_t>(y ^ (pass >> 1)) * w + (x ^ (pass & 1));
-                    uint8_t* px = rgba.bytes.get() + (static_cast<size_t>(y) * w + x) * 4;
+                    uint8_t* px = rgba.data() + (static_cast<size_t>(y) * w + x) * 4;
                     px[0] = static_cast<uint8_t>(t);
                     px[1] = static_cast<uint8_t>(t >> 8);
                     px[2] = static_cast<uint8_t>(t >> 16);
                     px[3] = static_cast<uint8_t>(pass);
                 }
             }
-            VCImage* src = VCImage_createWrap(rgba.bytes.get(), w, h, VC_FORMAT_RGBA,
-                                              static_cast<int>(rgba.size), 0);
-            VCImage* dst = VCImage_createWrap(nv12.bytes.get(), w, h, VC_FORMAT_NV12,
-                                              static_cast<int>(nv12.size), 0);
+            VCImage* src = VCImage_createWrap(rgba.data(), w, h, VC_FORMAT_RGBA,
+                                              static_cast<int>(rgba.size()), 0);
+            VCImage* dst = VCImage_createWrap(nv12.data(), w, h, VC_FORMAT_NV12,
+                                              static_cast<int>(nv12.size()), 0);
             ASSERT_TRUE(VCConvert_fast(src, dst));
             long mismatches = 0;
             for (int y = 0; y < h; ++y) {
                 for (int x = 0; x < w; ++x) {
-                    const uint8_t* px = rgba.bytes.get() + (static_cast<size_t>(y) * w + x) * 4;
+                    const uint8_t* px = rgba.data() + (static_cast<size_t>(y) * w + x) * 4;
                     const int r = px[0], g = px[1], b = px[2];
                     const int yy = clampTo8((19595 * r + 38470 * g + 7471 * b) >> 16);
-                    if (nv12.bytes[static_cast<size_t>(y) * w + x] != yy) ++mismatches;
+                    if (nv12[static_cast<size_t>(y) * w + x] != yy) ++mismatches;
                     if (x % 2 != 0 || y % 2 != 0) continue;
-                    const uint8_t* c = nv12.bytes.get() + luma + static_cast<size_t>(y / 2) * w + x;
+                    const uint8_t* c = nv12.data() + luma + static_cast<size_t>(y / 2) * w + x;
                     if (c[0] != clampTo8(((36962 * (b - yy)) >> 16) + 128)) ++mismatches;
                     if (c[1] != clampTo8(((46727 * (r - yy)) >> 16) + 128)) ++mismatches;
                 }
@@ -192,18 +187,16 @@ void compareLevels(uint32_t sf, uint32_t df, Size s, uint32_t srcOffset, uint32_
     const size_t srcBytes = bytesFor(sf, srcOffset);
     const size_t dstBytes = bytesFor(df, dstOffset);
     std::mt19937 rng(seed);
-    Buffer src(srcBytes);
-    for (size_t i = 0; i < srcBytes; ++i) src.bytes[i] = static_cast<uint8_t>(rng());
+    Bytes src(srcBytes);
+    for (size_t i = 0; i < srcBytes; ++i) src[i] = static_cast<uint8_t>(rng());
     // dstShift moves the destination off the allocator's alignment.
-    Buffer ref(dstBytes + dstShift), fast(dstBytes + dstShift);
-    memset(ref.bytes.get(), 0x5C, dstBytes + dstShift);
-    memset(fast.bytes.get(), 0x5C, dstBytes + dstShift);
+    Bytes ref(dstBytes + dstShift), fast(dstBytes + dstShift);
 
     VCImage* in =
-        VCImage_createWrap(src.bytes.get(), s.w, s.h, sf, static_cast<int>(srcBytes), srcOffset);
-    VCImage* outRef = VCImage_createWrap(ref.bytes.get() + dstShift, s.w, s.h, df,
+        VCImage_createWrap(src.data(), s.w, s.h, sf, static_cast<int>(srcBytes), srcOffset);
+    VCImage* outRef = VCImage_createWrap(ref.data() + dstShift, s.w, s.h, df,
                                          static_cast<int>(dstBytes), dstOffset);
-    VCImage* outFast = VCImage_createWrap(fast.bytes.get() + dstShift, s.w, s.h, df,
+    VCImage* outFast = VCImage_createWrap(fast.data() + dstShift, s.w, s.h, df,
                                           static_cast<int>(dstBytes), dstOffset);
     VCConvert_setLevel(kVCConvertScalar);
     ASSERT_EQ(VC_OK, VCImage_convert(in, outRef));
@@ -214,7 +207,7 @@ void compareLevels(uint32_t sf, uint32_t df, Size s, uint32_t srcOffset, uint32_
                              std::to_string(s.w) + "x" + std::to_string(s.h) + " offsets " +
                              std::to_string(srcOffset) + "/" + std::to_string(dstOffset) +
                              " level " + std::to_string(level);
-    EXPECT_EQ(0, memcmp(ref.bytes.get(), fast.bytes.get(), dstBytes + dstShift)) << what;
+    EXPECT_EQ(0, memcmp(ref.data(), fast.data(), dstBytes + dstShift)) << what;
     VCImage_destroy(in);
     VCImage_destroy(outRef);
     VCImage_destroy(outFast);
