@@ -10,7 +10,6 @@
 
 #include "support/log_capture.h"
 #include "vc_error_lines.h"
-#include "vc_csc.h"
 #include "vc_image_convert_fast.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
