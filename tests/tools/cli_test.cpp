@@ -17,6 +17,7 @@
 #include <android/log.h>
 
 #include "effects.h"
+#include "support/log_capture.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 
@@ -33,13 +34,10 @@ std::string readAll(const std::string& path) {
     return std::string(std::istreambuf_iterator<char>(f), {});
 }
 
-void quietLog(int, const char*, ...) {}
-
 class Cli : public ::testing::Test {
 protected:
     void SetUp() override {
         // The suite asks the factory about every id itself; keep its own log short.
-        VF_LogMsg = quietLog;
         __android_log_set_minimum_priority(ANDROID_LOG_WARN);
         char tmpl[] = "/tmp/kivcli_test_XXXXXX";
         ASSERT_NE(nullptr, mkdtemp(tmpl));
@@ -89,6 +87,7 @@ protected:
     }
 
     std::string mDir;
+    LogCapture mQuiet;
 };
 
 TEST_F(Cli, UsageErrorsExitTwoWithAMessage) {

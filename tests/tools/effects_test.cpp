@@ -4,20 +4,18 @@
 
 #include "core/KivImaging.h"
 #include "effects.h"
+#include "support/log_capture.h"
 #include "vccore/vc_log.h"
 
 namespace {
 
 using namespace kivcli;
 
-void quietLog(int, const char*, ...) {}
-
+// Asking the factory about every id logs a great deal; keep the output short.
 class Effects : public ::testing::Test {
 protected:
-    void SetUp() override {
-        VF_LogMsg = quietLog;
-        __android_log_set_minimum_priority(ANDROID_LOG_WARN);
-    }
+    void SetUp() override { __android_log_set_minimum_priority(ANDROID_LOG_WARN); }
+    LogCapture mQuiet;
 };
 
 TEST_F(Effects, ListMatchesTheFactory) {
