@@ -6,6 +6,8 @@
 #if defined(__x86_64__)
 bool VCConvert_sse2(const VCImage* source, VCImage* destination);
 bool VCConvert_avx2(const VCImage* source, VCImage* destination);
+#elif defined(__aarch64__)
+bool VCConvert_neon(const VCImage* source, VCImage* destination);
 #endif
 
 namespace {
@@ -15,9 +17,11 @@ int detectLevel() {
     __builtin_cpu_init();
     if (__builtin_cpu_supports("avx2")) return kVCConvertAvx2;
     return kVCConvertSse2;
+#elif defined(__aarch64__)
+    // NEON is part of the arm64 baseline.
+    return kVCConvertNeon;
 #else
-    // No vector paths yet on other architectures (NEON included): the
-    // reference loops run there.
+    // No vector paths on other architectures: the reference loops run there.
     return kVCConvertScalar;
 #endif
 }
@@ -55,6 +59,9 @@ bool VCConvert_fast(const VCImage* source, VCImage* destination) {
             return VCConvert_avx2(source, destination);
         case kVCConvertSse2:
             return VCConvert_sse2(source, destination);
+#elif defined(__aarch64__)
+        case kVCConvertNeon:
+            return VCConvert_neon(source, destination);
 #endif
         default:
             return false;

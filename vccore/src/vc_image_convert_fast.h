@@ -70,8 +70,9 @@ static inline void VCConvert_yuvToRgbFixed(int y, int u, int v, uint8_t* r, uint
     *b = VCConvert_clamp(y + bOff);
 }
 
-// Vector levels of the fast paths.
-enum { kVCConvertScalar = 0, kVCConvertSse2 = 1, kVCConvertAvx2 = 2 };
+// Vector levels of the fast paths. Levels count per architecture: NEON is
+// the first (and only) vector level on arm64.
+enum { kVCConvertScalar = 0, kVCConvertSse2 = 1, kVCConvertAvx2 = 2, kVCConvertNeon = 1 };
 
 // Best level this machine supports.
 int VCConvert_cpuLevel(void);
