@@ -9,8 +9,8 @@
 //
 // Usage (a single STRING option named "parameter"):
 //
-//   // Sepia.h
-//   class Sepia : public KivFilterWithOptions<Sepia, SingleEffect> {
+//   // Grain.h
+//   class Grain : public KivFilterWithOptions<Grain, SingleCameraEffects> {
 //   public:
 //       static KivFilterOptionTable& optionTable();
 //       using KivFilter::setOption;  // keep the other overloads visible
@@ -21,8 +21,8 @@
 //       }
 //   };
 //
-//   // Sepia.cpp
-//   KivFilterOptionTable& Sepia::optionTable() {
+//   // Grain.cpp
+//   KivFilterOptionTable& Grain::optionTable() {
 //       static VCOption_t records[] = {KivOption_string("parameter")};
 //       static KivFilterOptionTable table(records);
 //       return table;

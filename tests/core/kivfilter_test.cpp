@@ -162,6 +162,7 @@ TEST(KivFilter, WorkImageLifecycle) {
     ASSERT_EQ(KivImaging_setInputImage(f, pixels.data(), 4, 4, 0x12345678, 0), 0);
     EXPECT_EQ(KivImaging_init(f), VC_ERROR_ALLOC_FAILED);
     EXPECT_EQ(errorLines(log, "VC_ERROR_ALLOC_FAILED (-5): core/KivFilter:"), 1u);
+    EXPECT_EQ(effect->workImage(), nullptr);  // the old buffer is gone, not left dangling
     ASSERT_EQ(KivImaging_setOutputImage(f, pixels.data(), 4, 4, 0x12345678, 0), 0);
     ASSERT_EQ(KivImaging_init(f), VC_ERROR_ALLOC_FAILED);
 
