@@ -201,29 +201,7 @@ TEST_F(HostWindowSurfaceTest, SwapQueuesTheRenderedFrameTopRowFirst) {
     ASSERT_TRUE(seam.makeCurrent(display, &surface, mGl->env()->getEGLContext()));
     GlTest_fillHalves(w, h);  // GL's lower half red: the bottom rows of the frame
     EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_TRUE));
-    glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
-    glClear(GL_COLOR_BUFFER_BIT);
-    EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_TRUE));
-
-    for (uint64_t expected = 1; expected <= 2; expected++) {
-        sp<GraphicBuffer> frame;
-        uint64_t number = 0;
-        void* address = nullptr;
-        ASSERT_EQ(window->acquireFrame(&frame, &number, nullptr), android::NO_ERROR);
-        EXPECT_EQ(number, expected);
-        ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
-        for (int y = 0; y < h; ++y) {
-            const uint8_t* p = static_cast<uint8_t*>(address) + (size_t)y * frame->getStride() * 4;
-            // Frame 1: top rows blue, bottom rows red; frame 2: green.
-            const uint8_t want[3] = {uint8_t(expected == 1 && y >= h / 2 ? 255 : 0),
-                                     uint8_t(expected == 2 ? 255 : 0),
-                                     uint8_t(expected == 1 && y < h / 2 ? 255 : 0)};
-            EXPECT_EQ(std::vector<uint8_t>(p, p + 3), std::vector<uint8_t>(want, want + 3))
-                << "frame " << expected << " row " << y;
-        }
-        frame->unlock();
-        window->releaseFrame(frame);
-    }
+    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, w, h));
 
     ASSERT_TRUE(eglMakeCurrent(display, previousDraw, previousDraw, mGl->env()->getEGLContext()));
     EXPECT_EQ(seam.destroySurface(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
