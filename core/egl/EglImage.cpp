@@ -145,9 +145,9 @@ int EglImage::initialize2D_l() {
             glDeleteFramebuffers(1, &mFrameBuffer);
             mTexture = 0;
             mFrameBuffer = 0;
-            // A GL call that failed on the way has its own line; an
-            // incomplete framebuffer is reported here.
-            return VC_REPORT(VC_ERROR_INVALID_STATE);
+            // A failed call is a GL error like any other; only a framebuffer
+            // that GL calls incomplete is a state error.
+            return VC_REPORT(ok ? VC_ERROR_INVALID_STATE : VC_ERROR_UNKNOWN);
         }
     }
     mInitialized = true;
@@ -358,10 +358,10 @@ int EglImage::setImageData(const VCImage& image, int sampleType) {
         return writeGraphicBuffer(image);
     }
     if (image.data == nullptr) return VC_REPORT(VC_ERROR_NULL_PARAM);
-    // The upload reads width x height RGBA pixels from the image.
-    if (image.format != VC_FORMAT_RGBA) {
-        EglLog(VF_LOG_ERROR, "Incompatible image : %dx%d '%4.4s' --> %dx%d '%4.4s'", image.width,
-               image.height, (const char*)&image.format, mWidth, mHeight, "RGBA");
+    // GL takes width x height RGBA bytes whatever the record's format says; a
+    // record holding fewer would be read past its end.
+    if (image.width > 0 && image.height > 0 &&
+        (uint64_t)VCImage_size(&image) < (uint64_t)image.width * (uint64_t)image.height * 4) {
         return VC_REPORT(VC_ERROR_INVALID_PARAM);
     }
     bool ok = GL_CHECK(glBindTexture(GL_TEXTURE_2D, mTexture)) &&
@@ -466,15 +466,13 @@ VCImage* EglImage::getImageData() {
             VC_REPORT(VC_ERROR_ALLOC_FAILED);
             return nullptr;
         }
-        // The caller's framebuffer stays bound afterwards.
-        GLint previous = 0;
-        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &previous);
         bool ok = GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, mFrameBuffer)) &&
                   GL_CHECK(glReadPixels(0, 0, mWidth, mHeight, GL_RGBA, GL_UNSIGNED_BYTE,
                                         (GLvoid*)(wrap->data)));
-        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)previous));
+        unbindFrameBuffer();
         if (!ok) {
             VCImage_destroy(wrap);
+            VC_REPORT(VC_ERROR_UNKNOWN);
             return nullptr;
         }
         return wrap;
@@ -486,10 +484,9 @@ VCImage* EglImage::getImageData() {
     }
     // Unlocked before returning, so writes to the image never reach the GPU:
     // a read lock spares the buffer from watching for them.
-    VCImage* image =
-        Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_COMPACT,
-                                    Platform::kImplementationDefinedFormat,
-                                    GraphicBuffer::USAGE_SW_READ_OFTEN);
+    VCImage* image = Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_COMPACT,
+                                                 Platform::kImplementationDefinedFormat,
+                                                 GraphicBuffer::USAGE_SW_READ_OFTEN);
     if (image == nullptr) {
         EglLog(VF_LOG_ERROR, "EGL: Failed to lock the graphic buffer");
         return nullptr;
@@ -511,15 +508,13 @@ int EglImage::flushCache() {
         return VC_ERROR_INVALID_STATE;
     }
     if (mType == IMAGE_FRAMEBUFFER || mType == IMAGE_EXTERNAL_FRAMEBUFFER) {
-        // Callers flush right before drawing into this framebuffer, so the
-        // binding they made is given back rather than reset to 0.
-        GLint previous = 0;
-        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &previous);
+        // Ends with the default framebuffer bound: a caller that draws into
+        // this one afterwards binds it again.
         GLubyte texel[4];
         bool ok = GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, mFrameBuffer)) &&
                   GL_CHECK(glReadPixels(0, 0, 1, 1, GL_RGBA, GL_UNSIGNED_BYTE, &texel));
-        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)previous));
-        if (!ok) return VC_ERROR_UNKNOWN;
+        unbindFrameBuffer();
+        if (!ok) return VC_REPORT(VC_ERROR_UNKNOWN);
     }
     if (mType == IMAGE_EXTERNAL || mType == IMAGE_EXTERNAL_FRAMEBUFFER) {
         if (mGraphicBuffer == nullptr) {

@@ -29,7 +29,14 @@ public:
 
     virtual EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config,
                                            ANativeWindow* window, const EGLint* attribs) = 0;
-    virtual EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) = 0;
+    // Make `context` current on *surface for drawing and reading, and post a
+    // window surface's frame. A window surface follows its window's size as on
+    // a device: a frame takes the window's size when it starts (at the first
+    // make-current after creation or after a swap). A host does that by
+    // replacing its off-screen surface, so *surface may change; any surface
+    // (pbuffers too) may be passed.
+    virtual EGLBoolean makeCurrent(EGLDisplay display, EGLSurface* surface, EGLContext context) = 0;
+    virtual EGLBoolean swapBuffers(EGLDisplay display, EGLSurface* surface) = 0;
     virtual EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) = 0;
 
     // An EGL image over the buffer's pixels, usable as an external texture or

@@ -20,8 +20,12 @@ public:
         return eglCreateWindowSurface(display, config, window, attribs);
     }
 
-    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) override {
-        return eglSwapBuffers(display, surface);
+    EGLBoolean makeCurrent(EGLDisplay display, EGLSurface* surface, EGLContext context) override {
+        return eglMakeCurrent(display, *surface, *surface, context);
+    }
+
+    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface* surface) override {
+        return eglSwapBuffers(display, *surface);
     }
 
     EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) override {

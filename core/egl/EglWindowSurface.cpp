@@ -51,6 +51,11 @@ int EglWindowSurface::getHeight() {
     return mHeight;
 }
 
+// Window surfaces, and the calls that may replace one (a host follows the
+// window's size with a new off-screen surface), go through the seam. The
+// lambdas standing in for them carry the EGL calls' names, so that a checked
+// statement logs as the EGL call it stands for.
+
 int EglWindowSurface::initialize_l() {
     if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
     bool isWindow = mSurfaceType != SURFACE_PBUFFER;
@@ -74,10 +79,11 @@ int EglWindowSurface::initialize_l() {
         // clang-format on
         if (!created) return VC_REPORT(VC_ERROR_UNKNOWN);
     } else {
-        // Through the seam: a device makes a real window surface, a host an
-        // off-screen one whose swaps feed the window.
-        if (!EGL_CHECK(mEglSurface = EglNativeSeam::get().createWindowSurface(display, config,
-                                                                              window, NULL))) {
+        auto eglCreateWindowSurface = [](EGLDisplay dpy, EGLConfig cfg, ANativeWindow* win,
+                                         const EGLint* attribs) {
+            return EglNativeSeam::get().createWindowSurface(dpy, cfg, win, attribs);
+        };
+        if (!EGL_CHECK(mEglSurface = eglCreateWindowSurface(display, config, window, NULL))) {
             return VC_REPORT(VC_ERROR_UNKNOWN);
         }
     }
@@ -91,9 +97,15 @@ int EglWindowSurface::initialize_l() {
 
 int EglWindowSurface::bindSurface() {
     if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    EGLDisplay display = mEglEnv->getEGLDisplay();
+    EGLContext context = mEglEnv->getEGLContext();
+    // The seam makes `draw` the read surface too, and may replace it.
+    auto eglMakeCurrent = [](EGLDisplay dpy, EGLSurface& draw, EGLSurface /*read*/,
+                             EGLContext ctx) {
+        return EglNativeSeam::get().makeCurrent(dpy, &draw, ctx);
+    };
     EGLBoolean result;
-    if (!EGL_CHECK_BOOL(result = eglMakeCurrent(mEglEnv->getEGLDisplay(), mEglSurface, mEglSurface,
-                                                mEglEnv->getEGLContext()))) {
+    if (!EGL_CHECK_BOOL(result = eglMakeCurrent(display, mEglSurface, mEglSurface, context))) {
         return VC_REPORT(VC_ERROR_UNKNOWN);
     }
     return 0;
@@ -101,9 +113,10 @@ int EglWindowSurface::bindSurface() {
 
 int EglWindowSurface::unbindSurface() {
     if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    EGLDisplay display = mEglEnv->getEGLDisplay();
     EGLBoolean result;
-    if (!EGL_CHECK_BOOL(result = eglMakeCurrent(mEglEnv->getEGLDisplay(), EGL_NO_SURFACE,
-                                                EGL_NO_SURFACE, EGL_NO_CONTEXT))) {
+    if (!EGL_CHECK_BOOL(
+            result = eglMakeCurrent(display, EGL_NO_SURFACE, EGL_NO_SURFACE, EGL_NO_CONTEXT))) {
         return VC_REPORT(VC_ERROR_UNKNOWN);
     }
     return 0;
@@ -111,29 +124,23 @@ int EglWindowSurface::unbindSurface() {
 
 int EglWindowSurface::swapSurface() {
     if (mEglEnv == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
-    EGLBoolean result;
-    if (mSurfaceType == SURFACE_PBUFFER) {
-        result = EGL_CHECK_BOOL(eglSwapBuffers(mEglEnv->getEGLDisplay(), mEglSurface));
-    } else {
-        result =
-            EGL_CHECK_BOOL(EglNativeSeam::get().swapBuffers(mEglEnv->getEGLDisplay(), mEglSurface));
-    }
-    if (result != EGL_TRUE) return VC_REPORT(VC_ERROR_UNKNOWN);
+    EGLDisplay display = mEglEnv->getEGLDisplay();
+    auto eglSwapBuffers = [](EGLDisplay dpy, EGLSurface& surface) {
+        return EglNativeSeam::get().swapBuffers(dpy, &surface);
+    };
+    if (!EGL_CHECK_BOOL(eglSwapBuffers(display, mEglSurface))) return VC_REPORT(VC_ERROR_UNKNOWN);
     return 0;
 }
 
 void EglWindowSurface::release_l() {
     if (mEglSurface != EGL_NO_SURFACE && mEglEnv != nullptr) {
+        auto eglDestroySurface = [](EGLDisplay dpy, EGLSurface surface) {
+            return EglNativeSeam::get().destroySurface(dpy, surface);
+        };
         EGLBoolean result;
-        bool ok;
-        if (mSurfaceType == SURFACE_PBUFFER) {
-            ok = EGL_CHECK_BOOL(result = eglDestroySurface(mEglEnv->getEGLDisplay(), mEglSurface));
-        } else {
-            EglNativeSeam& seam = EglNativeSeam::get();
-            ok =
-                EGL_CHECK_BOOL(result = seam.destroySurface(mEglEnv->getEGLDisplay(), mEglSurface));
+        if (!EGL_CHECK_BOOL(result = eglDestroySurface(mEglEnv->getEGLDisplay(), mEglSurface))) {
+            EglLog(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed.");
         }
-        if (!ok) EglLog(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed.");
     }
     // Forgotten even when the destroy failed: the handle is no longer usable.
     mEglSurface = EGL_NO_SURFACE;

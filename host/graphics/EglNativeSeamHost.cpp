@@ -2,6 +2,15 @@
 // a window surface is an off-screen pbuffer of the window's size whose swap
 // copies the frame into a buffer of the window and queues it, and a native
 // buffer's image is made from the buffer's GPU mirror texture.
+//
+// A device's window surface renders each frame into a buffer dequeued at the
+// frame's start, so its size follows the window from one frame to the next.
+// A pbuffer cannot change size: when the window's size differs at a frame's
+// start (a swap, or the first make-current after creation or a swap) the
+// pbuffer is replaced by one of the new size and the caller's handle updated.
+// A frame already under way when the window changes keeps its size and is
+// fitted (cut or padded) into the new buffer; a device would queue it at the
+// old size.
 #include <map>
 #include <mutex>
 #include <vector>
@@ -19,6 +28,16 @@ namespace {
 using android::GraphicBuffer;
 using android::sp;
 
+bool windowSize(ANativeWindow* window, int* width, int* height) {
+    return window->query(window, NATIVE_WINDOW_WIDTH, width) == 0 &&
+           window->query(window, NATIVE_WINDOW_HEIGHT, height) == 0 && *width > 0 && *height > 0;
+}
+
+EGLSurface createPbuffer(EGLDisplay display, EGLConfig config, int width, int height) {
+    const EGLint attribs[] = {EGL_WIDTH, width, EGL_HEIGHT, height, EGL_NONE};
+    return eglCreatePbufferSurface(display, config, attribs);
+}
+
 class HostEglNativeSeam : public EglNativeSeam {
 public:
     void prepareDisplay() override { android::HostGl::prepareDisplay(); }
@@ -28,8 +47,7 @@ public:
         if (window == nullptr) return EGL_NO_SURFACE;
         int width = 0;
         int height = 0;
-        if (window->query(window, NATIVE_WINDOW_WIDTH, &width) != 0 ||
-            window->query(window, NATIVE_WINDOW_HEIGHT, &height) != 0 || width < 1 || height < 1) {
+        if (!windowSize(window, &width, &height)) {
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: window without a size");
             return EGL_NO_SURFACE;
         }
@@ -37,27 +55,43 @@ public:
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: window already connected");
             return EGL_NO_SURFACE;
         }
-        const EGLint attribs[] = {EGL_WIDTH, width, EGL_HEIGHT, height, EGL_NONE};
-        EGLSurface surface = eglCreatePbufferSurface(display, config, attribs);
+        EGLSurface surface = createPbuffer(display, config, width, height);
         if (surface == EGL_NO_SURFACE) {
             native_window_api_disconnect(window, NATIVE_WINDOW_API_EGL);
             return EGL_NO_SURFACE;
         }
         std::lock_guard<std::mutex> guard(mLock);
-        mWindows[surface] = {window, width, height};
+        mWindows[surface] = {window, config, width, height, false};
         return surface;
     }
 
-    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface surface) override {
+    EGLBoolean makeCurrent(EGLDisplay display, EGLSurface* surface, EGLContext context) override {
+        bool frameStart = false;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(*surface);
+            frameStart = found != mWindows.end() && !found->second.frameStarted;
+        }
+        if (frameStart) followWindow(display, surface);
+        EGLBoolean result = eglMakeCurrent(display, *surface, *surface, context);
+        if (result == EGL_TRUE && frameStart) {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(*surface);
+            if (found != mWindows.end()) found->second.frameStarted = true;
+        }
+        return result;
+    }
+
+    EGLBoolean swapBuffers(EGLDisplay display, EGLSurface* surface) override {
         WindowSurface target;
         {
             std::lock_guard<std::mutex> guard(mLock);
-            auto found = mWindows.find(surface);
-            if (found == mWindows.end()) return eglSwapBuffers(display, surface);
+            auto found = mWindows.find(*surface);
+            if (found == mWindows.end()) return eglSwapBuffers(display, *surface);
             target = found->second;
         }
         // The frame is read from the surface, so it has to be the current one.
-        if (eglGetCurrentSurface(EGL_DRAW) != surface) {
+        if (eglGetCurrentSurface(EGL_DRAW) != *surface) {
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: swap of a surface that is not current");
             return EGL_FALSE;
         }
@@ -85,7 +119,15 @@ public:
             window->cancelBuffer(window, native, -1);
             return EGL_FALSE;
         }
-        return window->queueBuffer(window, native, -1) == 0 ? EGL_TRUE : EGL_FALSE;
+        if (window->queueBuffer(window, native, -1) != 0) return EGL_FALSE;
+        // The next frame starts here, drawn without another make-current.
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(*surface);
+            if (found != mWindows.end()) found->second.frameStarted = false;
+        }
+        followWindow(display, surface);
+        return EGL_TRUE;
     }
 
     EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) override {
@@ -131,9 +173,46 @@ public:
 private:
     struct WindowSurface {
         sp<ANativeWindow> window;
+        EGLConfig config = nullptr;
         int width = 0;
         int height = 0;
+        bool frameStarted = false;  // made current since creation or the last swap
     };
+
+    // When the window's size differs from the surface's, replaces *surface by a
+    // pbuffer of the window's size; a context drawing into the old one on this
+    // thread moves to it. Otherwise, or when that fails (logged, the EGL error
+    // taken), *surface stays as it is.
+    void followWindow(EGLDisplay display, EGLSurface* surface) {
+        WindowSurface entry;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            auto found = mWindows.find(*surface);
+            if (found == mWindows.end()) return;
+            entry = found->second;
+        }
+        int width = 0;
+        int height = 0;
+        if (!windowSize(entry.window.get(), &width, &height)) return;
+        if (width == entry.width && height == entry.height) return;
+        EGLSurface resized = createPbuffer(display, entry.config, width, height);
+        bool current = eglGetCurrentSurface(EGL_DRAW) == *surface;
+        if (resized == EGL_NO_SURFACE ||
+            (current && !eglMakeCurrent(display, resized, resized, eglGetCurrentContext()))) {
+            VF_LogMsg(VF_LOG_ERROR,
+                      "EglNativeSeam: cannot resize a %dx%d window surface to %dx%d (0x%04x)",
+                      entry.width, entry.height, width, height, eglGetError());
+            if (resized != EGL_NO_SURFACE) eglDestroySurface(display, resized);
+            return;
+        }
+        eglDestroySurface(display, *surface);
+        entry.width = width;
+        entry.height = height;
+        std::lock_guard<std::mutex> guard(mLock);
+        mWindows.erase(*surface);
+        mWindows[resized] = entry;
+        *surface = resized;
+    }
 
     std::mutex mLock;
     std::map<EGLSurface, WindowSurface> mWindows;

@@ -145,7 +145,34 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
     ASSERT_EQ(surface->initialize(), 0);
     gl.release();  // terminates the display under the second surface
 
+    // Each failing call logs its statement as written, then the status line.
     LogCapture log;
+    EXPECT_EQ(surface->bindSurface(), -1);
+    EXPECT_EQ(surface->swapSurface(), -1);
+    sp<HostWindow> window = new HostWindow(8, 4);
+    sp<EglWindowSurface> onWindow =
+        new EglWindowSurface(env, window, EglWindowSurface::SURFACE_RECORDING);
+    EXPECT_EQ(onWindow->initialize(), -1);
+    const char* statements[] = {
+        "result = eglMakeCurrent(display, mEglSurface, mEglSurface, context)",
+        "eglSwapBuffers(display, mEglSurface)",
+        "mEglSurface = eglCreateWindowSurface(display, config, window, NULL)"};
+    std::vector<std::string> failed = log.texts();
+    ASSERT_EQ(failed.size(), 6u);
+    for (size_t i = 0; i < 3; ++i) {
+        // The code depends on the call (a gone display or an uninitialised one).
+        const std::string& line = failed[2 * i];
+        EXPECT_EQ(line.rfind("EGL Error: 0x300", 0), 0u) << line;
+        EXPECT_NE(line.find(std::string("' - ") + statements[i] + " at core/egl/EglWindowSurface:"),
+                  std::string::npos)
+            << line;
+        EXPECT_EQ(failed[2 * i + 1].rfind("VC_ERROR_UNKNOWN (-1): core/egl/EglWindowSurface:", 0),
+                  0u);
+    }
+    EXPECT_EQ(window->getConnectedApi(), 0);  // the failed surface let the window go
+    onWindow->release();
+
+    log.clear();
     surface->release();
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed."));
     bool sawCheckLine = false;

@@ -1,7 +1,7 @@
 // EglImage on real Mesa: the four kinds, their failures, what they leave
 // behind, the GraphicBuffer writes (copy, conversion, YUV resize), and an NV21
-// picture drawn by the default external shader against an independent
-// full-range NV21 -> RGBA computation.
+// picture drawn by the default external shader against the image core's
+// NV21 -> RGBA conversion.
 #include "core/egl/EglImage.h"
 
 #include <gtest/gtest.h>
@@ -15,6 +15,7 @@
 #include "core/egl/EglProgram.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
+#include "vccore/vc_convert.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"
 
@@ -55,10 +56,6 @@ int liveObjects() {
         live += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name);
     }
     return live;
-}
-
-int clamp255(int v) {
-    return v < 0 ? 0 : v > 255 ? 255 : v;
 }
 
 // The first n bytes of a read-back record, which is then destroyed.
@@ -111,26 +108,40 @@ TEST_F(EglImageTest, TextureAndFramebufferKinds) {
     glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D,
                            texture->getTextureID(), 0);
     EXPECT_EQ(GlTest_readPixels(w, h), pixels);
-    glBindFramebuffer(GL_FRAMEBUFFER, 0);
-    glDeleteFramebuffers(1, &probe);
-    // A non-RGBA record cannot be uploaded as width x height RGBA.
+    // A record is uploaded as width x height RGBA bytes whatever its format
+    // (no swizzle for BGRA), unless it holds fewer bytes than that.
+    Pixels bytes(w * h * 4);
+    for (size_t i = 0; i < bytes.size(); ++i) bytes[i] = (uint8_t)(i * 7 + 3);
+    VCImage* bgra = VCImage_createWrap(bytes.data(), w, h, VC_FORMAT_BGRA, 0, 0);
+    ASSERT_EQ(texture->setImageData(*bgra, GL_CLAMP_TO_EDGE), 0);
+    VCImage_destroy(bgra);
     VCImage* nv21 = VCImage_createNew(w, h, VC_FORMAT_NV21);
     EXPECT_EQ(texture->setImageData(*nv21, GL_CLAMP_TO_EDGE), VC_ERROR_INVALID_PARAM);
     VCImage_destroy(nv21);
+    glBindFramebuffer(GL_FRAMEBUFFER, probe);
+    EXPECT_EQ(GlTest_readPixels(w, h), bytes);
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    glDeleteFramebuffers(1, &probe);
 
     sp<EglImage> target = new EglImage(EglImage::IMAGE_FRAMEBUFFER, w, h);
     ASSERT_EQ(target->initialize(), 0);
     ASSERT_EQ(target->bindFrameBuffer(), 0);
     renderQuadrants(w, h);
-    ASSERT_EQ(target->unbindFrameBuffer(), 0);
+    // Flushing and reading back leave the default framebuffer bound, also
+    // when the image's own was bound before.
     EXPECT_EQ(target->flushCache(), 0);
+    GLint bound = -1;
+    glGetIntegerv(GL_FRAMEBUFFER_BINDING, &bound);
+    EXPECT_EQ(bound, 0);
+    ASSERT_EQ(target->bindFrameBuffer(), 0);
     VCImage* read = target->getImageData();
+    glGetIntegerv(GL_FRAMEBUFFER_BINDING, &bound);
+    EXPECT_EQ(bound, 0);
     ASSERT_NE(read, nullptr);
     EXPECT_EQ(read->format, VC_FORMAT_RGBA);
     EXPECT_EQ(take(read, w * h * 4), expectedQuadrants(w, h));
     // The frame buffer's texture can be sampled.
     EXPECT_EQ(target->bindTexture(), 0);
-    GLint bound = 0;
     glGetIntegerv(GL_TEXTURE_BINDING_2D, &bound);
     EXPECT_EQ((GLuint)bound, target->getTextureID());
     EXPECT_EQ(target->unbindTexture(), 0);
@@ -190,6 +201,22 @@ TEST_F(EglImageTest, BadSizesAndFormatsFailAndLeaveNothing) {
     EXPECT_EQ(image->getFrameBufferID(), 0u);
     EXPECT_FALSE(image->isInitialized());
     EXPECT_NE(image->bindFrameBuffer(), 0);
+    // A GL call that fails on the way is a GL error (-1), not a state error,
+    // and leaves nothing behind either.
+    sp<EglImage> negative = new EglImage(EglImage::IMAGE_FRAMEBUFFER, -1, 4);
+    log.clear();
+    EXPECT_EQ(negative->initialize(), VC_ERROR_UNKNOWN);
+    std::vector<std::string> lines = log.texts();
+    ASSERT_EQ(lines.size(), 2u);
+    EXPECT_EQ(lines[0].rfind("GL Error: 0x0501 'GL_INVALID_VALUE' - glTexImage2D(GL_TEXTURE_2D, 0, "
+                             "GL_RGBA, mWidth, mHeight, 0, GL_RGBA, GL_UNSIGNED_BYTE, NULL) at "
+                             "core/egl/EglImage:",
+                             0),
+              0u)
+        << lines[0];
+    EXPECT_EQ(lines[1].rfind("VC_ERROR_UNKNOWN (-1): core/egl/EglImage:", 0), 0u) << lines[1];
+    EXPECT_EQ(negative->getTextureID(), 0u);
+    EXPECT_EQ(negative->getFrameBufferID(), 0u);
 
     // The two log lines differ in spelling on purpose.
     sp<EglImage> rgb = external(EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_RGB8);
@@ -201,6 +228,12 @@ TEST_F(EglImageTest, BadSizesAndFormatsFailAndLeaveNothing) {
     EXPECT_EQ(yuyv->getGraphicBuffer(), nullptr);
     sp<EglImage> noEnv = new EglImage(EglImage::IMAGE_EXTERNAL, 8, 8);
     EXPECT_NE(noEnv->initialize(), 0);
+    // 4:2:0 needs even sizes: the buffer itself cannot be allocated.
+    sp<EglImage> odd = external(EglImage::IMAGE_EXTERNAL, 7, 5, VC_FORMAT_NV21);
+    EXPECT_EQ(odd->initialize(), VC_ERROR_ALLOC_FAILED);
+    EXPECT_TRUE(
+        log.contains(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: Invalid argument."));
+    EXPECT_EQ(odd->getGraphicBuffer(), nullptr);
     EXPECT_EQ(liveObjects(), 0);
 }
 
@@ -330,14 +363,11 @@ TEST_F(EglImageTest, Nv21DrawnThroughTheDefaultShaderMatchesTheCpuConversion) {
     sp<EglProgram> program = new EglProgram();
     program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
     ASSERT_EQ(program->initialize(10, false), 0);
-    ASSERT_EQ(target->bindFrameBuffer(), 0);
     program->setCameraGeometry(w, h, 0, 0);
     program->setPreviewGeometry(w, h, false);
-    // As the buffered processor does: flush with the target bound, then draw.
+    // The flush leaves the default framebuffer bound, so the target is bound after it.
     ASSERT_EQ(target->flushCache(), 0);
-    GLint bound = 0;
-    glGetIntegerv(GL_FRAMEBUFFER_BINDING, &bound);
-    ASSERT_EQ((GLuint)bound, target->getFrameBufferID());
+    ASSERT_EQ(target->bindFrameBuffer(), 0);
     ASSERT_EQ(program->onDrawFrame(), 0);
     glFinish();
     target->unbindFrameBuffer();
@@ -345,25 +375,22 @@ TEST_F(EglImageTest, Nv21DrawnThroughTheDefaultShaderMatchesTheCpuConversion) {
 
     VCImage* result = target->getImageData();
     ASSERT_NE(result, nullptr);
+    // What the GPU shows must be the image core's own NV21 -> RGBA; 1 allows
+    // for the shader's float output rounding (llvmpipe: exact).
+    VCImage* expected = VCImage_createNew(w, h, VC_FORMAT_RGBA);
+    ASSERT_EQ(VCImage_convert(picture, expected), 0);
     int worst = 0;
-    for (int y = 0; y < h; ++y) {
-        for (int x = 0; x < w; ++x) {
-            // Full-range NV21 -> RGB, truncated then clamped.
-            const uint8_t* vu = picture->data + w * h + (y / 2) * w + (x / 2) * 2;
-            int luma = picture->data[y * w + x];
-            double v = vu[0] - 128.0, u = vu[1] - 128.0;
-            const int rgb[3] = {clamp255((int)(luma + 1.402 * v)),
-                                clamp255((int)(luma - 0.34414 * u - 0.71414 * v)),
-                                clamp255((int)(luma + 1.772 * u))};
-            const uint8_t* p = result->data + (y * w + x) * 4;
-            for (int c = 0; c < 3; ++c) {
-                worst = std::max(worst, abs(p[c] - rgb[c]));
-                ASSERT_NEAR(p[c], rgb[c], 1) << "pixel " << x << "," << y << " channel " << c;
-            }
-            ASSERT_EQ(p[3], 255);
+    for (int i = 0; i < w * h; ++i) {
+        const uint8_t* p = result->data + i * 4;
+        const uint8_t* want = expected->data + i * 4;
+        for (int c = 0; c < 3; ++c) {
+            worst = std::max(worst, abs(p[c] - want[c]));
+            ASSERT_NEAR(p[c], want[c], 1) << "pixel " << i % w << "," << i / w << " channel " << c;
         }
+        ASSERT_EQ(p[3], 255);
     }
     RecordProperty("worst_difference", worst);
+    VCImage_destroy(expected);
     VCImage_destroy(result);
     VCImage_destroy(picture);
     program->release();

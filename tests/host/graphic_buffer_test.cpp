@@ -12,6 +12,8 @@
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 #include "support/gl_context.h"
+#include "vccore/vc_convert.h"
+#include "vccore/vc_image.h"
 
 using android::GraphicBuffer;
 using android::sp;
@@ -22,10 +24,6 @@ const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
 const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
 const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
 const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
-
-int clamp255(double v) {
-    return v < 0 ? 0 : v > 255 ? 255 : (int)v;
-}
 
 // Locks and returns the CPU pixels (null on failure, which fails the test).
 uint8_t* lock(const sp<GraphicBuffer>& buffer, uint32_t usage) {
@@ -171,19 +169,13 @@ TEST_F(GraphicBufferSyncTest, Nv21WritesReachTheGpuAsFullRangeRgba) {
 
     view.bind();
     std::vector<uint8_t> gpu = GlTest_readPixels(w, h);
-    for (int yy = 0; yy < h; ++yy) {
-        for (int x = 0; x < w; ++x) {
-            // Full-range YUV -> RGB, truncated then clamped.
-            const uint8_t* vu = nv21 + w * h + (yy / 2) * w + (x / 2) * 2;
-            double luma = nv21[yy * w + x], u = vu[1] - 128.0, v = vu[0] - 128.0;
-            int rgb[3] = {clamp255((int)(luma + 1.402 * v)),
-                          clamp255((int)(luma - 0.34414 * u - 0.71414 * v)),
-                          clamp255((int)(luma + 1.772 * u))};
-            const uint8_t* p = &gpu[(yy * w + x) * 4];
-            for (int c = 0; c < 3; ++c) EXPECT_NEAR(p[c], rgb[c], 1) << x << "," << yy << " c" << c;
-            EXPECT_EQ(p[3], 255);
-        }
-    }
+    // The mirror holds exactly the image core's NV21 -> RGBA of the pixels.
+    VCImage* source = VCImage_createWrap(nv21, w, h, VC_FORMAT_NV21, 0, 0);
+    VCImage* expected = VCImage_createNew(w, h, VC_FORMAT_RGBA);
+    ASSERT_EQ(VCImage_convert(source, expected), 0);
+    EXPECT_EQ(gpu, std::vector<uint8_t>(expected->data, expected->data + w * h * 4));
+    VCImage_destroy(expected);
+    VCImage_destroy(source);
     // The CPU copy is the original, not the (lossy) RGBA mirror.
     EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);

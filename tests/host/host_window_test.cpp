@@ -1,5 +1,6 @@
 // The host window (slots, FIFO, dropping, perform/query) and the host EGL
-// window surface whose swap queues the rendered frame into it.
+// window surface whose swap queues the rendered frame into it, following the
+// window's size from frame to frame.
 #include <gui/HostWindow.h>
 
 #include <android/native_window.h>
@@ -9,6 +10,7 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
+#include "core/egl/EglWindowSurface.h"
 #include "support/gl_context.h"
 
 using android::GraphicBuffer;
@@ -109,6 +111,74 @@ TEST(HostWindowTest, PerformChangesGeometryCountUsageAndConnection) {
 
 class HostWindowSurfaceTest : public GlContextTest {};
 
+// The next queued frame is w x h and holds GlTest_fillHalves(w, h) top row
+// first: the upper half blue, the lower half red, every pixel opaque.
+void expectHalvesFrame(const sp<HostWindow>& window, int w, int h) {
+    sp<GraphicBuffer> frame;
+    ASSERT_EQ(window->acquireFrame(&frame, nullptr, nullptr), android::NO_ERROR);
+    ASSERT_EQ(frame->getWidth(), (uint32_t)w);
+    ASSERT_EQ(frame->getHeight(), (uint32_t)h);
+    void* address = nullptr;
+    ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
+    for (int y = 0; y < h; ++y) {
+        const uint8_t* row = static_cast<uint8_t*>(address) + (size_t)y * frame->getStride() * 4;
+        const std::vector<uint8_t> want = {uint8_t(y >= h / 2 ? 255 : 0), 0,
+                                           uint8_t(y < h / 2 ? 255 : 0), 255};
+        for (int x = 0; x < w; ++x) {
+            ASSERT_EQ(std::vector<uint8_t>(row + x * 4, row + x * 4 + 4), want)
+                << w << "x" << h << " frame, pixel " << x << "," << y;
+        }
+    }
+    frame->unlock();
+    window->releaseFrame(frame);
+}
+
+TEST_F(HostWindowSurfaceTest, FramesFollowTheWindowSizeAfterAResize) {
+    sp<HostWindow> window = new HostWindow(8, 4);
+    sp<EglWindowSurface> surface =
+        new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
+    ASSERT_EQ(surface->initialize(), 0);
+    EGLDisplay display = mGl->env()->getEGLDisplay();
+    auto surfaceWidth = [&]() {
+        EGLint width = 0;
+        eglQuerySurface(display, surface->getEGLSurface(), EGL_WIDTH, &width);
+        return width;
+    };
+    ASSERT_EQ(surface->bindSurface(), 0);
+    GlTest_fillHalves(8, 4);
+    ASSERT_EQ(surface->swapSurface(), 0);
+    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, 8, 4));
+
+    // Resized between frames: the next frame is drawn and queued at the new size.
+    surface->setSize(12, 6);
+    ASSERT_EQ(surface->bindSurface(), 0);
+    EXPECT_EQ(surfaceWidth(), 12);
+    EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), surface->getEGLSurface());
+    GlTest_fillHalves(12, 6);
+    ASSERT_EQ(surface->swapSurface(), 0);
+    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, 12, 6));
+
+    // Resized during a frame: that frame goes into a buffer of the new size,
+    // and the swap makes the surface follow, so the next frame needs no bind.
+    ASSERT_EQ(surface->bindSurface(), 0);
+    GlTest_fillHalves(12, 6);
+    surface->setSize(6, 4);
+    ASSERT_EQ(surface->swapSurface(), 0);
+    sp<GraphicBuffer> fitted;
+    ASSERT_EQ(window->acquireFrame(&fitted, nullptr, nullptr), android::NO_ERROR);
+    EXPECT_EQ(fitted->getWidth(), 6u);
+    window->releaseFrame(fitted);
+    EXPECT_EQ(surfaceWidth(), 6);
+    EXPECT_EQ(eglGetCurrentSurface(EGL_DRAW), surface->getEGLSurface());
+    GlTest_fillHalves(6, 4);
+    ASSERT_EQ(surface->swapSurface(), 0);
+    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, 6, 4));
+
+    ASSERT_EQ(mGl->surface()->bindSurface(), 0);
+    surface->release();
+    EXPECT_EQ(window->getConnectedApi(), 0);
+}
+
 TEST_F(HostWindowSurfaceTest, SwapQueuesTheRenderedFrameTopRowFirst) {
     const int w = 12;
     const int h = 8;
@@ -124,36 +194,14 @@ TEST_F(HostWindowSurfaceTest, SwapQueuesTheRenderedFrameTopRowFirst) {
     EXPECT_EQ(width, w);
 
     // Swapping a surface that is not current fails and queues nothing.
-    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_FALSE));
+    EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_FALSE));
     EXPECT_EQ(window->queuedTotal(), 0u);
 
     EGLSurface previousDraw = eglGetCurrentSurface(EGL_DRAW);
-    ASSERT_TRUE(eglMakeCurrent(display, surface, surface, mGl->env()->getEGLContext()));
+    ASSERT_TRUE(seam.makeCurrent(display, &surface, mGl->env()->getEGLContext()));
     GlTest_fillHalves(w, h);  // GL's lower half red: the bottom rows of the frame
-    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
-    glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
-    glClear(GL_COLOR_BUFFER_BIT);
-    EXPECT_EQ(seam.swapBuffers(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
-
-    for (uint64_t expected = 1; expected <= 2; expected++) {
-        sp<GraphicBuffer> frame;
-        uint64_t number = 0;
-        void* address = nullptr;
-        ASSERT_EQ(window->acquireFrame(&frame, &number, nullptr), android::NO_ERROR);
-        EXPECT_EQ(number, expected);
-        ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address), android::NO_ERROR);
-        for (int y = 0; y < h; ++y) {
-            const uint8_t* p = static_cast<uint8_t*>(address) + (size_t)y * frame->getStride() * 4;
-            // Frame 1: top rows blue, bottom rows red; frame 2: green.
-            const uint8_t want[3] = {uint8_t(expected == 1 && y >= h / 2 ? 255 : 0),
-                                     uint8_t(expected == 2 ? 255 : 0),
-                                     uint8_t(expected == 1 && y < h / 2 ? 255 : 0)};
-            EXPECT_EQ(std::vector<uint8_t>(p, p + 3), std::vector<uint8_t>(want, want + 3))
-                << "frame " << expected << " row " << y;
-        }
-        frame->unlock();
-        window->releaseFrame(frame);
-    }
+    EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_TRUE));
+    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, w, h));
 
     ASSERT_TRUE(eglMakeCurrent(display, previousDraw, previousDraw, mGl->env()->getEGLContext()));
     EXPECT_EQ(seam.destroySurface(display, surface), static_cast<EGLBoolean>(EGL_TRUE));

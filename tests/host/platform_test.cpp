@@ -176,16 +176,15 @@ TEST_F(PlatformTest, LockCompactsPaddedRowsWrapsOrLeavesEmpty) {
     VCImage_destroy(image);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);  // left locked for the caller
 
-    // Wrapped in place; any other mode leaves the record empty.
-    const uint8_t* wants[2] = {memory, nullptr};
-    const int modes[2] = {Platform::LOCK_WRAP, 7};
-    for (int i = 0; i < 2; i++) {
+    // Both wrapping modes wrap in place, padded rows and all; any other mode
+    // leaves the record empty.
+    const uint8_t* wants[3] = {memory, memory, nullptr};
+    const int modes[3] = {Platform::LOCK_WRAP, Platform::LOCK_WRAP_2, 7};
+    for (int i = 0; i < 3; i++) {
         image = Platform::lockGraphicBuffer(buffer, modes[i], 0);
         ASSERT_NE(image, nullptr);
-        EXPECT_EQ(image->data, wants[i]);
-        if (i == 0) {
-            EXPECT_EQ(image->wrapped, 1);
-        }
+        EXPECT_EQ(image->data, wants[i]) << "mode " << modes[i];
+        EXPECT_EQ(image->wrapped, i < 2 ? 1 : 0) << "mode " << modes[i];
         VCImage_destroy(image);
         buffer->unlock();
     }

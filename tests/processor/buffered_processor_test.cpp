@@ -1,7 +1,7 @@
 // The buffered processor end to end on llvmpipe: every fixed look through the
 // RGBA, BGRA and NV21 paths compared with the CPU statement of its math, the
-// effect fallbacks, status codes, log lines, and GL objects and memory over
-// many calls.
+// effect fallbacks, status codes, log lines (also of driver failures injected
+// into the real GL), and GL objects and memory over many calls.
 #include <gtest/gtest.h>
 
 #include <EGL/egl.h>
@@ -15,6 +15,8 @@
 #include "core/KivFilter.h"
 #include "core/VFilterBufferedProcessor.h"
 #include "core/VFilterBufferedProcessorImpl.h"
+#include "core/egl/Platform.h"
+#include "support/gl_fault.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
 #include "vccore/vc_convert.h"
@@ -123,7 +125,12 @@ TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
     EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
     EXPECT_EQ((std::vector<std::string>{"2000", "400"}), attempts());
     EXPECT_EQ(400, p.getEffect()->getFilterType());
+    // A built-in library name tries its own id (not a downloadable filter);
+    // 501 has no effect here, so 400 follows.
+    log.clear();
     EXPECT_EQ(0, p.setEffect("com.morvane.android.provider.filterprovider,libfilm.so"));
+    EXPECT_EQ((std::vector<std::string>{"501", "400"}), attempts());
+    EXPECT_EQ(400, p.getEffect()->getFilterType());
     EXPECT_EQ(0, p.setEffect(static_cast<const char*>(nullptr)));
     ASSERT_NE(nullptr, p.getEffect());
     EXPECT_EQ(400, p.getEffect()->getFilterType());
@@ -216,6 +223,10 @@ TEST_F(BufferedProcessorTest, OddNv21SizesArePaddedToEven) {
     for (int i = 0; i < pw * ph; ++i) ASSERT_EQ(255, out[i * 4 + 3]) << i;
     // Neutral chroma: a pixel's grey is its luma (full range) in the first rows.
     for (int x = 0; x < w; ++x) EXPECT_NEAR(input[x], out[x * 4 + 1], 2) << x;
+    // No board property: an unknown platform, whose only native input is RGBA.
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
+                             "Input format 'NV21' is not a native format for EglImage: "
+                             "Conversion required to NV21"));
     EXPECT_TRUE(log.contains(1,
                              "int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned "
                              "char*, int, int, unsigned char*)"));
@@ -254,6 +265,61 @@ TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
     EXPECT_EQ(1u, log.count("EGL: Synchronously waiting for rendering..."));
     // No 8K switch off msm8974.
     for (const std::string& l : log.texts()) EXPECT_EQ(std::string::npos, l.find("8K_TEXTURES"));
+}
+
+TEST_F(BufferedProcessorTest, Nv21GoesThroughNv12WhereThePlatformPrefersIt) {
+    setenv("KIV_PROP_ro_board_platform", "tavrix3", 1);
+    Platform::resetForTesting();
+    const int w = 32, h = 24;
+    Nv21Picture nv21 = makeNv21(w, h);
+    std::vector<uint8_t> out(w * h * 4, 0x5A);
+    ASSERT_EQ(0, mProcessor->setEffect(401));
+    LogCapture log;
+    int result = mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data());
+    unsetenv("KIV_PROP_ro_board_platform");
+    Platform::resetForTesting();
+    ASSERT_EQ(0, result);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
+                             "Input format 'NV21' is not a native format for EglImage: "
+                             "Conversion required to NV12"));
+    lookref::expectLook(401, lookref::Picture(w, h, nv21.rgba), out.data(), "NV21 as NV12");
+}
+
+TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
+    const int w = 8, h = 6;
+    std::vector<uint8_t> in(w * h * 4, 60), out(w * h * 4, 0xC3);
+    Nv21Picture nv21 = makeNv21(w, h);
+    ASSERT_EQ(0, mProcessor->setEffect(403));
+    auto lines = [](const LogCapture& log, const std::string& prefix) {
+        size_t n = 0;
+        for (const std::string& l : log.texts()) n += l.rfind(prefix, 0) == 0 ? 1 : 0;
+        return n;
+    };
+    // The picture cannot be read back: drawn, logged, output untouched, 0.
+    LogCapture log;
+    GlFault_failPictureReads(2);
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_BGRA));
+    EXPECT_EQ(0, mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data()));
+    GlFault_failPictureReads(0);
+    EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
+    EXPECT_EQ(2u, log.count("EGL: Synchronously waiting for rendering..."));
+    EXPECT_EQ(2u, log.count("EGL: Can't access this FBO's pixels"));
+    EXPECT_EQ(2u, lines(log, "VC_ERROR_UNKNOWN (-1): core/VFilterBufferedProcessorImpl:"));
+
+    // No program can be made: -7 before anything is drawn.
+    log.clear();
+    GlFault_failProgramCreations(1);
+    EXPECT_EQ(-7, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
+    GlFault_failProgramCreations(0);
+    EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
+    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Program could not be loaded."));
+    // bindGLEnvironment's line and the caller's.
+    EXPECT_EQ(2u, lines(log, "VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
+    EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
+
+    // Both were passing: the next call draws the negative look.
+    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(255 - 60, out[0]);
 }
 
 TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {

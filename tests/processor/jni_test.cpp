@@ -16,6 +16,7 @@
 #include <android/bitmap.h>
 
 #include "core/VFilterBufferedProcessorImpl.h"
+#include "support/gl_fault.h"
 #include "support/jvm.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
@@ -242,6 +243,49 @@ TEST_F(JniProcessorTest, ProcessBitmapOddCasesLogAndReturnNull) {
     EXPECT_EQ("java.lang.RuntimeException: native_process_bitmap failed",
               KivTestJvm_takeException(mEnv));
     EXPECT_EQ(0, intCall(bitmap, "getLockCount"));
+}
+
+TEST_F(JniProcessorTest, FailuresInsideTheDrawAndOfTheInputBitmap) {
+    // A picture that cannot be read back is no Java failure: the array comes
+    // back (with what the scratch buffer held) and only the log tells.
+    {
+        LogCapture log;
+        GlFault_failPictureReads(1);
+        jintArray result = mProcessor->processBuffer(mEnv, mEnv->NewIntArray(16), 4, 4);
+        GlFault_failPictureReads(0);
+        EXPECT_EQ("", KivTestJvm_takeException(mEnv));
+        ASSERT_NE(nullptr, result);
+        EXPECT_EQ(16, mEnv->GetArrayLength(result));
+        EXPECT_TRUE(log.contains(4, "EGL: Can't access this FBO's pixels"));
+    }
+    // A recycled bitmap has no pixels to lock: logged, null, no exception.
+    {
+        jobject bitmap = newBitmap(4, 4, "ARGB_8888");
+        ASSERT_NE(nullptr, bitmap);
+        jclass bitmapClass = mEnv->GetObjectClass(bitmap);
+        mEnv->SetObjectField(
+            bitmap, mEnv->GetFieldID(bitmapClass, "mBuffer", "Ljava/nio/ByteBuffer;"), nullptr);
+        LogCapture log;
+        EXPECT_EQ(nullptr, mProcessor->processBitmap(mEnv, bitmap));
+        EXPECT_EQ("", KivTestJvm_takeException(mEnv));
+        EXPECT_TRUE(log.contains(4, "AndroidBitmap_lockPixels(jinputbitmap) failed!"));
+        EXPECT_EQ(0, intCall(bitmap, "getLockCount"));
+    }
+    // A draw that fails (no context: -7) throws for a file and for a JPEG buffer.
+    const std::string in = mDir + "/in.jpg";
+    std::vector<uint8_t> rgba = lookref::makeTestPicture(16, 8, true);
+    VCImage* src = VCImage_createWrap(rgba.data(), 16, 8, VC_FORMAT_RGBA, 0, 0);
+    ASSERT_EQ(0, VCImage_saveToFile(src, in.c_str(), 90));
+    VCImage_destroy(src);
+    VFilterBufferedProcessorImpl uninitialised;
+    uninitialised.processFile(mEnv, mEnv->NewStringUTF(in.c_str()),
+                              mEnv->NewStringUTF((mDir + "/out.jpg").c_str()));
+    EXPECT_EQ("java.lang.RuntimeException: native_process_file failed",
+              KivTestJvm_takeException(mEnv));
+    std::vector<uint8_t> jpeg = fileBytes(in);
+    jobject buffer = mEnv->NewDirectByteBuffer(jpeg.data(), static_cast<jlong>(jpeg.size()));
+    EXPECT_EQ(nullptr, uninitialised.processImage(mEnv, buffer, static_cast<int>(jpeg.size())));
+    EXPECT_EQ("java.lang.RuntimeException: process_file failed", KivTestJvm_takeException(mEnv));
 }
 
 TEST_F(JniProcessorTest, ProcessFileWritesAQuality98Jpeg) {

@@ -1,0 +1,50 @@
+#include "support/gl_fault.h"
+
+#include <dlfcn.h>
+
+#include <atomic>
+
+#include <GLES2/gl2.h>
+
+namespace {
+
+std::atomic<int> gProgramFaults{0};
+std::atomic<int> gReadFaults{0};
+
+// Takes one armed fault, if any is left.
+bool takeFault(std::atomic<int>& faults) {
+    int left = faults.load();
+    while (left > 0) {
+        if (faults.compare_exchange_weak(left, left - 1)) return true;
+    }
+    return false;
+}
+
+template <typename T>
+T driver(const char* name) {
+    return reinterpret_cast<T>(dlsym(RTLD_NEXT, name));
+}
+
+}  // namespace
+
+void GlFault_failProgramCreations(int count) {
+    gProgramFaults = count;
+}
+
+void GlFault_failPictureReads(int count) {
+    gReadFaults = count;
+}
+
+extern "C" GLuint glCreateProgram() {
+    static const auto next = driver<GLuint (*)()>("glCreateProgram");
+    if (takeFault(gProgramFaults)) return 0;
+    return next();
+}
+
+extern "C" void glReadPixels(GLint x, GLint y, GLsizei width, GLsizei height, GLenum format,
+                             GLenum type, void* pixels) {
+    static const auto next =
+        driver<void (*)(GLint, GLint, GLsizei, GLsizei, GLenum, GLenum, void*)>("glReadPixels");
+    if ((long)width * height > 1 && takeFault(gReadFaults)) width = -1;
+    next(x, y, width, height, format, type, pixels);
+}
