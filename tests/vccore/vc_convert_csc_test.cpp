@@ -162,3 +162,23 @@ TEST(VCConverterCsc, IncompleteLibraries) {
     EXPECT_EQ(0x12 ^ 0x0F, pair.dst[0]);
     EXPECT_EQ(0x34 ^ 0x0F, pair.dst[32]);
 }
+
+TEST(VCConverterCsc, LibcscEntryChoice) {
+    const std::string mode = standinCase();
+    if (mode != "both" && mode != "bare") GTEST_SKIP() << "needs a libcsc stand-in alone";
+    HardwarePair pair;
+    LogCapture log;
+    ASSERT_EQ(VC_OK, VCImage_convert(pair.in, pair.out));
+    EXPECT_EQ(1, countErrors(log, "VC_ERROR_NOT_IMPLEMENTED", -42, "vccore/src/vc_csc"));
+    if (mode == "both") {
+        // The NEON entry wins over the plain one.
+        EXPECT_TRUE(log.contains(VF_LOG_DEBUG, kExternalOk));
+        EXPECT_EQ(0x12 ^ 0x0F, pair.dst[0]);
+        EXPECT_EQ(0x34 ^ 0x0F, pair.dst[32]);
+    } else {
+        // A library without either entry is as good as none: the CPU converts.
+        EXPECT_FALSE(log.contains(kExternalOk));
+        EXPECT_EQ(1, countErrors(log, "VC_ERROR_UNSUPPORTED", -6, "vccore/src/vc_csc"));
+        EXPECT_EQ((38470 * 0x34 + 7471 * 0x12) >> 16, pair.dst[0]);
+    }
+}

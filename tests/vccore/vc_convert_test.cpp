@@ -123,14 +123,19 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     EXPECT_TRUE(countErrors(log, "VC_ERROR_UNSUPPORTED", -6, "vccore/src/vc_image"));
     VCImage_destroy(jpeg);
 
-    // Odd width of a YUV target; odd height only matters for 4:2:0.
+    // Parity is tested on each image's own geometry: odd width of a YUV
+    // target, odd height only for 4:2:0. An even target that then takes an
+    // odd geometry is the next test's matter.
     uint8_t wide[3 * 2 * 4] = {};
     VCImage* odd = VCImage_createWrap(wide, 3, 2, VC_FORMAT_RGBA, sizeof(wide), 0);
-    VCImage* target = VCImage_createNew(4, 4, VC_FORMAT_NV21);
+    VCImage* target = VCImage_createNew(3, 2, VC_FORMAT_NV21);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_convert(odd, target));
-    EXPECT_EQ(4, target->width);
+    EXPECT_EQ(nullptr, VCImage_copyAndConvert(odd, VC_FORMAT_YUYV));
+    target->width = 2;
+    target->height = 3;
     VCImage* tall = VCImage_createWrap(wide, 2, 3, VC_FORMAT_RGBA, sizeof(wide), 0);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_convert(tall, target));
+    EXPECT_EQ(2, target->width);
     VCImage* yuyv = VCImage_createNew(2, 3, VC_FORMAT_YUYV);
     EXPECT_EQ(VC_OK, VCImage_convert(tall, yuyv));
     VCImage* grey = VCImage_createNew(3, 2, VC_FORMAT_GREY);
@@ -160,6 +165,46 @@ TEST(VCImageConvert, ChecksRunInOrderWithTheirLogLines) {
     for (VCImage* i :
          {rgba, nv21, odd, target, tall, yuyv, grey, oddYuyv, out, tight, square, smallHeader})
         VCImage_destroy(i);
+}
+
+// An existing even image takes an odd geometry (3x2 "RGBA" into a 4x4 "NV21"
+// is no error): luma as usual, chroma for whole 2x2 (4:2:0) or 2x1 (4:2:2)
+// blocks only, and nothing past the bytes the new geometry needs. Run at the
+// machine's own level: no vector path may get such a target.
+TEST(VCImageConvert, OddGeometryIntoAnEvenImageStaysInsideIt) {
+    const int sizes[][2] = {{3, 2}, {3, 3}, {2, 3}, {5, 1}, {1, 1}};
+    for (uint32_t tf : {VC_FORMAT_NV12, VC_FORMAT_NV21, VC_FORMAT_YV12, VC_FORMAT_YUVP,
+                        VC_FORMAT_YUYV, VC_FORMAT_YVYU}) {
+        const bool is420 = VCImage_isYUV420(tf) != 0;
+        for (const auto& wh : sizes) {
+            const int w = wh[0], h = wh[1];
+            std::vector<uint8_t> px = randomBytes(static_cast<size_t>(w) * h * 4, w * 10 + h);
+            VCImage* src = VCImage_createWrap(px.data(), w, h, VC_FORMAT_RGBA, 0, 0);
+            const uint32_t need = VCImage_requiredSize(w, h, tf);
+            std::vector<uint8_t> out(need + 16, 0xEE);
+            VCImage* dst = VCImage_createWrap(out.data(), 4, 4, tf, static_cast<int>(need), 0);
+            const std::string what = std::string(reinterpret_cast<const char*>(&tf), 4) + " " +
+                                     std::to_string(w) + "x" + std::to_string(h);
+            ASSERT_EQ(VC_OK, VCImage_convert(src, dst)) << what;
+            EXPECT_EQ(w, dst->width);
+            EXPECT_EQ(h, dst->height);
+            EXPECT_EQ(Bytes(16, 0xEE), Bytes(out.begin() + need, out.end())) << what;
+            for (int y = 0; y < h; ++y) {
+                for (int x = 0; x < w; ++x) {
+                    const uint8_t* p = px.data() + (y * w + x) * 4;
+                    const int yy = (19595 * p[0] + 38470 * p[1] + 7471 * p[2]) >> 16;
+                    Yuv got = sampleAt(out, tf, w, h, x, y, static_cast<size_t>(w) * h);
+                    ASSERT_EQ(yy, got.y) << what << " at " << x << "," << y;
+                    // Whole 4:2:0 blocks, read at their top-left pixel.
+                    if (!is420 || x % 2 != 0 || y % 2 != 0 || x + 1 >= w || y + 1 >= h) continue;
+                    EXPECT_EQ(clampTo8(((36962 * (p[2] - yy)) >> 16) + 128), got.u) << what;
+                    EXPECT_EQ(clampTo8(((46727 * (p[0] - yy)) >> 16) + 128), got.v) << what;
+                }
+            }
+            VCImage_destroy(src);
+            VCImage_destroy(dst);
+        }
+    }
 }
 
 // Fixed colours pin the coefficients themselves, independently of the model below.
@@ -261,6 +306,48 @@ TEST(VCImageConvert, SameFormatCopiesHonourChromaOffsets) {
     VCImage* cramped = VCImage_createWrap(shortBuf.data(), w, h, VC_FORMAT_NV21, 40, 30);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_convert(src, cramped));
     for (VCImage* i : {src, dst, copy, cramped}) VCImage_destroy(i);
+}
+
+// Without a size field a chroma offset beyond w·h + w·h/2 is trusted: the
+// bands of a larger frame and padded camera buffers are wrapped so.
+TEST(VCImageConvert, DisplacedChromaWithoutSizeField) {
+    const int w = 8, h = 4;
+    const size_t luma = w * h, gap = 24;
+    for (int level : {static_cast<int>(kVCConvertScalar), VCConvert_cpuLevel()}) {
+        VCConvert_setLevel(level);
+        Bytes frame = randomBytes(luma + gap + luma / 2, 11);
+        Bytes packed(luma + luma / 2);
+        memcpy(packed.data(), frame.data(), luma);
+        memcpy(packed.data() + luma, frame.data() + luma + gap, luma / 2);
+        VCImage* band = VCImage_createWrap(frame.data(), w, h, VC_FORMAT_NV21, 0, luma + gap);
+        VCImage* plain = VCImage_createWrap(packed.data(), w, h, VC_FORMAT_NV21, 0, 0);
+        // Read: the same pixels as the contiguous picture.
+        VCImage* fromBand = VCImage_createNew(w, h, VC_FORMAT_RGBA);
+        VCImage* fromPlain = VCImage_createNew(w, h, VC_FORMAT_RGBA);
+        ASSERT_EQ(VC_OK, VCImage_convert(band, fromBand));
+        ASSERT_EQ(VC_OK, VCImage_convert(plain, fromPlain));
+        EXPECT_EQ(0, memcmp(fromBand->data, fromPlain->data, luma * 4));
+        // Write: the chroma lands behind the gap, which stays untouched.
+        Bytes out(frame.size(), 0xEE);
+        VCImage* outBand = VCImage_createWrap(out.data(), w, h, VC_FORMAT_NV21, 0, luma + gap);
+        ASSERT_EQ(VC_OK, VCImage_convert(fromPlain, outBand));
+        VCImage* expected = VCImage_copyAndConvert(fromPlain, VC_FORMAT_NV21);
+        ASSERT_NE(nullptr, expected);
+        EXPECT_EQ(0, memcmp(out.data(), expected->data, luma));
+        EXPECT_EQ(Bytes(gap, 0xEE), Bytes(out.begin() + luma, out.begin() + luma + gap));
+        EXPECT_EQ(0, memcmp(out.data() + luma + gap, expected->data + luma, luma / 2));
+        // Same format, other offset: the planes move.
+        Bytes moved(luma + 8 + luma / 2, 0xEE);
+        VCImage* movedImg = VCImage_createWrap(moved.data(), w, h, VC_FORMAT_NV21, 0, luma + 8);
+        ASSERT_EQ(VC_OK, VCImage_convert(band, movedImg));
+        EXPECT_EQ(Bytes(frame.begin(), frame.begin() + luma),
+                  Bytes(moved.begin(), moved.begin() + luma));
+        EXPECT_EQ(Bytes(frame.begin() + luma + gap, frame.end()),
+                  Bytes(moved.begin() + luma + 8, moved.end()));
+        for (VCImage* i : {band, plain, fromBand, fromPlain, outBand, expected, movedImg})
+            VCImage_destroy(i);
+    }
+    VCConvert_setLevel(VCConvert_cpuLevel());
 }
 
 TEST(VCImageConvert, YuvToRgbMatchesTheEquationsForEverySourceAndTarget) {

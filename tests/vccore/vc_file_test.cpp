@@ -234,6 +234,22 @@ TEST(VcFile, LoadFromFile) {
         EXPECT_EQ(bytesOf(loaded), bytesOf(direct));
         VCImage_destroy(loaded);
         VCImage_destroy(direct);
+
+        // A picture that decodes but cannot become NV21 (odd width) leaves the
+        // record with the picture's geometry: the raw fall-back then takes
+        // the file itself.
+        VCImage* oddRgba = VCImage_createNew(63, 48, VC_FORMAT_RGBA);
+        memset(oddRgba->data, 0x40, oddRgba->size);
+        ASSERT_EQ(VCImage_saveToFile(oddRgba, dir.file("odd.jpg").c_str(), 90), 0);
+        VCImage* oddNv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
+        LogCapture oddLog;
+        ASSERT_EQ(VCImage_loadFromFile(oddNv21, dir.file("odd.jpg").c_str()), 0);
+        EXPECT_EQ(countErrors(oddLog, "VC_ERROR_INVALID_SIZE", -4), 1);
+        EXPECT_TRUE(oddLog.contains(VF_LOG_DEBUG, "Decoding as raw image: 63x48 'NV21'"));
+        EXPECT_EQ(shapeOf(oddNv21), "63x48");
+        EXPECT_EQ(bytesOf(oddNv21), readFile(dir.file("odd.jpg")));
+        VCImage_destroy(oddRgba);
+        VCImage_destroy(oddNv21);
     }
 
     // Raw NV21 bytes into an image that already knows its geometry; the file

@@ -95,11 +95,16 @@ TEST(VCImageScale, SamplesAtPixelCentres) {
     const int upY[6] = {0, 1, 1, 2, 3, 3};
     expectFrom(up, [&](int x, int y) { return std::make_pair(x / 2, upY[y]); });
 
-    // Same size is a plain copy.
+    // Same size is a plain copy, also between buffers wrapped without a size field.
     VCImage* same = VCImage_createEmpty(5, 4, VC_FORMAT_RGBA);
     ASSERT_EQ(VC_OK, VCImage_scale(src, same));
     EXPECT_EQ(0, memcmp(src->data, same->data, 80));
-    for (VCImage* i : {src, down, up, same}) VCImage_destroy(i);
+    std::vector<uint8_t> copied(80, 0);
+    VCImage* in = VCImage_createWrap(src->data, 5, 4, VC_FORMAT_RGBA, 0, 0);
+    VCImage* out = VCImage_createWrap(copied.data(), 5, 4, VC_FORMAT_RGBA, 0, 0);
+    ASSERT_EQ(VC_OK, VCImage_scale(in, out));
+    EXPECT_EQ(0, memcmp(src->data, copied.data(), 80));
+    for (VCImage* i : {src, down, up, same, in, out}) VCImage_destroy(i);
 }
 
 TEST(VCImageCrop, RgbAndEvery420Layout) {
@@ -117,32 +122,56 @@ TEST(VCImageCrop, RgbAndEvery420Layout) {
     EXPECT_EQ(VC_ERROR_INVALID_PARAM, VCImage_crop(src, outside, 0, 0));
     EXPECT_EQ(VC_ERROR_NULL_PARAM, VCImage_crop(nullptr, outside, 0, 0));
 
-    // 8x4 4:2:0 sources, luma 0..31, chroma from 100 on; one with its chroma
-    // plane displaced 8 bytes behind the luma.
+    // 8x4 4:2:0 sources, luma 0..31, chroma from 100 on: contiguous, with the
+    // chroma plane displaced 8 bytes behind the luma, and displaced without a
+    // size field (as bands of a larger frame are wrapped) into a destination
+    // displaced the same way.
+    struct Layout {
+        uint32_t gap;
+        bool sized;
+    };
     for (uint32_t format : {VC_FORMAT_NV12, VC_FORMAT_NV21, VC_FORMAT_YV12, VC_FORMAT_YUVP}) {
-        for (uint32_t gap : {0u, 8u}) {
-            std::vector<uint8_t> buf(32 + gap + 16, 0);
+        for (Layout l : {Layout{0, true}, Layout{8, true}, Layout{8, false}}) {
+            std::vector<uint8_t> buf(32 + l.gap + 16, 0);
             for (int i = 0; i < 32; ++i) buf[i] = static_cast<uint8_t>(i);
-            for (int i = 0; i < 16; ++i) buf[32 + gap + i] = static_cast<uint8_t>(100 + i);
-            VCImage* yuv = VCImage_createWrap(
-                buf.data(), 8, 4, format, static_cast<int>(buf.size()), gap != 0 ? 32 + gap : 0);
-            VCImage* part = VCImage_createEmpty(4, 2, format);
+            for (int i = 0; i < 16; ++i) buf[32 + l.gap + i] = static_cast<uint8_t>(100 + i);
+            VCImage* yuv = VCImage_createWrap(buf.data(), 8, 4, format,
+                                              l.sized ? static_cast<int>(buf.size()) : 0,
+                                              l.gap != 0 ? 32 + l.gap : 0);
+            std::vector<uint8_t> out(8 + 4 + 4, 0xEE);
+            VCImage* part = l.sized ? VCImage_createEmpty(4, 2, format)
+                                    : VCImage_createWrap(out.data(), 4, 2, format, 0, 12);
             ASSERT_EQ(VC_OK, VCImage_crop(yuv, part, 2, 2));
             const uint8_t wantLuma[8] = {18, 19, 20, 21, 26, 27, 28, 29};
             EXPECT_EQ(0, memcmp(wantLuma, part->data, 8));
+            const uint8_t* chroma = part->data + (l.sized ? 8 : 12);
             if (format == VC_FORMAT_NV12 || format == VC_FORMAT_NV21) {
-                // Chroma row 1 (bytes 8..15), bytes 2..5.
+                // Chroma row 1, bytes 2..5.
                 const uint8_t want[4] = {110, 111, 112, 113};
-                EXPECT_EQ(0, memcmp(want, part->data + 8, 4));
+                EXPECT_EQ(0, memcmp(want, chroma, 4));
             } else {
                 // Planes of 8 bytes, rows of 4: row 1, column 1, one byte each.
-                EXPECT_EQ(105, part->data[8]);
-                EXPECT_EQ(113, part->data[10]);
+                EXPECT_EQ(105, chroma[0]);
+                EXPECT_EQ(113, chroma[2]);
+            }
+            if (!l.sized) {
+                EXPECT_EQ(std::vector<uint8_t>(4, 0xEE), std::vector<uint8_t>(&out[8], &out[12]));
             }
             VCImage_destroy(yuv);
             VCImage_destroy(part);
         }
     }
+    // With a size field the planes must lie inside it, wherever the chroma
+    // starts: here it overlaps the luma's second half.
+    std::vector<uint8_t> plain = sequence(48);
+    VCImage* overlapped = VCImage_createWrap(plain.data(), 8, 4, VC_FORMAT_NV12, 32, 16);
+    VCImage* piece = VCImage_createEmpty(2, 2, VC_FORMAT_NV12);
+    EXPECT_EQ(VC_OK, VCImage_crop(overlapped, piece, 0, 0));
+    EXPECT_EQ(16, piece->data[4]);
+    overlapped->uvOffset = 24;  // its chroma would run to byte 40
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_crop(overlapped, piece, 0, 0));
+    VCImage_destroy(overlapped);
+    VCImage_destroy(piece);
 
     std::vector<uint8_t> buf = sequence(48);
     VCImage* nv21 = VCImage_createWrap(buf.data(), 8, 4, VC_FORMAT_NV21, 48, 0);
@@ -238,12 +267,14 @@ TEST(VCImageRotate, OtherFormatsGoThroughRgba) {
     std::vector<uint8_t> packed(6 * 2, 0);
     VCImage* yuyv = VCImage_createWrap(packed.data(), 3, 2, VC_FORMAT_YUYV, 12, 0);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_rotate(yuyv, 90));
-    // ...but not that of the way back (a 2x3 4:2:2 image turns 3 wide).
+    // A 2x3 4:2:2 image turns 3 wide: the way back takes the odd geometry,
+    // as any conversion into an image whose own width is even does.
     VCImage* narrow = VCImage_createWrap(packed.data(), 2, 3, VC_FORMAT_YUYV, 12, 0);
     log.clear();
     EXPECT_EQ(VC_OK, VCImage_rotate(narrow, 90));
-    EXPECT_TRUE(countErrors(log, "VC_ERROR_INVALID_SIZE", -4));
-    EXPECT_EQ(2, narrow->width);
+    EXPECT_FALSE(countErrors(log, "VC_ERROR_INVALID_SIZE", -4));
+    EXPECT_EQ(3, narrow->width);
+    EXPECT_EQ(2, narrow->height);
     // Pixels of no known size cannot be rotated.
     VCImage* unknown = VCImage_createWrap(packed.data(), 2, 2, VC_FORMAT_JPEG, 0, 0);
     EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_rotate(unknown, 90));
@@ -293,25 +324,33 @@ TEST(VCImageDrawImage, ClipsAndPastes) {
 
 TEST(VCImageDrawImage, Yuv420Pastes) {
     LogCapture log;
-    for (uint32_t format : {VC_FORMAT_NV21, VC_FORMAT_YV12}) {
-        // 4x2 source (luma 1..8, chroma 11..14) into an 8x4 destination at (2, 2).
-        std::vector<uint8_t> s = {1, 2, 3, 4, 5, 6, 7, 8, 11, 12, 13, 14};
-        std::vector<uint8_t> d(48, 0);
-        VCImage* src = VCImage_createWrap(s.data(), 4, 2, format, 12, 0);
-        VCImage* dst = VCImage_createWrap(d.data(), 8, 4, format, 48, 0);
+    for (uint32_t format : {VC_FORMAT_NV21, VC_FORMAT_YV12, VC_FORMAT_NV12, VC_FORMAT_YUVP}) {
+        // 4x2 source (luma 1..8, chroma 11..14) into an 8x4 destination at
+        // (2, 2); the last two with their chroma planes displaced behind a
+        // gap and no size field, as bands of a larger frame are wrapped.
+        const bool displaced = format == VC_FORMAT_NV12 || format == VC_FORMAT_YUVP;
+        const uint32_t gap = displaced ? 4 : 0;
+        std::vector<uint8_t> s = {1, 2, 3, 4, 5, 6, 7, 8, 0, 0, 0, 0, 11, 12, 13, 14};
+        if (!displaced) s.erase(s.begin() + 8, s.begin() + 12);
+        std::vector<uint8_t> d(48 + gap, 0);
+        VCImage* src = displaced ? VCImage_createWrap(s.data(), 4, 2, format, 0, 8 + gap)
+                                 : VCImage_createWrap(s.data(), 4, 2, format, 12, 0);
+        VCImage* dst = displaced ? VCImage_createWrap(d.data(), 8, 4, format, 0, 32 + gap)
+                                 : VCImage_createWrap(d.data(), 8, 4, format, 48, 0);
         ASSERT_EQ(VC_OK, VCImage_drawImage(src, dst, 2, 2));
         const uint8_t row2[8] = {0, 0, 1, 2, 3, 4, 0, 0};
         const uint8_t row3[8] = {0, 0, 5, 6, 7, 8, 0, 0};
         EXPECT_EQ(0, memcmp(row2, d.data() + 16, 8));
         EXPECT_EQ(0, memcmp(row3, d.data() + 24, 8));
-        if (format == VC_FORMAT_NV21) {
+        EXPECT_EQ(std::vector<uint8_t>(gap, 0), std::vector<uint8_t>(&d[32], &d[32 + gap]));
+        if (format == VC_FORMAT_NV21 || format == VC_FORMAT_NV12) {
             // Chroma row 1 of the destination, bytes 2..5.
             const uint8_t want[16] = {0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 11, 12, 13, 14, 0, 0};
-            EXPECT_EQ(0, memcmp(want, d.data() + 32, 16));
+            EXPECT_EQ(0, memcmp(want, d.data() + 32 + gap, 16));
         } else {
-            // V plane 11 12, U plane 13 14; destination planes of 8, rows of 4.
+            // First plane 11 12, second 13 14; destination planes of 8, rows of 4.
             const uint8_t want[16] = {0, 0, 0, 0, 0, 11, 12, 0, 0, 0, 0, 0, 0, 13, 14, 0};
-            EXPECT_EQ(0, memcmp(want, d.data() + 32, 16));
+            EXPECT_EQ(0, memcmp(want, d.data() + 32 + gap, 16));
         }
         log.clear();
         EXPECT_EQ(VC_ERROR_UNSUPPORTED, VCImage_drawImage(src, dst, 1, 0));

@@ -209,6 +209,82 @@ TEST(VcImage, CloneGathersDisplacedChroma) {
     VCImage* bad = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
     EXPECT_EQ(nullptr, VCImage_clone(bad));
     VCImage_destroy(bad);
+
+    // A displaced chroma plane is read only inside a size field that is set;
+    // without one the offset is trusted.
+    std::vector<unsigned char> tight(8 + 6 + 4, 3);
+    VCImage* cut = VCImage_createWrap(tight.data(), 4, 2, VC_FORMAT_NV21, 17, 14);
+    EXPECT_EQ(nullptr, VCImage_clone(cut));
+    cut->size = 0;
+    VCImage* trusted = VCImage_clone(cut);
+    ASSERT_NE(nullptr, trusted);
+    EXPECT_EQ(std::vector<unsigned char>(12, 3),
+              std::vector<unsigned char>(trusted->data, trusted->data + 12));
+    for (VCImage* i : {cut, trusted}) VCImage_destroy(i);
+}
+
+TEST(VcImage, OversizedGeometries) {
+    LogCapture log;
+    // No 32-bit size at all: nothing to allocate, nothing to report from a wrap.
+    VCImage* huge = VCImage_createEmpty(70000, 70000, VC_FORMAT_RGBA);
+    EXPECT_EQ(VC_ERROR_INVALID_PARAM, VCImage_allocate(huge));
+    EXPECT_EQ(nullptr, huge->data);
+    unsigned char byte = 0;
+    EXPECT_EQ(0, VCImage_wrap(huge, &byte, 0, 0));
+    // A size that fits 32 bits but not the int result.
+    VCImage* large = VCImage_createEmpty(30000, 30000, VC_FORMAT_RGBA);
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_allocate(large));
+    EXPECT_EQ(nullptr, large->data);
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_wrap(large, &byte, 0, 0));
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_allocate(large));  // now wrapping, size unknown
+    EXPECT_EQ(1, countErrors(log, "VC_ERROR_INVALID_PARAM", -3));
+    EXPECT_EQ(3, countErrors(log, "VC_ERROR_INVALID_SIZE", -4));
+    VCImage_destroy(huge);
+    VCImage_destroy(large);
+}
+
+TEST(VcImage, LayoutDescriptors) {
+    struct RgbRow {
+        uint32_t format;
+        VCRgbLayout want;
+    } rgb[] = {
+        {VC_FORMAT_RGBA, {4, 0, 1, 2, 3}},  {VC_FORMAT_BGRA, {4, 2, 1, 0, 3}},
+        {VC_FORMAT_ARGB, {4, 1, 2, 3, 0}},  {VC_FORMAT_ABGR, {4, 3, 2, 1, 0}},
+        {VC_FORMAT_RGB8, {3, 0, 1, 2, -1}}, {VC_FORMAT_BGR8, {3, 2, 1, 0, -1}},
+    };
+    for (const RgbRow& r : rgb) {
+        VCRgbLayout l;
+        ASSERT_TRUE(VCImage_rgbLayout(r.format, &l));
+        EXPECT_EQ(std::vector<int>({r.want.bytesPerPixel, r.want.r, r.want.g, r.want.b, r.want.a}),
+                  std::vector<int>({l.bytesPerPixel, l.r, l.g, l.b, l.a}))
+            << std::string(reinterpret_cast<const char*>(&r.format), 4);
+    }
+    // An 8x4 image: luma end 32, a quarter plane 8; displaced chroma at 40.
+    struct YuvRow {
+        uint32_t format, uvOffset, u, v;
+        int lumaStep, chromaStep;
+    } yuv[] = {
+        {VC_FORMAT_NV12, 0, 32, 33, 1, 2}, {VC_FORMAT_NV12, 40, 40, 41, 1, 2},
+        {VC_FORMAT_NV21, 0, 33, 32, 1, 2}, {VC_FORMAT_NV21, 40, 41, 40, 1, 2},
+        {VC_FORMAT_YV12, 0, 40, 32, 1, 1}, {VC_FORMAT_YV12, 40, 48, 40, 1, 1},
+        {VC_FORMAT_YUVP, 0, 32, 40, 1, 1}, {VC_FORMAT_YUVP, 40, 40, 48, 1, 1},
+        {VC_FORMAT_YUYV, 40, 1, 3, 2, 4},  {VC_FORMAT_YVYU, 0, 3, 1, 2, 4},
+        {VC_FORMAT_GREY, 0, 0, 0, 1, 0},
+    };
+    for (const YuvRow& r : yuv) {
+        VCImage image;
+        image.width = 8;
+        image.height = 4;
+        image.format = r.format;
+        image.uvOffset = r.uvOffset;
+        VCYuvLayout l;
+        ASSERT_TRUE(VCImage_yuvLayout(&image, &l));
+        EXPECT_EQ(std::vector<int>(
+                      {static_cast<int>(r.u), static_cast<int>(r.v), r.lumaStep, r.chromaStep}),
+                  std::vector<int>({static_cast<int>(l.uOffset), static_cast<int>(l.vOffset),
+                                    l.lumaStep, l.chromaStep}))
+            << std::string(reinterpret_cast<const char*>(&r.format), 4) << " at " << r.uvOffset;
+    }
 }
 
 TEST(VcImage, ErrorNamesAndLine) {

@@ -181,12 +181,15 @@ TEST(VcJpeg, DecodeIntoEachFormat) {
     ASSERT_EQ(VCImage_size(nv21), n * 3 / 2);
     EXPECT_EQ(bytesOf(nv21), convertBytes(ref, 64, 48, VC_FORMAT_RGBA, VC_FORMAT_NV21));
 
-    // An odd-sized picture cannot become NV21: the record is left untouched.
+    // An odd-sized picture cannot become NV21: the conversion refuses it
+    // after the record has taken the picture's geometry and a buffer for it.
     VCImage* odd = makeRgba(63, 48);
     VCImage* refused = decodeInto(VC_FORMAT_NV21, encodeBytes(odd, 90), &rc);
     EXPECT_EQ(rc, VC_ERROR_INVALID_SIZE);
-    EXPECT_EQ(refused->data, nullptr);
-    EXPECT_EQ(shapeOf(refused), "0x0");
+    EXPECT_EQ(shapeOf(refused), "63x48");
+    ASSERT_NE(refused->data, nullptr);
+    EXPECT_EQ(refused->wrapped, 0);
+    EXPECT_EQ(refused->size, VCImage_requiredSize(63, 48, VC_FORMAT_NV21));
     for (VCImage* i : {source, rgba, bgr, nv21, odd, refused}) VCImage_destroy(i);
 }
 
@@ -216,7 +219,7 @@ TEST(VcJpeg, DecodeIntoExistingBuffers) {
     EXPECT_EQ(caller, reference);
 
     // Too small by its size field, or by the geometry it was made for: refused
-    // and left as it was.
+    // before anything changes, as decoding into it would run past its end.
     LogCapture log;
     Bytes small(400, 0x5A);
     VCImage* tooSmall = VCImage_createWrap(small.data(), 10, 10, VC_FORMAT_RGBA, 400, 0);

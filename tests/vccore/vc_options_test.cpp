@@ -4,7 +4,10 @@
 #include <gtest/gtest.h>
 #include <stdio.h>
 #include <string.h>
+#include <unistd.h>
 
+#include <chrono>
+#include <future>
 #include <set>
 #include <string>
 #include <thread>
@@ -34,6 +37,28 @@ std::string hex(uint32_t key) {
 }
 
 void quietLog(int, const char*, ...) {}
+
+// Position of a registered key in key order, counted without the dump: keys
+// are handed out upwards from the base, and this suite sets none by hand
+// that stays registered.
+int indexOf(uint32_t key) {
+    int index = 0;
+    for (uint32_t k = VCOPTION_KEY_BASE + 1; k < key; ++k)
+        if (VCOption_FindById(k) != nullptr) ++index;
+    return index;
+}
+
+std::string dumpLine(uint32_t key, const std::string& rest) {
+    char head[64];
+    snprintf(head, sizeof(head), "OptionsRegister[%02d]: ", indexOf(key));
+    return head + rest;
+}
+
+// A log function that looks options up, as an application's own may.
+int gLookups = 0;
+void lookingLog(int, const char*, ...) {
+    if (VCOption_FindByName("reentrant.lookup") != nullptr) ++gLookups;
+}
 
 }  // namespace
 
@@ -109,12 +134,17 @@ TEST(VcOptions, RegistryDumpLines) {
     static VCOption_t f = makeOption("dump.float", VCOPTION_TYPE_FLOAT);
     static VCOption_t e = makeOption("dump.enum", VCOPTION_TYPE_ENUM);
     static VCOption_t bare = makeOption("dump.bare", VCOPTION_TYPE_ENUM);
+    static VCOption_t str = makeOption("dump.string", VCOPTION_TYPE_STRING);
     static VCOption_t odd = makeOption("dump.odd", static_cast<VCOptionType_t>(9));
     f.min.value.f = 0.25f;
     f.max.value.f = 1.5f;
     e.enumValues = modes;
     LogCapture log;
-    for (VCOption_t* o : {&i, &f, &e, &bare, &odd}) ASSERT_EQ(1, VCOption_RegisterNew(o));
+    for (VCOption_t* o : {&i, &f, &e, &bare, &str, &odd}) ASSERT_EQ(1, VCOption_RegisterNew(o));
+    // Whole lines, index included.
+    EXPECT_TRUE(
+        log.contains(1, dumpLine(i.key, "'dump.int' " + hex(i.key) + " INTEGER -2 - 2000")));
+    EXPECT_TRUE(log.contains(1, dumpLine(str.key, "'dump.string' " + hex(str.key) + " STRING")));
     // The last dump shows every entry; find each of ours by its text.
     auto has = [&](int level, const std::string& rest) {
         for (const auto& l : log.lines()) {
@@ -125,7 +155,6 @@ TEST(VcOptions, RegistryDumpLines) {
         }
         return false;
     };
-    EXPECT_TRUE(has(1, "]: 'dump.int' " + hex(i.key) + " INTEGER -2 - 2000"));
     EXPECT_TRUE(has(1, "]: 'dump.float' " + hex(f.key) + " FLOAT 0.250000 - 1.500000"));
     EXPECT_TRUE(has(1, "]: 'dump.enum' " + hex(e.key) + " ENUM [0] off"));
     EXPECT_TRUE(has(1, "]: 'dump.enum' " + hex(e.key) + " ENUM [5] auto"));
@@ -145,6 +174,33 @@ TEST(VcOptions, RegistryDumpLines) {
     char index[32];
     snprintf(index, sizeof(index), "OptionsRegister[%02d]", static_cast<int>(indices.size()) - 1);
     EXPECT_EQ(0u, lastDump.back().find(index));
+}
+
+TEST(VcOptions, LogFunctionMayLookOptionsUp) {
+    static VCOption_t option = makeOption("reentrant.lookup", VCOPTION_TYPE_STRING);
+    static VCOption_t twin = makeOption("reentrant.lookup", VCOPTION_TYPE_STRING);
+    static VCOption_t intruder = makeOption("reentrant.intruder", VCOPTION_TYPE_INTEGER);
+    VF_LogMsg_t previous = VF_LogMsg;
+    VF_LogMsg = lookingLog;
+    gLookups = 0;
+    // Registration, duplicate and clash all log; none may hold the registry
+    // while doing so. A deadlock cannot be undone: give up the process.
+    std::promise<void> done;
+    std::thread worker([&] {
+        EXPECT_EQ(1, VCOption_RegisterNew(&option));
+        EXPECT_EQ(1, VCOption_RegisterNew(&twin));
+        intruder.key = option.key;
+        EXPECT_EQ(0, VCOption_RegisterNew(&intruder));
+        done.set_value();
+    });
+    if (done.get_future().wait_for(std::chrono::seconds(30)) != std::future_status::ready) {
+        fprintf(stderr, "option registration deadlocked in its log function\n");
+        _exit(1);
+    }
+    worker.join();
+    VF_LogMsg = previous;
+    // The dump logs one line per entry after the new option is in.
+    EXPECT_GE(gLookups, 3);
 }
 
 TEST(VcOptions, ValueChecks) {

@@ -6,7 +6,9 @@
 
 #include "vc_image_layout.h"
 
-VCImage::~VCImage() { VCImage_deallocate(this); }
+VCImage::~VCImage() {
+    VCImage_deallocate(this);
+}
 
 extern "C" int VCImage_isRGB(uint32_t format) {
     switch (format) {
@@ -15,8 +17,10 @@ extern "C" int VCImage_isRGB(uint32_t format) {
         case VC_FORMAT_ARGB:
         case VC_FORMAT_ABGR:
         case VC_FORMAT_RGB8:
-        case VC_FORMAT_BGR8: return 1;
-        default: return 0;
+        case VC_FORMAT_BGR8:
+            return 1;
+        default:
+            return 0;
     }
 }
 
@@ -25,8 +29,10 @@ extern "C" int VCImage_isYUV420(uint32_t format) {
         case VC_FORMAT_NV12:
         case VC_FORMAT_NV21:
         case VC_FORMAT_YV12:
-        case VC_FORMAT_YUVP: return 1;
-        default: return 0;
+        case VC_FORMAT_YUVP:
+            return 1;
+        default:
+            return 0;
     }
 }
 
@@ -34,8 +40,10 @@ extern "C" int VCImage_isYUV(uint32_t format) {
     switch (format) {
         case VC_FORMAT_GREY:
         case VC_FORMAT_YUYV:
-        case VC_FORMAT_YVYU: return 1;
-        default: return VCImage_isYUV420(format);
+        case VC_FORMAT_YVYU:
+            return 1;
+        default:
+            return VCImage_isYUV420(format);
     }
 }
 
@@ -47,17 +55,28 @@ extern "C" uint32_t VCImage_requiredSize(int width, int height, uint32_t format)
         case VC_FORMAT_RGBA:
         case VC_FORMAT_BGRA:
         case VC_FORMAT_ARGB:
-        case VC_FORMAT_ABGR: product = 4 * pixels; break;
+        case VC_FORMAT_ABGR:
+            product = 4 * pixels;
+            break;
         case VC_FORMAT_RGB8:
-        case VC_FORMAT_BGR8: product = 3 * pixels; break;
-        case VC_FORMAT_GREY: product = pixels; break;
+        case VC_FORMAT_BGR8:
+            product = 3 * pixels;
+            break;
+        case VC_FORMAT_GREY:
+            product = pixels;
+            break;
         case VC_FORMAT_YUYV:
-        case VC_FORMAT_YVYU: product = 2 * pixels; break;
+        case VC_FORMAT_YVYU:
+            product = 2 * pixels;
+            break;
         case VC_FORMAT_NV12:
         case VC_FORMAT_NV21:
         case VC_FORMAT_YV12:
-        case VC_FORMAT_YUVP: product = 3 * pixels; break;
-        default: return 0;
+        case VC_FORMAT_YUVP:
+            product = 3 * pixels;
+            break;
+        default:
+            return 0;
     }
     // A product that does not fit the 32-bit size field is no size at all.
     if (product > UINT32_MAX) return 0;
@@ -159,6 +178,13 @@ extern "C" VCImage* VCImage_clone(const VCImage* image) {
         // Gather a displaced chroma plane behind the luma plane.
         size_t luma = static_cast<size_t>(image->width) * image->height;
         size_t chroma = luma / 2;
+        // A size field that is set bounds what may be read; without one the
+        // offset is all there is to go by.
+        if (image->size != 0 &&
+            (luma > image->size || static_cast<uint64_t>(image->uvOffset) + chroma > image->size)) {
+            VCImage_destroy(copy);
+            return nullptr;
+        }
         memcpy(copy->data, image->data, luma);
         memcpy(copy->data + luma, image->data + image->uvOffset, chroma);
     } else {
@@ -175,17 +201,32 @@ extern "C" VCImage* VCImage_cloneHeader(const VCImage* image) {
     return VCImage_createEmpty(image->width, image->height, image->format);
 }
 
-extern "C" void VCImage_destroy(VCImage* image) { delete image; }
+extern "C" void VCImage_destroy(VCImage* image) {
+    delete image;
+}
 
 bool VCImage_rgbLayout(uint32_t format, VCRgbLayout* layout) {
     switch (format) {
-        case VC_FORMAT_RGBA: *layout = {4, 0, 1, 2, 3}; return true;
-        case VC_FORMAT_BGRA: *layout = {4, 2, 1, 0, 3}; return true;
-        case VC_FORMAT_ARGB: *layout = {4, 1, 2, 3, 0}; return true;
-        case VC_FORMAT_ABGR: *layout = {4, 3, 2, 1, 0}; return true;
-        case VC_FORMAT_RGB8: *layout = {3, 0, 1, 2, -1}; return true;
-        case VC_FORMAT_BGR8: *layout = {3, 2, 1, 0, -1}; return true;
-        default: return false;
+        case VC_FORMAT_RGBA:
+            *layout = {4, 0, 1, 2, 3};
+            return true;
+        case VC_FORMAT_BGRA:
+            *layout = {4, 2, 1, 0, 3};
+            return true;
+        case VC_FORMAT_ARGB:
+            *layout = {4, 1, 2, 3, 0};
+            return true;
+        case VC_FORMAT_ABGR:
+            *layout = {4, 3, 2, 1, 0};
+            return true;
+        case VC_FORMAT_RGB8:
+            *layout = {3, 0, 1, 2, -1};
+            return true;
+        case VC_FORMAT_BGR8:
+            *layout = {3, 2, 1, 0, -1};
+            return true;
+        default:
+            return false;
     }
 }
 
@@ -195,13 +236,28 @@ bool VCImage_yuvLayout(const VCImage* image, VCYuvLayout* layout) {
     uint32_t yEnd = image->uvOffset != 0 ? image->uvOffset : luma;
     uint32_t quarter = luma / 4;
     switch (image->format) {
-        case VC_FORMAT_NV12: *layout = {yEnd, yEnd + 1, 1, 2}; return true;
-        case VC_FORMAT_NV21: *layout = {yEnd + 1, yEnd, 1, 2}; return true;
-        case VC_FORMAT_YV12: *layout = {yEnd + quarter, yEnd, 1, 1}; return true;
-        case VC_FORMAT_YUVP: *layout = {yEnd, yEnd + quarter, 1, 1}; return true;
-        case VC_FORMAT_YUYV: *layout = {1, 3, 2, 4}; return true;
-        case VC_FORMAT_YVYU: *layout = {3, 1, 2, 4}; return true;
-        case VC_FORMAT_GREY: *layout = {0, 0, 1, 0}; return true;
-        default: return false;
+        case VC_FORMAT_NV12:
+            *layout = {yEnd, yEnd + 1, 1, 2};
+            return true;
+        case VC_FORMAT_NV21:
+            *layout = {yEnd + 1, yEnd, 1, 2};
+            return true;
+        case VC_FORMAT_YV12:
+            *layout = {yEnd + quarter, yEnd, 1, 1};
+            return true;
+        case VC_FORMAT_YUVP:
+            *layout = {yEnd, yEnd + quarter, 1, 1};
+            return true;
+        case VC_FORMAT_YUYV:
+            *layout = {1, 3, 2, 4};
+            return true;
+        case VC_FORMAT_YVYU:
+            *layout = {3, 1, 2, 4};
+            return true;
+        case VC_FORMAT_GREY:
+            *layout = {0, 0, 1, 0};
+            return true;
+        default:
+            return false;
     }
 }

@@ -22,12 +22,14 @@ bool parityOk(uint32_t format, int width, int height) {
     return !VCImage_isYUV420(format) || height % 2 == 0;
 }
 
-// Last byte touched by the planes of an image, for images whose chroma plane
-// may be displaced behind a caller-chosen offset.
+// End of the bytes the planes of an image reach, for images whose chroma plane
+// may be displaced behind a caller-chosen offset (before or after the luma end).
 uint64_t planesEnd(const VCImage* image) {
     const uint64_t luma = static_cast<uint64_t>(image->width) * image->height;
-    if (VCImage_isYUV420(image->format) && image->uvOffset != 0)
-        return static_cast<uint64_t>(image->uvOffset) + luma / 2;
+    if (VCImage_isYUV420(image->format) && image->uvOffset != 0) {
+        const uint64_t chromaEnd = image->uvOffset + luma / 2;
+        return chromaEnd > luma ? chromaEnd : luma;
+    }
     return VCImage_requiredSize(image->width, image->height, image->format);
 }
 
@@ -107,7 +109,8 @@ int yuvToRgb(const VCImage* src, VCImage* dst) {
     for (int y = 0; y < h; ++y) {
         uint8_t* row = dst->data + static_cast<size_t>(y) * w * dl.bytesPerPixel;
         for (int x = 0; x < w; x += 2) {
-            // Grey has no chroma: its pixels are neutral.
+            // Grey has no chroma (chroma step 0; its offsets point at luma,
+            // not at chroma samples): its pixels are neutral.
             int u = 128;
             int v = 128;
             if (sl.chromaStep != 0) {
@@ -136,9 +139,13 @@ int rgbToYuv(const VCImage* src, VCImage* dst) {
     const int h = src->height;
     const bool is420 = VCImage_isYUV420(dst->format) != 0;
     uint8_t* d = dst->data;
+    // A target of odd size (an existing even image taking an odd geometry)
+    // has (w/2)·(h/2) chroma samples: a last odd column or row has none of
+    // its own and gives no chroma, which keeps every write inside the
+    // (3·w·h + 1) / 2 bytes of a 4:2:0 image.
     for (int y = 0; y < h; ++y) {
         const uint8_t* row = src->data + static_cast<size_t>(y) * w * sl.bytesPerPixel;
-        const bool chromaRow = dl.chromaStep != 0 && (!is420 || y % 2 == 0);
+        const bool chromaRow = dl.chromaStep != 0 && (!is420 || (y % 2 == 0 && y + 1 < h));
         for (int x = 0; x < w; ++x) {
             const uint8_t* px = row + static_cast<size_t>(x) * sl.bytesPerPixel;
             const int r = px[sl.r];
@@ -146,7 +153,7 @@ int rgbToYuv(const VCImage* src, VCImage* dst) {
             const int b = px[sl.b];
             const uint8_t luma = VCConvert_rgbToY(r, g, b);
             d[(static_cast<size_t>(y) * w + x) * dl.lumaStep] = luma;
-            if (chromaRow && x % 2 == 0) {
+            if (chromaRow && x % 2 == 0 && x + 1 < w) {
                 // Point-sampled: the first pixel of the pair gives the chroma.
                 const size_t c = chromaIndex(is420, w, x, y) * dl.chromaStep;
                 d[dl.uOffset + c] = VCConvert_rgbToU(b, luma);
@@ -189,12 +196,9 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
         VCImage_requiredSize(source->width, source->height, destination->format);
     if (required == 0) return VC_REPORT(VC_ERROR_INVALID_PARAM);
 
-    // The destination is checked with its own geometry as it stands, and also
-    // with the geometry it is about to take, so that no loop ever meets an
-    // odd 4:2:x size.
+    // The destination is checked with its own geometry as it stands.
     if (!parityOk(source->format, source->width, source->height) ||
-        !parityOk(destination->format, destination->width, destination->height) ||
-        !parityOk(destination->format, source->width, source->height))
+        !parityOk(destination->format, destination->width, destination->height))
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
 
     uint32_t copyBytes = required;
@@ -204,22 +208,25 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
     } else if (VCImage_size(destination) < required) {
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
     }
-    // Never read or write past a buffer whose size is known, whatever the
-    // chroma offsets say.
-    if (VCImage_size(source) < planesEnd(source)) return VC_REPORT(VC_ERROR_INVALID_SIZE);
+    // A buffer with a size field is never read or written past it, whatever
+    // its chroma offset says. Without one only the offset tells where the
+    // chroma lies (bands of a larger frame, padded camera buffers): trusted.
+    if (source->size != 0 && source->size < planesEnd(source))
+        return VC_REPORT(VC_ERROR_INVALID_SIZE);
     if (source->format == destination->format && copyBytes > VCImage_size(source))
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
-    {
+    if (destination->size != 0) {
         VCImage probe;
         probe.width = source->width;
         probe.height = source->height;
         probe.format = destination->format;
         probe.uvOffset = destination->uvOffset;
-        const uint64_t end = planesEnd(&probe);
-        if (destination->size != 0 && destination->size < end)
-            return VC_REPORT(VC_ERROR_INVALID_SIZE);
-        if (destination->size == 0 && required < end) return VC_REPORT(VC_ERROR_INVALID_SIZE);
+        if (destination->size < planesEnd(&probe)) return VC_REPORT(VC_ERROR_INVALID_SIZE);
     }
+    // An even destination may take an odd geometry; only the reference
+    // loops below bound their chroma writes for that, so neither the
+    // external module nor the vector paths get such a target.
+    const bool evenTarget = parityOk(destination->format, source->width, source->height);
 
     destination->width = source->width;
     destination->height = source->height;
@@ -233,14 +240,15 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
     const bool srcYuv = VCImage_isYUV(source->format) != 0;
     const bool dstRgb = VCImage_isRGB(destination->format) != 0;
     const bool dstYuv = VCImage_isYUV(destination->format) != 0;
-    if ((srcRgb && dstYuv) || (srcYuv && dstRgb)) {
+    if (evenTarget && ((srcRgb && dstYuv) || (srcYuv && dstRgb))) {
         if (csc_run(source, destination) == VC_OK) {
             VF_LogMsg(VF_LOG_DEBUG, "[VCImage] Conversion successful with external CSC module");
             return VC_OK;
         }
     }
 
-    if ((srcYuv || srcRgb) && (dstYuv || dstRgb) && VCConvert_fast(source, destination))
+    if (evenTarget && (srcYuv || srcRgb) && (dstYuv || dstRgb) &&
+        VCConvert_fast(source, destination))
         return VC_OK;
     if (srcYuv && dstYuv) return yuvToYuv(source, destination);
     if (srcYuv && dstRgb) return yuvToRgb(source, destination);

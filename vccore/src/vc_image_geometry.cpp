@@ -17,15 +17,18 @@ const char* fourcc(const uint32_t& format) {
     return reinterpret_cast<const char*>(&format);
 }
 
-// True when every plane of the image lies inside the bytes it declares.
+// True when every plane of the image lies inside the bytes its size field
+// declares. Without a size field only the chroma offset tells where the
+// chroma lies (bands of a larger frame, padded camera buffers): trusted.
 bool planesFit(const VCImage* image) {
+    if (image->size == 0) return true;
     const uint64_t luma = static_cast<uint64_t>(image->width) * image->height;
     uint64_t end = VCImage_requiredSize(image->width, image->height, image->format);
     if (VCImage_isYUV420(image->format) && image->uvOffset != 0) {
-        end = image->uvOffset + luma / 2;
-        if (image->uvOffset < luma) return false;
+        const uint64_t chromaEnd = image->uvOffset + luma / 2;
+        end = chromaEnd > luma ? chromaEnd : luma;
     }
-    return VCImage_size(image) >= end;
+    return image->size >= end;
 }
 
 // Copies `rows` rows of `bytes` bytes between planes of the given strides.

@@ -79,39 +79,41 @@ int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
     // A picture the record cannot describe is refused before anything is allocated.
     uint32_t rgbaSize = VCImage_requiredSize(width, height, VC_FORMAT_RGBA);
     if (rgbaSize == 0) return VC_REPORT(VC_ERROR_CODEC_FAILED);
-    // An existing buffer is measured with the geometry it was made for.
+    // An existing buffer too small for the picture is refused before the
+    // record changes: decoding or converting into it would write past its
+    // end. It is measured with the geometry it was made for.
     uint32_t required = VCImage_requiredSize(width, height, image->format);
     if (image->data != nullptr && required != 0 && VCImage_size(image) < required)
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
 
-    int oldWidth = image->width;
-    int oldHeight = image->height;
-    bool hadBuffer = image->data != nullptr;
+    // The record takes the picture's geometry and, without a buffer, gets
+    // one; a later failure leaves it so.
+    const int oldWidth = image->width;
+    const int oldHeight = image->height;
+    const bool hadBuffer = image->data != nullptr;
     image->width = width;
     image->height = height;
-    int rc = 0;
     if (!hadBuffer) {
         int allocated = VCImage_allocate(image);
-        if (allocated < 0) rc = allocated;
+        if (allocated < 0) return allocated;
     }
-    VCImage* rgba = nullptr;
-    bool inPlace = image->format == VC_FORMAT_RGBA;
-    if (rc == 0) {
-        rgba = inPlace ? VCImage_createWrap(image->data, width, height, VC_FORMAT_RGBA,
-                                            static_cast<int>(rgbaSize), 0)
-                       : VCImage_createNew(width, height, VC_FORMAT_RGBA);
-        if (rgba == nullptr) rc = VC_REPORT(VC_ERROR_ALLOC_FAILED);
-    }
-    if (rc == 0 && !reader->readRgba(rgba->data)) rc = VC_REPORT(VC_ERROR_CODEC_FAILED);
-    if (rc == 0 && !inPlace) rc = VCImage_convert(rgba, image);
-    VCImage_destroy(rgba);
-    if (rc != 0) {
-        // A failed decoding leaves the record as it was; only the pixels of a
-        // buffer it already had may have been written.
+    const bool inPlace = image->format == VC_FORMAT_RGBA;
+    VCImage* rgba = inPlace ? VCImage_createWrap(image->data, width, height, VC_FORMAT_RGBA,
+                                                 static_cast<int>(rgbaSize), 0)
+                            : VCImage_createNew(width, height, VC_FORMAT_RGBA);
+    if (rgba == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    if (!reader->readRgba(rgba->data)) {
+        VCImage_destroy(rgba);
+        // The pixels are decoded only now, straight into their buffer; a
+        // stream that fails here is one that does not decode at all, which
+        // leaves the record as it was (bar the pixels of a buffer it had).
         if (!hadBuffer) VCImage_deallocate(image);
         image->width = oldWidth;
         image->height = oldHeight;
+        return VC_REPORT(VC_ERROR_CODEC_FAILED);
     }
+    int rc = inPlace ? 0 : VCImage_convert(rgba, image);
+    VCImage_destroy(rgba);
     return rc;
 }
 

@@ -3,6 +3,7 @@
 #include <android/log.h>
 #include <stdarg.h>
 #include <stdio.h>
+#include <stdlib.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -15,13 +16,27 @@ namespace {
 const char kLogTag[] = "kivcamera";
 
 void printToStdout(int level, const char* format, va_list args) {
-    // One buffered write per line so that lines of different threads do not interleave.
-    char line[2048];
-    int n = snprintf(line, sizeof(line), "%s ", VF_LogLabel(level));
-    if (n < 0) return;
-    vsnprintf(line + n, sizeof(line) - n, format, args);
-    fprintf(stdout, "%s\n", line);
-    fflush(stdout);
+    // Formatted in full first (on the heap when it outgrows the stack buffer),
+    // then written by one call so that lines of different threads do not
+    // interleave.
+    char buffer[2048];
+    va_list again;
+    va_copy(again, args);
+    int n = vsnprintf(buffer, sizeof(buffer), format, args);
+    char* message = buffer;
+    if (n >= static_cast<int>(sizeof(buffer))) {
+        message = static_cast<char*>(malloc(static_cast<size_t>(n) + 1));
+        if (message != nullptr)
+            vsnprintf(message, static_cast<size_t>(n) + 1, format, again);
+        else
+            message = buffer;  // out of memory: the cut line is better than none
+    }
+    va_end(again);
+    if (n >= 0) {
+        fprintf(stdout, "%s %s\n", VF_LogLabel(level), message);
+        fflush(stdout);
+    }
+    if (message != buffer) free(message);
 }
 
 // Monotonic elapsed time in microseconds (read in nanoseconds, divided by 1000).
@@ -36,20 +51,29 @@ int64_t elapsedMicros() {
 
 extern "C" const char* VF_LogLabel(int level) {
     switch (level) {
-        case VF_LOG_DEBUG: return "[D]";
-        case VF_LOG_INFO: return "[I]";
-        case VF_LOG_WARNING: return "[W]";
-        case VF_LOG_ERROR: return "[E]";
-        default: return "[V]";
+        case VF_LOG_DEBUG:
+            return "[D]";
+        case VF_LOG_INFO:
+            return "[I]";
+        case VF_LOG_WARNING:
+            return "[W]";
+        case VF_LOG_ERROR:
+            return "[E]";
+        default:
+            return "[V]";
     }
 }
 
 extern "C" int VF_LogPriority(int level) {
     switch (level) {
-        case VF_LOG_INFO: return ANDROID_LOG_INFO;
-        case VF_LOG_WARNING: return ANDROID_LOG_WARN;
-        case VF_LOG_ERROR: return ANDROID_LOG_ERROR;
-        default: return ANDROID_LOG_DEBUG;
+        case VF_LOG_INFO:
+            return ANDROID_LOG_INFO;
+        case VF_LOG_WARNING:
+            return ANDROID_LOG_WARN;
+        case VF_LOG_ERROR:
+            return ANDROID_LOG_ERROR;
+        default:
+            return ANDROID_LOG_DEBUG;
     }
 }
 

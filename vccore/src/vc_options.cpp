@@ -28,7 +28,9 @@ Registry& registry() {
 
 uint32_t gKeyCounter = VCOPTION_KEY_BASE;
 
-uint32_t nextKey() { return __atomic_add_fetch(&gKeyCounter, 1u, __ATOMIC_SEQ_CST); }
+uint32_t nextKey() {
+    return __atomic_add_fetch(&gKeyCounter, 1u, __ATOMIC_SEQ_CST);
+}
 
 std::vector<Entry>::iterator findKey(std::vector<Entry>& entries, int32_t key) {
     auto it = std::lower_bound(entries.begin(), entries.end(), key,
@@ -110,35 +112,56 @@ char* findValue(const char* paramString, const char* name, const char** value) {
 extern "C" int VCOption_RegisterNew(VCOption_t* option) {
     if (option == nullptr) return 0;
     Registry& r = registry();
-    std::lock_guard<std::mutex> guard(r.lock);
-    if (option->key == 0) {
-        for (const Entry& e : r.entries) {
-            const VCOption_t* o = e.second;
-            if (o != nullptr && o->type == option->type && o->name != nullptr &&
-                option->name != nullptr && strcmp(o->name, option->name) == 0) {
-                option->key = o->key;
-                VF_LogMsg(VF_LOG_DEBUG, "DEBUG: Duplicate option found: '%s' with type %d. Key = %d",
-                          option->name, option->type,
-                          static_cast<int>(option->key));
-                return 1;
+    // Everything is decided under the lock and logged after it: a replacement
+    // log function may well look options up.
+    bool duplicate = false;
+    bool newKey = false;
+    bool clash = false;
+    std::vector<Entry> snapshot;
+    {
+        std::lock_guard<std::mutex> guard(r.lock);
+        if (option->key == 0) {
+            for (const Entry& e : r.entries) {
+                const VCOption_t* o = e.second;
+                if (o != nullptr && o->type == option->type && o->name != nullptr &&
+                    option->name != nullptr && strcmp(o->name, option->name) == 0) {
+                    option->key = o->key;
+                    duplicate = true;
+                    break;
+                }
+            }
+            if (!duplicate) {
+                option->key = nextKey();
+                newKey = true;
             }
         }
-        option->key = nextKey();
+        if (!duplicate) {
+            int32_t key = static_cast<int32_t>(option->key);
+            clash = findKey(r.entries, key) != r.entries.end();
+            if (!clash) {
+                auto at = std::lower_bound(r.entries.begin(), r.entries.end(), key,
+                                           [](const Entry& e, int32_t k) { return e.first < k; });
+                r.entries.insert(at, Entry(key, option));
+                snapshot = r.entries;
+            }
+        }
+    }
+    if (duplicate) {
+        VF_LogMsg(VF_LOG_DEBUG, "DEBUG: Duplicate option found: '%s' with type %d. Key = %d",
+                  option->name, option->type, static_cast<int>(option->key));
+        return 1;
+    }
+    if (newKey)
         VF_LogMsg(VF_LOG_DEBUG, "DEBUG: Registering option '%s' as key 0x%08x", option->name,
                   option->key);
-    }
-    int32_t key = static_cast<int32_t>(option->key);
-    if (findKey(r.entries, key) != r.entries.end()) {
+    if (clash) {
         VF_LogMsg(VF_LOG_ERROR,
                   "ERROR: Trying to register new option with an already existing key! [key = "
                   "0x%08x]",
                   option->key);
         return 0;
     }
-    auto at = std::lower_bound(r.entries.begin(), r.entries.end(), key,
-                               [](const Entry& e, int32_t k) { return e.first < k; });
-    r.entries.insert(at, Entry(key, option));
-    dump(r.entries);
+    dump(snapshot);
     return 1;
 }
 

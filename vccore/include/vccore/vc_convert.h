@@ -15,8 +15,11 @@ extern "C" {
 // source's and its format selects the target. Full-range (JPEG) YUV on both
 // sides; chroma is point-sampled (not averaged) when subsampling, and grey
 // sources convert to neutral RGB (R = G = B = Y). Returns 0 or a VC_ERROR_*
-// code: VC_ERROR_INVALID_SIZE for odd 4:2:x sizes or a destination (or source)
-// buffer too small, VC_ERROR_UNSUPPORTED for pairs outside the formats.
+// code: VC_ERROR_INVALID_SIZE for odd 4:2:x sizes (of each image's own
+// geometry: an existing even destination may take an odd one) or a
+// destination (or source) buffer too small, VC_ERROR_UNSUPPORTED for pairs
+// outside the formats. A chroma offset is bounded by a size field that is set
+// and trusted without one.
 int VCImage_convert(const VCImage* source, VCImage* destination);
 
 // A new owning image of the source's size in `format`, or null.
