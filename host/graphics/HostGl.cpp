@@ -48,6 +48,7 @@ HostGl::HostGl()
       mContext(EGL_NO_CONTEXT),
       mSurface(EGL_NO_SURFACE),
       mFramebuffer(0),
+      mCompilerResident(false),
       mCreateSync(nullptr),
       mClientWaitSync(nullptr),
       mDestroySync(nullptr) {}
@@ -110,6 +111,7 @@ void HostGl::destroy_l() {
         }
     }
     mFramebuffer = 0;
+    mCompilerResident = false;
     if (mSurface != EGL_NO_SURFACE) eglDestroySurface(mDisplay, mSurface);
     if (mContext != EGL_NO_CONTEXT) eglDestroyContext(mDisplay, mContext);
     // Drops this layer's reference; the display ends only with its last user.
@@ -151,6 +153,7 @@ bool HostGl::run(const std::function<bool()>& work) {
     }
     while (glGetError() != GL_NO_ERROR) {
     }
+    if (!mCompilerResident) holdCompiler_l();
     bool ok = work();
     // Uploads must land before the caller's context samples them.
     fenceCurrent(mDisplay);
@@ -165,6 +168,25 @@ bool HostGl::run(const std::function<bool()>& work) {
         eglMakeCurrent(mDisplay, EGL_NO_SURFACE, EGL_NO_SURFACE, EGL_NO_CONTEXT);
     }
     return ok;
+}
+
+void HostGl::holdCompiler_l() {
+    // Mesa builds its GLSL built-in library for the first context that
+    // compiles and frees it when the last one calls glReleaseShaderCompiler.
+    // Pipelines that build a program per frame and release the compiler
+    // after it (as the hint invites) would rebuild it every time, a few
+    // milliseconds each; one compile here keeps it loaded while the host
+    // context lives, as a device driver keeps its compiler.
+    GLuint shader = glCreateShader(GL_FRAGMENT_SHADER);
+    if (shader != 0) {
+        static const char* kSource = "void main() { gl_FragColor = vec4(0.0); }";
+        glShaderSource(shader, 1, &kSource, nullptr);
+        glCompileShader(shader);
+        glDeleteShader(shader);
+    }
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    mCompilerResident = true;
 }
 
 GLuint HostGl::framebuffer_l() {

@@ -47,6 +47,8 @@ private:
     bool create_l();
     void destroy_l();
     void fenceCurrent(EGLDisplay display);
+    // With the context current: keeps the shader compiler loaded (see .cpp).
+    void holdCompiler_l();
 
     std::mutex mLock;
     int mUsers;
@@ -54,6 +56,7 @@ private:
     EGLContext mContext;
     EGLSurface mSurface;
     GLuint mFramebuffer;
+    bool mCompilerResident;
     PFNEGLCREATESYNCKHRPROC mCreateSync;
     PFNEGLCLIENTWAITSYNCKHRPROC mClientWaitSync;
     PFNEGLDESTROYSYNCKHRPROC mDestroySync;
