@@ -20,9 +20,6 @@
 
 class EglEnvironment;
 class EglWindowSurface;
-namespace android {
-class GraphicBuffer;
-}
 class EglProgram;
 class KivBuiltInFilterCatalog;
 class KivFilter;
@@ -105,10 +102,6 @@ private:
     android::sp<KivBuiltInFilterCatalog> mCatalog;
     KivFilter* mFilter;
     int32_t mMaxTextureSize;
-    // The last call's source and target buffers (CPU pixels, no GL object of
-    // this context): a run of same-size pictures reuses them.
-    android::sp<android::GraphicBuffer> mSourceBuffer;
-    android::sp<android::GraphicBuffer> mTargetBuffer;
 };
 
 #endif

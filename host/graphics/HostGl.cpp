@@ -29,6 +29,8 @@ const EGLint kConfigAttribs[] = {EGL_SURFACE_TYPE,
 const EGLint kContextAttribs[] = {EGL_CONTEXT_CLIENT_VERSION, 2, EGL_NONE};
 const EGLint kPbufferAttribs[] = {EGL_WIDTH, 1, EGL_HEIGHT, 1, EGL_NONE};
 
+std::atomic<void (*)()> gDisplayIdleHook{nullptr};
+
 }  // namespace
 
 HostGl& HostGl::get() {
@@ -49,6 +51,7 @@ HostGl::HostGl()
       mSurface(EGL_NO_SURFACE),
       mFramebuffer(0),
       mCompilerResident(false),
+      mHeldDisplay(EGL_NO_DISPLAY),
       mCreateSync(nullptr),
       mClientWaitSync(nullptr),
       mDestroySync(nullptr) {}
@@ -91,11 +94,14 @@ bool HostGl::create_l() {
     if (extensions == nullptr || strstr(extensions, "EGL_KHR_fence_sync") == nullptr) {
         mCreateSync = nullptr;  // glFinish() orders instead
     }
+    mHeldDisplay = mDisplay;
     return true;
 }
 
 void HostGl::destroy_l() {
     if (mDisplay == EGL_NO_DISPLAY) return;
+    // Our own eglTerminate below must not look like another user leaving.
+    mHeldDisplay = EGL_NO_DISPLAY;
     if (mFramebuffer != 0 && mContext != EGL_NO_CONTEXT) {
         EGLDisplay display = eglGetCurrentDisplay();
         EGLContext context = eglGetCurrentContext();
@@ -194,6 +200,17 @@ GLuint HostGl::framebuffer_l() {
     return mFramebuffer;
 }
 
+void HostGl::setDisplayIdleHook(void (*hook)()) {
+    gDisplayIdleHook = hook;
+}
+
+void HostGl::onOneDisplayReferenceLeft(EGLDisplay display) {
+    // The reference left is this context's own.
+    if (display == EGL_NO_DISPLAY || mHeldDisplay.load() != display) return;
+    void (*hook)() = gDisplayIdleHook.load();
+    if (hook != nullptr) hook();
+}
+
 }  // namespace android
 
 // Display references, as Android's EGL keeps them: every successful
@@ -243,12 +260,17 @@ extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* m
 
 extern "C" EGLBoolean eglTerminate(EGLDisplay display) {
     static const auto next = nextSymbol<EGLBoolean (*)(EGLDisplay)>("eglTerminate");
-    std::lock_guard<std::mutex> guard(referencesLock());
-    auto found = references().find(display);
-    if (found != references().end() && found->second > 1) {
-        --found->second;
-        return EGL_TRUE;
+    int left = 0;
+    {
+        std::lock_guard<std::mutex> guard(referencesLock());
+        auto found = references().find(display);
+        if (found == references().end() || found->second <= 1) {
+            if (found != references().end()) references().erase(found);
+            return next(display);
+        }
+        left = --found->second;
     }
-    if (found != references().end()) references().erase(found);
-    return next(display);
+    // Outside the lock: letting the host context go terminates again.
+    if (left == 1) android::HostGl::get().onOneDisplayReferenceLeft(display);
+    return EGL_TRUE;
 }
