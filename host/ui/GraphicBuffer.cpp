@@ -105,6 +105,7 @@ struct Recycled {
     uint32_t width = 0;
     uint32_t height = 0;
     uint32_t stride = 0;
+    bool render = false;  // allocated for USAGE_HW_RENDER
     unsigned char* data = nullptr;
     GLuint texture = 0;
     std::unique_ptr<unsigned char[]> rgbaScratch;
@@ -157,11 +158,13 @@ public:
         return kept;
     }
 
-    bool take(uint32_t fourcc, uint32_t w, uint32_t h, uint32_t stride, Recycled* out) {
+    bool take(uint32_t fourcc, uint32_t w, uint32_t h, uint32_t stride, bool render,
+              Recycled* out) {
         std::lock_guard<std::mutex> guard(mLock);
         for (size_t i = mEntries.size(); i-- > 0;) {
             Recycled& e = mEntries[i];
-            if (e.fourcc == fourcc && e.width == w && e.height == h && e.stride == stride) {
+            if (e.fourcc == fourcc && e.width == w && e.height == h && e.stride == stride &&
+                e.render == render) {
                 mBytes -= e.bytes();
                 *out = std::move(e);
                 mEntries.erase(mEntries.begin() + (ptrdiff_t)i);
@@ -238,6 +241,7 @@ GraphicBuffer::GraphicBuffer()
       mSpareTexture(0),
       mZeroContent(true),
       mZeroPending(false),
+      mSpareMatches(false),
       mImageCount(0),
       mGpuDirty(false),
       mUploadCount(0),
@@ -285,12 +289,19 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
     }
     mDataSize = bytesOf(mFourcc, h, inStride);
     Recycled recycled;
+    bool render = (inUsage & USAGE_HW_RENDER) != 0;
     if ((inUsage & USAGE_HW_MASK) != 0 &&
-        Recycler::get().take(mFourcc, w, h, inStride, &recycled)) {
+        Recycler::get().take(mFourcc, w, h, inStride, render, &recycled)) {
         mData = recycled.data;
         mSpareTexture = recycled.texture;
         mRgbaScratch = std::move(recycled.rgbaScratch);
-        mZeroPending = true;
+        // What the GPU renders into starts clean, so that nothing drawn for
+        // one buffer ever shows in another. A texture-only buffer keeps the
+        // bytes it gets, and its mirror (their upload) with them, until the
+        // CPU writes it: a new buffer's contents are undefined on a device too.
+        mZeroPending = render;
+        mZeroContent = render;
+        mSpareMatches = !render;
     } else {
         mData = static_cast<unsigned char*>(calloc(1, mDataSize));
     }
@@ -303,8 +314,10 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
 
 GraphicBuffer::~GraphicBuffer() {
     GLuint texture = mMirrorTexture != 0 ? mMirrorTexture : mSpareTexture;
-    if (texture != 0 && mData != nullptr) {
+    // Kept only when the mirror holds the CPU copy's last unlocked state.
+    if (texture != 0 && mData != nullptr && mLockUsage == 0) {
         Recycled entry;
+        entry.render = (usage & USAGE_HW_RENDER) != 0;
         entry.fourcc = mFourcc;
         entry.width = (uint32_t)width;
         entry.height = (uint32_t)height;
@@ -502,11 +515,12 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
     // A recycled mirror already counts as a user of the host context.
     GLuint texture = mSpareTexture;
     if (texture == 0 && !gl.acquire()) return false;
-    // An untouched buffer needs no conversion: its mirror gets what zeros
-    // convert to.
-    const unsigned char* rgba = mZeroContent ? nullptr : rgbaForUpload_l();
+    // A recycled mirror may already hold the CPU copy; an untouched buffer
+    // needs no conversion: its mirror gets what zeros convert to.
+    const bool matches = texture != 0 && mSpareMatches;
+    const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
     bool made = false;
-    bool ok = (mZeroContent || rgba != nullptr) && gl.run([&] {
+    bool ok = (matches || mZeroContent || rgba != nullptr) && gl.run([&] {
         bool fresh = texture == 0;
         if (fresh) {
             glGenTextures(1, &texture);
@@ -518,9 +532,9 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
             glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
             glBindTexture(GL_TEXTURE_2D, 0);
         }
-        made =
-            (rgba != nullptr ? fillMirror_l(texture, rgba, fresh) : zeroMirror_l(texture, fresh)) &&
-            glGetError() == GL_NO_ERROR;
+        made = (matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
+                                            : zeroMirror_l(texture, fresh))) &&
+               glGetError() == GL_NO_ERROR;
         if (!made) {
             VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed", width, height);
             if (fresh) glDeleteTextures(1, &texture);

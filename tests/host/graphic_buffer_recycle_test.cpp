@@ -1,7 +1,8 @@
 // Host GraphicBuffers that went away after GPU use are recycled: a new buffer
-// of the same layout takes the old memory and mirror, yet reads as a new one
-// (zeros on the CPU, what zeros convert to on the GPU), and what is kept goes
-// with the display's last other user.
+// of the same layout and kind takes the old memory and mirror. A render target
+// still reads as a new one (zeros on the CPU, what zeros convert to on the
+// GPU); a texture-only buffer's mirror matches the bytes it came with. What is
+// kept goes with the display's last other user.
 #include <ui/GraphicBuffer.h>
 
 #include <gtest/gtest.h>
@@ -19,8 +20,8 @@ namespace {
 
 const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
 const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
-const uint32_t kRenderUsage =
-    GraphicBuffer::USAGE_HW_TEXTURE | GraphicBuffer::USAGE_HW_RENDER | kRead | kWrite;
+const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
+const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
 
 // The buffer as the GPU sees it through an EGL image (row 0 first), or empty.
 std::vector<uint8_t> gpuPixels(EGLDisplay display, const sp<GraphicBuffer>& buffer) {
@@ -52,8 +53,9 @@ size_t bytesOf(int w, int h, int format) {
 
 // A buffer that held a picture on both sides, then went away; returns where
 // its CPU pixels were.
-const void* useAndDrop(EGLDisplay display, int w, int h, int format) {
-    sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, format, kRenderUsage);
+const void* useAndDrop(EGLDisplay display, int w, int h, int format,
+                       uint32_t usage = kRenderUsage) {
+    sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, format, usage);
     void* pixels = nullptr;
     EXPECT_EQ(buffer->lock(kWrite, &pixels), android::NO_ERROR);
     memset(pixels, 0x5A, bytesOf(w, h, format));
@@ -91,8 +93,10 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
         for (int i = 0; i < w * h; ++i) expected.insert(expected.end(), c.zero, c.zero + 4);
         EXPECT_EQ(gpuPixels(display(), buffer), expected) << c.format;  // ...and its mirror
     }
-    // GPU side first: a render target's first lock reads the zeroed mirror back.
+    // GPU side first: a render target's first lock reads the zeroed mirror
+    // back; a texture-only buffer's memory is not handed to it.
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
+    useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
     void* pixels = nullptr;
@@ -101,6 +105,16 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     EXPECT_EQ(std::vector<uint8_t>(p, p + w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
     EXPECT_EQ(target->getReadbackCount(), 1u);
     ASSERT_EQ(target->unlock(), android::NO_ERROR);
+
+    // The texture-only memory goes to a texture-only buffer, mirror and all.
+    sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    ASSERT_EQ(source->lock(kRead, &pixels), android::NO_ERROR);
+    p = static_cast<const uint8_t*>(pixels);
+    std::vector<uint8_t> cpu(p, p + w * h * 4);
+    ASSERT_EQ(source->unlock(), android::NO_ERROR);
+    EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
+    EXPECT_EQ(gpuPixels(display(), source), cpu);
+    EXPECT_EQ(source->getUploadCount(), 0u);
 }
 
 TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {

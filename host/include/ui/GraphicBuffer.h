@@ -19,9 +19,12 @@
 //
 // Like a device allocator, the host keeps the memory and mirror of a few
 // buffers that went away after GPU use and hands them to new buffers of the
-// same layout: a new buffer reads as zeros either way, but skips fresh pages
-// and a new texture. What is kept is let go when the last other user of the
-// display terminates it.
+// same layout and kind, which skip fresh pages and a new texture. A recycled
+// render target (USAGE_HW_RENDER) reads as zeros on both sides, as a new
+// buffer does; a recycled texture-only buffer holds the bytes it came with
+// (its mirror matching them) until the CPU writes it, as contents of a new
+// buffer are undefined on a device. What is kept is let go when the last
+// other user of the display terminates it.
 #ifndef KIV_HOST_UI_GRAPHICBUFFER_H
 #define KIV_HOST_UI_GRAPHICBUFFER_H
 
@@ -170,6 +173,8 @@ private:
     // ...though for recycled memory the zeros are still to be written, at the
     // first lock that does not fill the copy itself.
     bool mZeroPending;
+    // mSpareTexture already holds the CPU copy (a recycled texture-only buffer).
+    bool mSpareMatches;
     int mImageCount;
     bool mGpuDirty;
     // The CPU copy as the last readback left it, while that lock is held: an
