@@ -249,6 +249,18 @@ T nextSymbol(const char* name) {
 
 }  // namespace
 
+namespace android {
+
+bool HostGl::displayHasOtherUsers() const {
+    EGLDisplay display = mHeldDisplay.load();
+    if (display == EGL_NO_DISPLAY) return false;
+    std::lock_guard<std::mutex> guard(referencesLock());
+    auto found = references().find(display);
+    return found != references().end() && found->second > 1;
+}
+
+}  // namespace android
+
 extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* minor) {
     static const auto next =
         nextSymbol<EGLBoolean (*)(EGLDisplay, EGLint*, EGLint*)>("eglInitialize");

@@ -50,6 +50,9 @@ public:
     static void setDisplayIdleHook(void (*hook)());
     // From eglTerminate: `display` has one reference left.
     void onOneDisplayReferenceLeft(EGLDisplay display);
+    // Whether anyone but this context holds the display it lives on (false
+    // when there is no context).
+    bool displayHasOtherUsers() const;
 
 private:
     HostGl();

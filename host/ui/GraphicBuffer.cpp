@@ -125,8 +125,8 @@ struct Recycled {
 
 // A few recycled buffers, the most recent last. Fresh memory costs a page
 // fault per page and a new texture a fresh allocation in the driver: with
-// 12-megapixel pictures that is tens of milliseconds a buffer, against one
-// memset and one clear for a recycled one.
+// 12-megapixel pictures that is tens of milliseconds a buffer, against at
+// most zeroing it again for a recycled one.
 class Recycler {
 public:
     static Recycler& get() {
@@ -135,14 +135,17 @@ public:
         return *instance;
     }
 
-    // Keeps `entry` (false when it cannot; the caller frees it).
+    // Keeps `entry` (false when it cannot; the caller frees it). Only while
+    // someone else uses the display: the host context must not outlive its
+    // last user for the sake of buffers nobody may ask for again. (Checked
+    // under the lock, so an eglTerminate that drains cannot slip in between.)
     bool keep(Recycled& entry) {
         std::vector<Recycled> evicted;
         bool kept = false;
         {
             std::lock_guard<std::mutex> guard(mLock);
             size_t bytes = entry.bytes();
-            if (bytes <= kMaxBytes) {
+            if (bytes <= kMaxBytes && HostGl::get().displayHasOtherUsers()) {
                 while (!mEntries.empty() &&
                        (mEntries.size() >= kMaxEntries || mBytes + bytes > kMaxBytes)) {
                     mBytes -= mEntries.front().bytes();

@@ -127,6 +127,17 @@ TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser)
     gl.release();
     // ...until the environment's eglTerminate: then both go, and the display ends.
     EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
+
+    // A buffer that outlives every other user of the display is not kept.
+    GlContext again;
+    ASSERT_TRUE(again.ok());
+    display = again.env()->getEGLDisplay();
+    sp<GraphicBuffer> late = new GraphicBuffer(4, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    EXPECT_FALSE(gpuPixels(display, late).empty());
+    again.release();
+    EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);  // the live buffer's mirror
+    late.clear();
+    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
 }
 
 }  // namespace
