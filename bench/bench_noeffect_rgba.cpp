@@ -126,6 +126,10 @@ private:
         GLint linked = 0;
         glGetProgramiv(mProgram, GL_LINK_STATUS, &linked);
         if (!linked) return false;
+        // Done compiling. Holding on to the compiler would keep Mesa's GLSL
+        // built-ins loaded for the processor's context too, which no real
+        // caller of it has.
+        glReleaseShaderCompiler();
         static const GLfloat quad[] = {-1, -1, 1, -1, -1, 1, 1, 1};
         glVertexAttribPointer(0, 2, GL_FLOAT, GL_FALSE, 0, quad);
         glEnableVertexAttribArray(0);
