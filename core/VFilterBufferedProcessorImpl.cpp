@@ -6,8 +6,6 @@
 
 #include <new>
 
-#include <ui/GraphicBuffer.h>
-
 #include "core/KivBuiltInFilterCatalog.h"
 #include "core/KivEffectSelection.h"
 #include "core/KivFilter.h"
@@ -68,8 +66,6 @@ VFilterBufferedProcessorImpl::~VFilterBufferedProcessorImpl() {
     // GL objects were released by release(); only references are dropped here.
     // The effect holds no GL object of its own once its program is gone.
     deleteEffect();
-    mSourceBuffer.clear();
-    mTargetBuffer.clear();
     mCatalog.clear();
     mProgram.clear();
     mSurface.clear();
@@ -96,8 +92,6 @@ int VFilterBufferedProcessorImpl::initializeGL() {
 int VFilterBufferedProcessorImpl::release() {
     EglLog(VF_LOG_DEBUG, "%s", "virtual int VFilterBufferedProcessorImpl::release()");
     deleteEffect();
-    mSourceBuffer.clear();
-    mTargetBuffer.clear();
     releaseFromGL();
     return 0;
 }
@@ -200,7 +194,9 @@ VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source
                          int height) {
     program.setCameraGeometry(width, height, 0, 0);
     program.setPreviewGeometry(width, height, false);
-    // Nothing was drawn into the target yet, so there is no cache to flush.
+    // The target is new and nothing was drawn into it: flushCache() would only
+    // read back the zeros it was made with (a full copy on the host), so it
+    // is left out.
     if (target.bindFrameBuffer() != 0) return nullptr;
     program.onDrawFrame();
     glFinish();
@@ -216,15 +212,6 @@ VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source
         VC_REPORT(VC_ERROR_UNKNOWN);
     }
     return pixels;
-}
-
-// Initializes `image` over `kept` when that buffer fits it, and keeps the
-// image's buffer for the next call.
-int initializeReusing(EglImage& image, android::sp<android::GraphicBuffer>& kept) {
-    image.reuseGraphicBuffer(kept);
-    int result = image.initialize();
-    kept = image.getGraphicBuffer();
-    return result;
 }
 
 void releaseImage(android::sp<EglImage>& image) {
@@ -293,12 +280,12 @@ int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char* input, int 
         unbindGLEnvironment();
         return VC_REPORT(VC_ERROR_INVALID_STATE);
     }
-    initializeReusing(*target, mTargetBuffer);
+    target->initialize();
     source = new (std::nothrow)
         EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL, width, height, VC_FORMAT_RGBA);
 
     glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && initializeReusing(*source, mSourceBuffer) == 0 && source->bindTexture() == 0 &&
+    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
         source->setImageData(*rgba, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
         readBack = drawAndReadBack(*mProgram, *target, *source, width, height);
     }
@@ -373,7 +360,7 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
         destroyImage(nv21);
         return VC_REPORT(VC_ERROR_INVALID_STATE);
     }
-    initializeReusing(*target, mTargetBuffer);
+    target->initialize();
 
     uint32_t textureFormat = VC_FORMAT_NV21;
     if (!Platform::isNativeInputFormat(VC_FORMAT_NV21)) {
@@ -389,7 +376,7 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
 
     VCImage* readBack = nullptr;
     glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && initializeReusing(*source, mSourceBuffer) == 0 && source->bindTexture() == 0 &&
+    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
         source->setImageData(*nv21, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
         readBack = drawAndReadBack(*mProgram, *target, *source, w, h);
     }

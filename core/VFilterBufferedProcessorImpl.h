@@ -14,13 +14,12 @@
 #include <stdint.h>
 #include <utils/StrongPointer.h>
 
+#include <functional>
+
 #include "core/VFilterBufferedProcessor.h"
 
 class EglEnvironment;
 class EglWindowSurface;
-namespace android {
-class GraphicBuffer;
-}
 class EglProgram;
 class KivBuiltInFilterCatalog;
 class KivFilter;
@@ -62,6 +61,23 @@ public:
     // Status codes as doProcessRGBA.
     int doProcessNV21(const unsigned char* input, int width, int height, unsigned char* output);
 
+    // Where processFile stopped; each failure but the last is a Java exception.
+    enum FileStatus {
+        FILE_OK = 0,
+        FILE_LOAD_FAILED,     // the input could not be read or decoded as NV21
+        FILE_ALLOC_FAILED,    // no memory for the RGBA result
+        FILE_PROCESS_FAILED,  // doProcessNV21 returned a negative status
+        FILE_NO_OUTPUT_PATH,  // outputPath() gave null
+        FILE_SAVE_FAILED,     // the JPEG could not be written (not reported to Java)
+    };
+    // processFile without Java: loads `inputPath` as NV21, runs the current
+    // effect with doProcessNV21 into a new RGBA image and saves it as a
+    // quality-98 JPEG at the path that `outputPath` returns. That path is asked
+    // for only once the picture is processed, and must stay valid until this
+    // returns.
+    FileStatus processFilePath(const char* inputPath,
+                               const std::function<const char*()>& outputPath);
+
     // Makes the context current and builds the program with the current effect
     // (and, on msm8974, enables 8K textures). 0 or -7.
     int bindGLEnvironment();
@@ -86,10 +102,6 @@ private:
     android::sp<KivBuiltInFilterCatalog> mCatalog;
     KivFilter* mFilter;
     int32_t mMaxTextureSize;
-    // The last call's source and target buffers (CPU pixels, no GL object of
-    // this context): a run of same-size pictures reuses them.
-    android::sp<android::GraphicBuffer> mSourceBuffer;
-    android::sp<android::GraphicBuffer> mTargetBuffer;
 };
 
 #endif

@@ -155,6 +155,28 @@ jobject VFilterBufferedProcessorImpl::processBitmap(JNIEnv* env, jobject bitmap)
     return result;
 }
 
+VFilterBufferedProcessorImpl::FileStatus VFilterBufferedProcessorImpl::processFilePath(
+    const char* inputPath, const std::function<const char*()>& outputPath) {
+    VCImage* nv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
+    VCImage* rgba = nullptr;
+    const char* out = nullptr;
+    FileStatus status = FILE_OK;
+    if (nv21 == nullptr || inputPath == nullptr || VCImage_loadFromFile(nv21, inputPath) != 0) {
+        status = FILE_LOAD_FAILED;
+    } else if ((rgba = VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA)) == nullptr) {
+        status = FILE_ALLOC_FAILED;
+    } else if (doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data) < 0) {
+        status = FILE_PROCESS_FAILED;
+    } else if ((out = outputPath()) == nullptr) {
+        status = FILE_NO_OUTPUT_PATH;
+    } else if (VCImage_saveToFile(rgba, out, kJpegQuality) != 0) {
+        status = FILE_SAVE_FAILED;
+    }
+    if (nv21 != nullptr) VCImage_destroy(nv21);
+    if (rgba != nullptr) VCImage_destroy(rgba);
+    return status;
+}
+
 void VFilterBufferedProcessorImpl::processFile(JNIEnv* env, jstring inputPath, jstring outputPath) {
     EglLog(VF_LOG_DEBUG, "%s",
            "virtual void VFilterBufferedProcessorImpl::processFile(JNIEnv*, jstring, jstring)");
@@ -172,25 +194,32 @@ void VFilterBufferedProcessorImpl::processFile(JNIEnv* env, jstring inputPath, j
         throwRuntime(env, "native_process_file: GetStringUTFChars(inputfile) failed");
         return;
     }
-    VCImage* nv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
-    VCImage* rgba = nullptr;
+    // The output path is unwrapped only once there is a picture to write.
     const char* out = nullptr;
-    if (nv21 == nullptr || VCImage_loadFromFile(nv21, in) != 0) {
-        throwRuntime(env, "native_process_file: VCImage_decodeFromJpeg(inputfile) failed");
-    } else if ((rgba = VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA)) == nullptr) {
-        throwRuntime(env, "native_process_file: Failed to allocate output");
-    } else if (doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data) < 0) {
-        throwRuntime(env, "native_process_file failed");
-    } else if ((out = env->GetStringUTFChars(outputPath, nullptr)) == nullptr) {
-        env->ExceptionClear();
-        throwRuntime(env, "native_process_file: GetStringUTFChars(outfile) failed");
-    } else {
-        VCImage_saveToFile(rgba, out, kJpegQuality);
-        env->ReleaseStringUTFChars(outputPath, out);
+    FileStatus status = processFilePath(in, [&]() {
+        out = env->GetStringUTFChars(outputPath, nullptr);
+        return out;
+    });
+    switch (status) {
+        case FILE_LOAD_FAILED:
+            throwRuntime(env, "native_process_file: VCImage_decodeFromJpeg(inputfile) failed");
+            break;
+        case FILE_ALLOC_FAILED:
+            throwRuntime(env, "native_process_file: Failed to allocate output");
+            break;
+        case FILE_PROCESS_FAILED:
+            throwRuntime(env, "native_process_file failed");
+            break;
+        case FILE_NO_OUTPUT_PATH:
+            env->ExceptionClear();
+            throwRuntime(env, "native_process_file: GetStringUTFChars(outfile) failed");
+            break;
+        case FILE_OK:
+        case FILE_SAVE_FAILED:  // not reported to Java
+            break;
     }
+    if (out != nullptr) env->ReleaseStringUTFChars(outputPath, out);
     env->ReleaseStringUTFChars(inputPath, in);
-    if (nv21 != nullptr) VCImage_destroy(nv21);
-    if (rgba != nullptr) VCImage_destroy(rgba);
 }
 
 jobject VFilterBufferedProcessorImpl::processImage(JNIEnv* env, jobject jpegBuffer, int size) {

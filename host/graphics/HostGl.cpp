@@ -29,6 +29,8 @@ const EGLint kConfigAttribs[] = {EGL_SURFACE_TYPE,
 const EGLint kContextAttribs[] = {EGL_CONTEXT_CLIENT_VERSION, 2, EGL_NONE};
 const EGLint kPbufferAttribs[] = {EGL_WIDTH, 1, EGL_HEIGHT, 1, EGL_NONE};
 
+std::atomic<void (*)()> gDisplayIdleHook{nullptr};
+
 }  // namespace
 
 HostGl& HostGl::get() {
@@ -48,6 +50,8 @@ HostGl::HostGl()
       mContext(EGL_NO_CONTEXT),
       mSurface(EGL_NO_SURFACE),
       mFramebuffer(0),
+      mCompilerResident(false),
+      mHeldDisplay(EGL_NO_DISPLAY),
       mCreateSync(nullptr),
       mClientWaitSync(nullptr),
       mDestroySync(nullptr) {}
@@ -90,11 +94,14 @@ bool HostGl::create_l() {
     if (extensions == nullptr || strstr(extensions, "EGL_KHR_fence_sync") == nullptr) {
         mCreateSync = nullptr;  // glFinish() orders instead
     }
+    mHeldDisplay = mDisplay;
     return true;
 }
 
 void HostGl::destroy_l() {
     if (mDisplay == EGL_NO_DISPLAY) return;
+    // Our own eglTerminate below must not look like another user leaving.
+    mHeldDisplay = EGL_NO_DISPLAY;
     if (mFramebuffer != 0 && mContext != EGL_NO_CONTEXT) {
         EGLDisplay display = eglGetCurrentDisplay();
         EGLContext context = eglGetCurrentContext();
@@ -110,6 +117,7 @@ void HostGl::destroy_l() {
         }
     }
     mFramebuffer = 0;
+    mCompilerResident = false;
     if (mSurface != EGL_NO_SURFACE) eglDestroySurface(mDisplay, mSurface);
     if (mContext != EGL_NO_CONTEXT) eglDestroyContext(mDisplay, mContext);
     // Drops this layer's reference; the display ends only with its last user.
@@ -151,6 +159,7 @@ bool HostGl::run(const std::function<bool()>& work) {
     }
     while (glGetError() != GL_NO_ERROR) {
     }
+    if (!mCompilerResident) holdCompiler_l();
     bool ok = work();
     // Uploads must land before the caller's context samples them.
     fenceCurrent(mDisplay);
@@ -167,9 +176,39 @@ bool HostGl::run(const std::function<bool()>& work) {
     return ok;
 }
 
+void HostGl::holdCompiler_l() {
+    // Mesa builds its GLSL built-in library for the first context that
+    // compiles and frees it when the last one calls glReleaseShaderCompiler.
+    // Pipelines that build a program per frame and release the compiler
+    // after it (as the hint invites) would rebuild it every time, a few
+    // milliseconds each; one compile here keeps it loaded while the host
+    // context lives, as a device driver keeps its compiler.
+    GLuint shader = glCreateShader(GL_FRAGMENT_SHADER);
+    if (shader != 0) {
+        static const char* kSource = "void main() { gl_FragColor = vec4(0.0); }";
+        glShaderSource(shader, 1, &kSource, nullptr);
+        glCompileShader(shader);
+        glDeleteShader(shader);
+    }
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    mCompilerResident = true;
+}
+
 GLuint HostGl::framebuffer_l() {
     if (mFramebuffer == 0) glGenFramebuffers(1, &mFramebuffer);
     return mFramebuffer;
+}
+
+void HostGl::setDisplayIdleHook(void (*hook)()) {
+    gDisplayIdleHook = hook;
+}
+
+void HostGl::onOneDisplayReferenceLeft(EGLDisplay display) {
+    // The reference left is this context's own.
+    if (display == EGL_NO_DISPLAY || mHeldDisplay.load() != display) return;
+    void (*hook)() = gDisplayIdleHook.load();
+    if (hook != nullptr) hook();
 }
 
 }  // namespace android
@@ -210,6 +249,18 @@ T nextSymbol(const char* name) {
 
 }  // namespace
 
+namespace android {
+
+bool HostGl::displayHasOtherUsers() const {
+    EGLDisplay display = mHeldDisplay.load();
+    if (display == EGL_NO_DISPLAY) return false;
+    std::lock_guard<std::mutex> guard(referencesLock());
+    auto found = references().find(display);
+    return found != references().end() && found->second > 1;
+}
+
+}  // namespace android
+
 extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* minor) {
     static const auto next =
         nextSymbol<EGLBoolean (*)(EGLDisplay, EGLint*, EGLint*)>("eglInitialize");
@@ -221,12 +272,17 @@ extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* m
 
 extern "C" EGLBoolean eglTerminate(EGLDisplay display) {
     static const auto next = nextSymbol<EGLBoolean (*)(EGLDisplay)>("eglTerminate");
-    std::lock_guard<std::mutex> guard(referencesLock());
-    auto found = references().find(display);
-    if (found != references().end() && found->second > 1) {
-        --found->second;
-        return EGL_TRUE;
+    int left = 0;
+    {
+        std::lock_guard<std::mutex> guard(referencesLock());
+        auto found = references().find(display);
+        if (found == references().end() || found->second <= 1) {
+            if (found != references().end()) references().erase(found);
+            return next(display);
+        }
+        left = --found->second;
     }
-    if (found != references().end()) references().erase(found);
-    return next(display);
+    // Outside the lock: letting the host context go terminates again.
+    if (left == 1) android::HostGl::get().onOneDisplayReferenceLeft(display);
+    return EGL_TRUE;
 }

@@ -5,6 +5,7 @@
 #ifndef KIV_HOST_GRAPHICS_HOSTGL_H
 #define KIV_HOST_GRAPHICS_HOSTGL_H
 
+#include <atomic>
 #include <functional>
 #include <mutex>
 
@@ -42,11 +43,24 @@ public:
     // Framebuffer of the context, for readbacks (made on first use, in run()).
     GLuint framebuffer_l();
 
+    // Called (on the terminating thread, no lock held) when every other user
+    // of the display this context lives on has terminated it, so that what
+    // the host layer keeps only for those users can be let go; the context
+    // then ends with its own last user, and the display with it.
+    static void setDisplayIdleHook(void (*hook)());
+    // From eglTerminate: `display` has one reference left.
+    void onOneDisplayReferenceLeft(EGLDisplay display);
+    // Whether anyone but this context holds the display it lives on (false
+    // when there is no context).
+    bool displayHasOtherUsers() const;
+
 private:
     HostGl();
     bool create_l();
     void destroy_l();
     void fenceCurrent(EGLDisplay display);
+    // With the context current: keeps the shader compiler loaded (see .cpp).
+    void holdCompiler_l();
 
     std::mutex mLock;
     int mUsers;
@@ -54,6 +68,10 @@ private:
     EGLContext mContext;
     EGLSurface mSurface;
     GLuint mFramebuffer;
+    bool mCompilerResident;
+    // The display this context holds a reference on, readable without the
+    // lock (eglTerminate is called under it).
+    std::atomic<EGLDisplay> mHeldDisplay;
     PFNEGLCREATESYNCKHRPROC mCreateSync;
     PFNEGLCLIENTWAITSYNCKHRPROC mClientWaitSync;
     PFNEGLDESTROYSYNCKHRPROC mDestroySync;

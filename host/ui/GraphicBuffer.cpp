@@ -2,6 +2,7 @@
 
 #include <stdlib.h>
 #include <string.h>
+#include <sys/mman.h>
 
 #include <memory>
 #include <vector>
@@ -89,6 +90,147 @@ std::unique_ptr<unsigned char[]> scratch(size_t bytes) {
     return std::unique_ptr<unsigned char[]>(new (std::nothrow) unsigned char[bytes]);
 }
 
+// Deletes a mirror and lets go of the host context user it held.
+void deleteMirror(GLuint texture) {
+    HostGl::get().run([texture] {
+        glDeleteTextures(1, &texture);
+        return true;
+    });
+    HostGl::get().release();
+}
+
+// The memory and mirror of a buffer that went away after GPU use.
+struct Recycled {
+    uint32_t fourcc = 0;
+    uint32_t width = 0;
+    uint32_t height = 0;
+    uint32_t stride = 0;
+    bool render = false;  // allocated for USAGE_HW_RENDER
+    unsigned char* data = nullptr;
+    GLuint texture = 0;
+    std::unique_ptr<unsigned char[]> rgbaScratch;
+
+    size_t bytes() const {
+        // The CPU copy, the mirror and the staging memory, if any.
+        size_t rgba = (size_t)width * height * 4;
+        return bytesOf(fourcc, height, stride) + rgba + (rgbaScratch != nullptr ? rgba : 0);
+    }
+    void free() {
+        if (texture != 0) deleteMirror(texture);
+        ::free(data);
+        texture = 0;
+        data = nullptr;
+    }
+};
+
+// A few recycled buffers, the most recent last. Fresh memory costs a page
+// fault per page and a new texture a fresh allocation in the driver: with
+// 12-megapixel pictures that is tens of milliseconds a buffer, against at
+// most zeroing it again for a recycled one.
+class Recycler {
+public:
+    static Recycler& get() {
+        // Never destroyed: buffers may go away in static destructors.
+        static Recycler* instance = new Recycler();
+        return *instance;
+    }
+
+    // Keeps `entry` (false when it cannot; the caller frees it). Only while
+    // someone else uses the display: the host context must not outlive its
+    // last user for the sake of buffers nobody may ask for again. (Checked
+    // under the lock, so an eglTerminate that drains cannot slip in between.)
+    bool keep(Recycled& entry) {
+        std::vector<Recycled> evicted;
+        bool kept = false;
+        {
+            std::lock_guard<std::mutex> guard(mLock);
+            size_t bytes = entry.bytes();
+            if (bytes <= kMaxBytes && HostGl::get().displayHasOtherUsers()) {
+                while (!mEntries.empty() &&
+                       (mEntries.size() >= kMaxEntries || mBytes + bytes > kMaxBytes)) {
+                    mBytes -= mEntries.front().bytes();
+                    evicted.push_back(std::move(mEntries.front()));
+                    mEntries.erase(mEntries.begin());
+                }
+                mBytes += bytes;
+                mEntries.push_back(std::move(entry));
+                kept = true;
+            }
+        }
+        for (Recycled& e : evicted) e.free();
+        return kept;
+    }
+
+    bool take(uint32_t fourcc, uint32_t w, uint32_t h, uint32_t stride, bool render,
+              Recycled* out) {
+        std::lock_guard<std::mutex> guard(mLock);
+        for (size_t i = mEntries.size(); i-- > 0;) {
+            Recycled& e = mEntries[i];
+            if (e.fourcc == fourcc && e.width == w && e.height == h && e.stride == stride &&
+                e.render == render) {
+                mBytes -= e.bytes();
+                *out = std::move(e);
+                mEntries.erase(mEntries.begin() + (ptrdiff_t)i);
+                return true;
+            }
+        }
+        return false;
+    }
+
+    // Frees everything kept (no lock held while freeing: that uses the host
+    // context and may end it).
+    static void drain() {
+        std::vector<Recycled> all;
+        {
+            Recycler& self = get();
+            std::lock_guard<std::mutex> guard(self.mLock);
+            all.swap(self.mEntries);
+            self.mBytes = 0;
+        }
+        for (Recycled& e : all) e.free();
+    }
+
+private:
+    Recycler() { HostGl::setDisplayIdleHook(&Recycler::drain); }
+
+    static constexpr size_t kMaxEntries = 4;
+    static constexpr size_t kMaxBytes = (size_t)384 << 20;
+
+    std::mutex mLock;
+    std::vector<Recycled> mEntries;
+    size_t mBytes = 0;
+};
+
+// At least `bytes` of read-only zeros: an untouched anonymous mapping, all of
+// it backed by the kernel's one zero page. Grown as needed, never freed; only
+// used in the host context (under its lock).
+const unsigned char* zeroPages_l(size_t bytes) {
+    static void* pages = nullptr;
+    static size_t size = 0;
+    if (bytes > size) {
+        if (pages != nullptr) munmap(pages, size);
+        pages = mmap(nullptr, bytes, PROT_READ, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+        size = pages == MAP_FAILED ? 0 : bytes;
+        if (pages == MAP_FAILED) pages = nullptr;
+    }
+    return static_cast<const unsigned char*>(pages);
+}
+
+// The RGBA colour an all-zero CPU copy of `fourcc` converts to.
+bool zeroColour(uint32_t fourcc, unsigned char rgba[4]) {
+    memset(rgba, 0, 4);
+    if (!isYuv(fourcc)) return true;
+    unsigned char zeros[2 * 2 * 2] = {};  // a 2x2 picture of any 4:2:0 layout
+    unsigned char out[2 * 2 * 4];
+    VCImage* in = VCImage_createWrap(zeros, 2, 2, fourcc, 0, 0);
+    VCImage* converted = VCImage_createWrap(out, 2, 2, VC_FORMAT_RGBA, 0, 0);
+    bool ok = in != nullptr && converted != nullptr && VCImage_convert(in, converted) == 0;
+    VCImage_destroy(in);
+    VCImage_destroy(converted);
+    if (ok) memcpy(rgba, out, 4);
+    return ok;
+}
+
 }  // namespace
 
 GraphicBuffer::GraphicBuffer()
@@ -99,6 +241,10 @@ GraphicBuffer::GraphicBuffer()
       mDataSize(0),
       mLockUsage(0),
       mMirrorTexture(0),
+      mSpareTexture(0),
+      mZeroContent(true),
+      mZeroPending(false),
+      mSpareMatches(false),
       mImageCount(0),
       mGpuDirty(false),
       mUploadCount(0),
@@ -145,7 +291,23 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
         return;
     }
     mDataSize = bytesOf(mFourcc, h, inStride);
-    mData = static_cast<unsigned char*>(calloc(1, mDataSize));
+    Recycled recycled;
+    bool render = (inUsage & USAGE_HW_RENDER) != 0;
+    if ((inUsage & USAGE_HW_MASK) != 0 &&
+        Recycler::get().take(mFourcc, w, h, inStride, render, &recycled)) {
+        mData = recycled.data;
+        mSpareTexture = recycled.texture;
+        mRgbaScratch = std::move(recycled.rgbaScratch);
+        // What the GPU renders into starts clean, so that nothing drawn for
+        // one buffer ever shows in another. A texture-only buffer keeps the
+        // bytes it gets, and its mirror (their upload) with them, until the
+        // CPU writes it: a new buffer's contents are undefined on a device too.
+        mZeroPending = render;
+        mZeroContent = render;
+        mSpareMatches = !render;
+    } else {
+        mData = static_cast<unsigned char*>(calloc(1, mDataSize));
+    }
     if (mData == nullptr) {
         mInitCheck = NO_MEMORY;
         return;
@@ -154,14 +316,23 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
 }
 
 GraphicBuffer::~GraphicBuffer() {
-    if (mMirrorTexture != 0) {
-        GLuint texture = mMirrorTexture;
-        HostGl::get().run([texture] {
-            glDeleteTextures(1, &texture);
-            return true;
-        });
-        HostGl::get().release();
+    GLuint texture = mMirrorTexture != 0 ? mMirrorTexture : mSpareTexture;
+    // Kept only when the mirror holds the CPU copy's last unlocked state.
+    if (texture != 0 && mData != nullptr && mLockUsage == 0) {
+        Recycled entry;
+        entry.render = (usage & USAGE_HW_RENDER) != 0;
+        entry.fourcc = mFourcc;
+        entry.width = (uint32_t)width;
+        entry.height = (uint32_t)height;
+        entry.stride = (uint32_t)stride;
+        entry.data = mData;
+        entry.texture = texture;
+        entry.rgbaScratch = std::move(mRgbaScratch);
+        if (Recycler::get().keep(entry)) return;
+        entry.free();
+        return;
     }
+    if (texture != 0) deleteMirror(texture);
     free(mData);
 }
 
@@ -188,8 +359,17 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
     if ((inUsage & USAGE_SOFTWARE_MASK) == 0) return BAD_VALUE;
     if (mLockUsage != 0) return INVALID_OPERATION;
     // GPU rendering into the mirror reaches the CPU copy here.
-    if (mMirrorTexture != 0 && (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty)) {
+    bool readback =
+        mMirrorTexture != 0 && (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty);
+    // Recycled memory gets its zeros unless the readback fills every byte.
+    if (mZeroPending && !(readback && stride == width)) {
+        memset(mData, 0, mDataSize);
+        mZeroPending = false;
+    }
+    if (readback) {
         if (!readback_l()) return UNKNOWN_ERROR;
+        mZeroPending = false;
+        mZeroContent = false;
         // Kept to spot an unchanged copy at unlock: sending it back up would
         // cost a transfer, and for YUV would replace the rendered RGBA with a
         // converted round trip of it.
@@ -198,6 +378,7 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
         }
         mGpuDirty = false;
     }
+    if ((inUsage & USAGE_SW_WRITE_MASK) != 0) mZeroContent = false;
     mLockUsage = inUsage;
     return NO_ERROR;
 }
@@ -331,42 +512,88 @@ const unsigned char* GraphicBuffer::rgbaForUpload_l() {
     return rgba;
 }
 
-bool GraphicBuffer::ensureMirror_l() {
-    if (mMirrorTexture != 0) return true;
-    if (!HostGl::get().acquire()) return false;
-    const unsigned char* rgba = rgbaForUpload_l();
-    if (rgba == nullptr) {
-        HostGl::get().release();
-        return false;
-    }
-    GLuint texture = 0;
-    bool ok = HostGl::get().run([&] {
-        glGenTextures(1, &texture);
-        glBindTexture(GL_TEXTURE_2D, texture);
-        // Level 0 only: the texture must be complete to become an EGL image.
-        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
-        glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
-        glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE,
-                     rgba);
-        glBindTexture(GL_TEXTURE_2D, 0);
-        GLenum error = glGetError();
-        if (error != GL_NO_ERROR) {
-            VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed (0x%04x)", width,
-                      height, error);
-            glDeleteTextures(1, &texture);
+bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
+    HostGl& gl = HostGl::get();
+    if (mMirrorTexture != 0) return gl.run(then);
+    // A recycled mirror already counts as a user of the host context.
+    GLuint texture = mSpareTexture;
+    if (texture == 0 && !gl.acquire()) return false;
+    // A recycled mirror may already hold the CPU copy; an untouched buffer
+    // needs no conversion: its mirror gets what zeros convert to.
+    const bool matches = texture != 0 && mSpareMatches;
+    const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
+    bool made = false;
+    bool ok = (matches || mZeroContent || rgba != nullptr) && gl.run([&] {
+        bool fresh = texture == 0;
+        if (fresh) {
+            glGenTextures(1, &texture);
+            glBindTexture(GL_TEXTURE_2D, texture);
+            // Level 0 only: the texture must be complete to become an EGL image.
+            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+            glBindTexture(GL_TEXTURE_2D, 0);
+        }
+        made = (matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
+                                            : zeroMirror_l(texture, fresh))) &&
+               glGetError() == GL_NO_ERROR;
+        if (!made) {
+            VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed", width, height);
+            if (fresh) glDeleteTextures(1, &texture);
             return false;
         }
-        return true;
+        mMirrorTexture = texture;
+        mSpareTexture = 0;
+        return then();
     });
-    if (!ok) {
-        HostGl::get().release();
-        return false;
+    // A recycled mirror that could not be filled stays with the buffer (and
+    // its user with it).
+    if (!made && mSpareTexture == 0) gl.release();
+    return ok;
+}
+
+bool GraphicBuffer::fillMirror_l(unsigned int texture, const unsigned char* rgba, bool fresh) {
+    glBindTexture(GL_TEXTURE_2D, texture);
+    glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
+    if (fresh) {
+        glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE, rgba);
+    } else {
+        glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, rgba);
     }
-    mMirrorTexture = texture;
+    glBindTexture(GL_TEXTURE_2D, 0);
     return true;
+}
+
+bool GraphicBuffer::zeroMirror_l(unsigned int texture, bool fresh) {
+    // RGBA zeros come from untouched pages (one shared physical page, so the
+    // upload costs only its writes); YUV zeros convert to a colour, cleared.
+    const unsigned char* zeros = isYuv(mFourcc) ? nullptr : zeroPages_l((size_t)width * height * 4);
+    if (zeros != nullptr) return fillMirror_l(texture, zeros, fresh);
+    if (fresh) {
+        glBindTexture(GL_TEXTURE_2D, texture);
+        glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, width, height, 0, GL_RGBA, GL_UNSIGNED_BYTE,
+                     nullptr);
+        glBindTexture(GL_TEXTURE_2D, 0);
+    }
+    return clearMirror_l(texture);
+}
+
+bool GraphicBuffer::clearMirror_l(unsigned int texture) {
+    unsigned char colour[4];
+    if (!zeroColour(mFourcc, colour)) return false;
+    HostGl& gl = HostGl::get();
+    glBindFramebuffer(GL_FRAMEBUFFER, gl.framebuffer_l());
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, texture, 0);
+    bool complete = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+    if (complete) {
+        glClearColor(colour[0] / 255.0f, colour[1] / 255.0f, colour[2] / 255.0f,
+                     colour[3] / 255.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+    }
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, 0, 0);
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    return complete;
 }
 
 bool GraphicBuffer::upload_l() {
@@ -376,8 +603,7 @@ bool GraphicBuffer::upload_l() {
     bool ok = HostGl::get().run([&] {
         glBindTexture(GL_TEXTURE_2D, texture);
         glPixelStorei(GL_UNPACK_ALIGNMENT, 4);
-        glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE,
-                        rgba);
+        glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, width, height, GL_RGBA, GL_UNSIGNED_BYTE, rgba);
         glBindTexture(GL_TEXTURE_2D, 0);
         return glGetError() == GL_NO_ERROR;
     });
@@ -413,21 +639,21 @@ bool GraphicBuffer::readback_l() {
 
 EGLImageKHR GraphicBuffer::createEglImage(EGLDisplay display) {
     std::lock_guard<std::mutex> guard(mLock);
-    if (mInitCheck != NO_ERROR || !ensureMirror_l()) return EGL_NO_IMAGE_KHR;
+    if (mInitCheck != NO_ERROR) return EGL_NO_IMAGE_KHR;
     HostGl& gl = HostGl::get();
-    if (display != gl.display()) {
-        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: EGL image asked for another display");
-        return EGL_NO_IMAGE_KHR;
-    }
     static const auto createImage =
         (PFNEGLCREATEIMAGEKHRPROC)eglGetProcAddress("eglCreateImageKHR");
     const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_IMAGE_PRESERVED_KHR, EGL_TRUE,
                               EGL_NONE};
     EGLImageKHR image = EGL_NO_IMAGE_KHR;
-    GLuint texture = mMirrorTexture;
-    gl.run([&] {
+    // One visit to the host context makes the mirror (if needed) and the image.
+    ensureMirror_l([&] {
+        if (display != gl.display()) {
+            VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: EGL image asked for another display");
+            return false;
+        }
         image = createImage(gl.display(), gl.context(), EGL_GL_TEXTURE_2D_KHR,
-                            (EGLClientBuffer)(uintptr_t)texture, attribs);
+                            (EGLClientBuffer)(uintptr_t)mMirrorTexture, attribs);
         return image != EGL_NO_IMAGE_KHR;
     });
     if (image != EGL_NO_IMAGE_KHR) ++mImageCount;

@@ -16,12 +16,22 @@
 //    CPU leaves the read-back pixels unchanged, its unlock sends nothing up.
 // Texture-only buffers never read back: their CPU copy is the original and
 // a YUV->RGBA->YUV round trip would lose precision.
+//
+// Like a device allocator, the host keeps the memory and mirror of a few
+// buffers that went away after GPU use and hands them to new buffers of the
+// same layout and kind, which skip fresh pages and a new texture. A recycled
+// render target (USAGE_HW_RENDER) reads as zeros on both sides, as a new
+// buffer does; a recycled texture-only buffer holds the bytes it came with
+// (its mirror matching them) until the CPU writes it, as contents of a new
+// buffer are undefined on a device. What is kept is let go when the last
+// other user of the display terminates it.
 #ifndef KIV_HOST_UI_GRAPHICBUFFER_H
 #define KIV_HOST_UI_GRAPHICBUFFER_H
 
 #include <stdint.h>
 
 #include <atomic>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -124,7 +134,11 @@ protected:
 private:
     void init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage, uint32_t inStride);
     status_t lockCommon_l(uint32_t inUsage);
-    bool ensureMirror_l();
+    // Makes the mirror if there is none yet, then runs `then` in the host
+    // context (the same visit). False when either fails.
+    bool ensureMirror_l(const std::function<bool()>& then);
+    bool fillMirror_l(unsigned int texture, const unsigned char* rgba, bool fresh);
+    bool zeroMirror_l(unsigned int texture, bool fresh);
     bool upload_l();
     bool readback_l();
     bool toRgba_l(unsigned char* rgba) const;
@@ -135,6 +149,8 @@ private:
     // staging memory; null on failure.
     const unsigned char* rgbaForUpload_l();
     bool fromRgba_l(const unsigned char* rgba);
+    // Clears the mirror to what an all-zero CPU copy converts to.
+    bool clearMirror_l(unsigned int texture);
 
     static void incRef(android_native_base_t* base);
     static void decRef(android_native_base_t* base);
@@ -148,6 +164,17 @@ private:
     std::mutex mLock;
     uint32_t mLockUsage;          // 0 when not locked
     unsigned int mMirrorTexture;  // GL name in the host graphics context, 0 when none
+    // A recycled mirror that becomes mMirrorTexture on first GPU use; like
+    // the mirror, it holds a user of the host graphics context.
+    unsigned int mSpareTexture;
+    // The CPU copy reads as zeros as far as anyone can tell (nothing was
+    // written or read back since the allocation)...
+    bool mZeroContent;
+    // ...though for recycled memory the zeros are still to be written, at the
+    // first lock that does not fill the copy itself.
+    bool mZeroPending;
+    // mSpareTexture already holds the CPU copy (a recycled texture-only buffer).
+    bool mSpareMatches;
     int mImageCount;
     bool mGpuDirty;
     // The CPU copy as the last readback left it, while that lock is held: an

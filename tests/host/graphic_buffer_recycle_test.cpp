@@ -1,0 +1,143 @@
+// Host GraphicBuffers that went away after GPU use are recycled: a new buffer
+// of the same layout and kind takes the old memory and mirror. A render target
+// still reads as a new one (zeros on the CPU, what zeros convert to on the
+// GPU); a texture-only buffer's mirror matches the bytes it came with. What is
+// kept goes with the display's last other user.
+#include <ui/GraphicBuffer.h>
+
+#include <gtest/gtest.h>
+
+#include <vector>
+
+#include "core/egl/EglEnvironment.h"
+#include "core/egl/EglNativeSeam.h"
+#include "support/gl_context.h"
+
+using android::GraphicBuffer;
+using android::sp;
+
+namespace {
+
+const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
+const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
+const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
+const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
+
+// The buffer as the GPU sees it through an EGL image (row 0 first), or empty.
+std::vector<uint8_t> gpuPixels(EGLDisplay display, const sp<GraphicBuffer>& buffer) {
+    std::vector<uint8_t> pixels;
+    EGLImageKHR image = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
+    if (image == EGL_NO_IMAGE_KHR) return pixels;
+    auto target = reinterpret_cast<PFNGLEGLIMAGETARGETRENDERBUFFERSTORAGEOESPROC>(
+        eglGetProcAddress("glEGLImageTargetRenderbufferStorageOES"));
+    GLuint renderbuffer = 0, framebuffer = 0;
+    glGenRenderbuffers(1, &renderbuffer);
+    glBindRenderbuffer(GL_RENDERBUFFER, renderbuffer);
+    target(GL_RENDERBUFFER, static_cast<GLeglImageOES>(image));
+    glGenFramebuffers(1, &framebuffer);
+    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer);
+    glFramebufferRenderbuffer(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER, renderbuffer);
+    if (glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE) {
+        pixels = GlTest_readPixels(buffer->getWidth(), buffer->getHeight());
+    }
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    glDeleteFramebuffers(1, &framebuffer);
+    glDeleteRenderbuffers(1, &renderbuffer);
+    EglNativeSeam::get().destroyImage(display, image);
+    return pixels;
+}
+
+size_t bytesOf(int w, int h, int format) {
+    return format == HAL_PIXEL_FORMAT_RGBA_8888 ? size_t(w) * h * 4 : size_t(w) * h * 3 / 2;
+}
+
+// A buffer that held a picture on both sides, then went away; returns where
+// its CPU pixels were.
+const void* useAndDrop(EGLDisplay display, int w, int h, int format,
+                       uint32_t usage = kRenderUsage) {
+    sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, format, usage);
+    void* pixels = nullptr;
+    EXPECT_EQ(buffer->lock(kWrite, &pixels), android::NO_ERROR);
+    memset(pixels, 0x5A, bytesOf(w, h, format));
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_FALSE(gpuPixels(display, buffer).empty());
+    return pixels;
+}
+
+class GraphicBufferRecycleTest : public GlContextTest {
+protected:
+    EGLDisplay display() { return mGl->env()->getEGLDisplay(); }
+};
+
+TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
+    const int w = 8, h = 6;
+    // Zeros as the GPU sees them: RGBA as is; NV21 Y=U=V=0 in full range is
+    // R = 0 + 1.402 * -128 -> 0, G = 0.34414 * 128 + 0.71414 * 128 -> 135,
+    // B = 1.772 * -128 -> 0, opaque.
+    const struct {
+        int format;
+        uint8_t zero[4];
+    } cases[] = {{HAL_PIXEL_FORMAT_RGBA_8888, {0, 0, 0, 0}},
+                 {HAL_PIXEL_FORMAT_YCrCb_420_SP, {0, 135, 0, 255}}};
+    for (const auto& c : cases) {
+        const void* old = useAndDrop(display(), w, h, c.format);
+        sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, c.format, kRenderUsage);
+        void* pixels = nullptr;
+        ASSERT_EQ(buffer->lock(kRead, &pixels), android::NO_ERROR);
+        EXPECT_EQ(pixels, old) << c.format;  // the memory was recycled...
+        size_t bytes = bytesOf(w, h, c.format);
+        const uint8_t* p = static_cast<const uint8_t*>(pixels);
+        EXPECT_EQ(std::vector<uint8_t>(p, p + bytes), std::vector<uint8_t>(bytes, 0)) << c.format;
+        ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+        std::vector<uint8_t> expected;
+        for (int i = 0; i < w * h; ++i) expected.insert(expected.end(), c.zero, c.zero + 4);
+        EXPECT_EQ(gpuPixels(display(), buffer), expected) << c.format;  // ...and its mirror
+    }
+    // GPU side first: a render target's first lock reads the zeroed mirror
+    // back; a texture-only buffer's memory is not handed to it.
+    useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
+    useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
+    void* pixels = nullptr;
+    ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
+    const uint8_t* p = static_cast<const uint8_t*>(pixels);
+    EXPECT_EQ(std::vector<uint8_t>(p, p + w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
+    EXPECT_EQ(target->getReadbackCount(), 1u);
+    ASSERT_EQ(target->unlock(), android::NO_ERROR);
+
+    // The texture-only memory goes to a texture-only buffer, mirror and all.
+    sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    ASSERT_EQ(source->lock(kRead, &pixels), android::NO_ERROR);
+    p = static_cast<const uint8_t*>(pixels);
+    std::vector<uint8_t> cpu(p, p + w * h * 4);
+    ASSERT_EQ(source->unlock(), android::NO_ERROR);
+    EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
+    EXPECT_EQ(gpuPixels(display(), source), cpu);
+    EXPECT_EQ(source->getUploadCount(), 0u);
+}
+
+TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {
+    GlContext gl;
+    ASSERT_TRUE(gl.ok());
+    EGLDisplay display = gl.env()->getEGLDisplay();
+    useAndDrop(display, 4, 4, HAL_PIXEL_FORMAT_RGBA_8888);
+    // The kept buffer holds the host context and its display reference...
+    EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);
+    gl.release();
+    // ...until the environment's eglTerminate: then both go, and the display ends.
+    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
+
+    // A buffer that outlives every other user of the display is not kept.
+    GlContext again;
+    ASSERT_TRUE(again.ok());
+    display = again.env()->getEGLDisplay();
+    sp<GraphicBuffer> late = new GraphicBuffer(4, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    EXPECT_FALSE(gpuPixels(display, late).empty());
+    again.release();
+    EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);  // the live buffer's mirror
+    late.clear();
+    EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
+}
+
+}  // namespace
