@@ -99,12 +99,6 @@ EglImage::EglImage(const android::sp<EglEnvironment>& env, IMAGE_TYPE type, int 
 
 EglImage::~EglImage() {}
 
-void EglImage::reuseGraphicBuffer(const android::sp<GraphicBuffer>& buffer) {
-    if (!mInitialized && (mType == IMAGE_EXTERNAL || mType == IMAGE_EXTERNAL_FRAMEBUFFER)) {
-        mGraphicBuffer = buffer;
-    }
-}
-
 int EglImage::onDrawFrame() {
     return 0;
 }
@@ -180,23 +174,15 @@ int EglImage::initializeGraphicBuffer_l() {
     }
 
     uint32_t usage = usageOf(mType);
-    bool fits = mGraphicBuffer != nullptr && mGraphicBuffer->getWidth() == (uint32_t)mWidth &&
-                mGraphicBuffer->getHeight() == (uint32_t)mHeight &&
-                mGraphicBuffer->getPixelFormat() == pixelFormat &&
-                mGraphicBuffer->getUsage() == usage;
-    if (!fits) {
-        EglLog(VF_LOG_DEBUG,
-               "EglImage: Creating GraphicBuffer %dx%d %4.4s (format %d, usage 0x%08x)", mWidth,
-               mHeight, (const char*)&format, pixelFormat, usage);
-        mGraphicBuffer =
-            new GraphicBuffer((uint32_t)mWidth, (uint32_t)mHeight, pixelFormat, usage, "EglImage");
-        android::status_t status = mGraphicBuffer->initCheck();
-        if (status != android::NO_ERROR) {
-            EglLog(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: %s.",
-                   strerror(-status));
-            mGraphicBuffer.clear();
-            return VC_REPORT(VC_ERROR_ALLOC_FAILED);
-        }
+    EglLog(VF_LOG_DEBUG, "EglImage: Creating GraphicBuffer %dx%d %4.4s (format %d, usage 0x%08x)",
+           mWidth, mHeight, (const char*)&format, pixelFormat, usage);
+    mGraphicBuffer =
+        new GraphicBuffer((uint32_t)mWidth, (uint32_t)mHeight, pixelFormat, usage, "EglImage");
+    android::status_t status = mGraphicBuffer->initCheck();
+    if (status != android::NO_ERROR) {
+        EglLog(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: %s.", strerror(-status));
+        mGraphicBuffer.clear();
+        return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     }
 
     EGLDisplay display = mEglEnv->getEGLDisplay();

@@ -55,10 +55,6 @@ public:
     // GraphicBuffer, in the CPU's view of it).
     int flushCache();
     GLuint getTextureID() const { return mTexture; }
-    // Before initialize(): the GraphicBuffer types take `buffer` (a previous
-    // image's, whose pixels are then kept) instead of allocating one, when its
-    // size, format and usage are the ones this image needs.
-    void reuseGraphicBuffer(const android::sp<android::GraphicBuffer>& buffer);
 
     // Nearest-neighbour resize of a compact image in the buffer's YUV format.
     void doTransformResizeYUV(unsigned char* dst, int dstWidth, int dstHeight, unsigned char* src,
