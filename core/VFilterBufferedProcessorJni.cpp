@@ -45,8 +45,10 @@ jintArray VFilterBufferedProcessorImpl::processBuffer(JNIEnv* env, jintArray inp
     jsize length = env->GetArrayLength(input);
     jint* elements = env->GetIntArrayElements(input, nullptr);
     jintArray result = env->NewIntArray(length);
+    // Zeroed: a call whose read-back fails still returns 0, and its result
+    // must not carry leftover heap contents into Java.
     unsigned char* scratch =
-        static_cast<unsigned char*>(malloc(VCImage_requiredSize(width, height, VC_FORMAT_BGRA)));
+        static_cast<unsigned char*>(calloc(VCImage_requiredSize(width, height, VC_FORMAT_BGRA), 1));
     if (elements == nullptr || result == nullptr || scratch == nullptr) {
         // The JVM has an OutOfMemoryError pending for the failed one.
         if (elements != nullptr) env->ReleaseIntArrayElements(input, elements, 0);
@@ -103,7 +105,7 @@ jobject VFilterBufferedProcessorImpl::processBitmap(JNIEnv* env, jobject bitmap)
         return nullptr;
     }
     const size_t bytes = VCImage_requiredSize(width, height, VC_FORMAT_RGBA);
-    unsigned char* scratch = static_cast<unsigned char*>(malloc(bytes));
+    unsigned char* scratch = static_cast<unsigned char*>(calloc(bytes, 1));  // zeroed, as above
     int status = scratch == nullptr
                      ? VC_ERROR_ALLOC_FAILED
                      : doProcessRGBA(static_cast<const unsigned char*>(pixels), width, height,

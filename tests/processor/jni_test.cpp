@@ -247,7 +247,7 @@ TEST_F(JniProcessorTest, ProcessBitmapOddCasesLogAndReturnNull) {
 
 TEST_F(JniProcessorTest, FailuresInsideTheDrawAndOfTheInputBitmap) {
     // A picture that cannot be read back is no Java failure: the array comes
-    // back (with what the scratch buffer held) and only the log tells.
+    // back blank (never leftover heap bytes) and only the log tells.
     {
         LogCapture log;
         GlFault_failPictureReads(1);
@@ -256,6 +256,9 @@ TEST_F(JniProcessorTest, FailuresInsideTheDrawAndOfTheInputBitmap) {
         EXPECT_EQ("", KivTestJvm_takeException(mEnv));
         ASSERT_NE(nullptr, result);
         EXPECT_EQ(16, mEnv->GetArrayLength(result));
+        jint values[16];
+        mEnv->GetIntArrayRegion(result, 0, 16, values);
+        for (jint v : values) EXPECT_EQ(0, v);
         EXPECT_TRUE(log.contains(4, "EGL: Can't access this FBO's pixels"));
     }
     // A recycled bitmap has no pixels to lock: logged, null, no exception.
