@@ -37,6 +37,8 @@ struct Avx2 {
             static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm256_add_epi16(a, b); }
+    static V max16(V a, V b) { return _mm256_max_epi16(a, b); }
+    static V mullo16(V a, V b) { return _mm256_mullo_epi16(a, b); }
     static V sub16(V a, V b) { return _mm256_sub_epi16(a, b); }
     static V add32(V a, V b) { return _mm256_add_epi32(a, b); }
     static V and_(V a, V b) { return _mm256_and_si256(a, b); }
@@ -86,8 +88,6 @@ struct Avx2 {
     static V madd16(V a, V b) { return _mm256_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm256_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }
-    static V unpacklo8(V a, V b) { return _mm256_unpacklo_epi8(a, b); }
-    static V unpackhi8(V a, V b) { return _mm256_unpackhi_epi8(a, b); }
     // The two lane-wise packs leave 4-byte groups in the order 0 2 4 6 1 3 5 7.
     static V fixPackOrder(V v) {
         return _mm256_permutevar8x32_epi32(v, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));

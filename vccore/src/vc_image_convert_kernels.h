@@ -63,14 +63,16 @@ struct Kernels {
         V rPos, rNeg, gPos, gNeg, bPos, bNeg;
     };
 
-    // Word offsets (one per pair) to the two byte vectors: the unsigned
-    // saturation of the pack keeps the positive part of off and of -off,
-    // and unpacking a vector with itself gives every pixel of a pair its
-    // pair's byte.
+    // Word offsets (one per pair) to the two byte vectors; multiplying a
+    // byte value by 0x0101 copies it into both bytes of its word. (Packing
+    // off with -off and unpacking does the same in as many instructions, but
+    // all of them on the shuffle unit the row stores already keep busy:
+    // 2-3% slower at 1080p.)
     static inline void splitOffsets(V off, V* pos, V* neg) {
-        const V both = T::packus16(off, T::sub16(T::zero(), off));
-        *pos = T::unpacklo8(both, both);
-        *neg = T::unpackhi8(both, both);
+        const V p = T::max16(off, T::zero());
+        const V both = T::set1_16(0x0101);
+        *pos = T::mullo16(p, both);
+        *neg = T::mullo16(T::sub16(p, off), both);
     }
 
     // c: kBytes interleaved chroma bytes in store order, U first unless kVU.

@@ -42,6 +42,8 @@ struct Neon {
         return b(vdupq_n_u32((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V c) { return b(vaddq_s16(s16(a), s16(c))); }
+    static V max16(V a, V c) { return b(vmaxq_s16(s16(a), s16(c))); }
+    static V mullo16(V a, V c) { return b(vmulq_s16(s16(a), s16(c))); }
     static V sub16(V a, V c) { return b(vsubq_s16(s16(a), s16(c))); }
     static V add32(V a, V c) { return b(vaddq_s32(s32(a), s32(c))); }
     static V and_(V a, V c) { return vandq_u8(a, c); }
@@ -104,8 +106,6 @@ struct Neon {
     }
     static V packs32(V a, V c) { return b(vcombine_s16(vqmovn_s32(s32(a)), vqmovn_s32(s32(c)))); }
     static V packus16(V a, V c) { return vcombine_u8(vqmovun_s16(s16(a)), vqmovun_s16(s16(c))); }
-    static V unpacklo8(V a, V c) { return vzip1q_u8(a, c); }
-    static V unpackhi8(V a, V c) { return vzip2q_u8(a, c); }
     static V fixPackOrder(V v) { return v; }
     // kBytes / 2 U bytes and as many V bytes, interleaved U, V, U, V …
     static V interleave(const uint8_t* u, const uint8_t* v) {

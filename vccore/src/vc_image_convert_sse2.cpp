@@ -31,6 +31,8 @@ struct Sse2 {
             static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm_add_epi16(a, b); }
+    static V max16(V a, V b) { return _mm_max_epi16(a, b); }
+    static V mullo16(V a, V b) { return _mm_mullo_epi16(a, b); }
     static V sub16(V a, V b) { return _mm_sub_epi16(a, b); }
     static V add32(V a, V b) { return _mm_add_epi32(a, b); }
     static V and_(V a, V b) { return _mm_and_si128(a, b); }
@@ -97,8 +99,6 @@ struct Sse2 {
     static V madd16(V a, V b) { return _mm_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm_packus_epi16(a, b); }
-    static V unpacklo8(V a, V b) { return _mm_unpacklo_epi8(a, b); }
-    static V unpackhi8(V a, V b) { return _mm_unpackhi_epi8(a, b); }
     static V fixPackOrder(V v) { return v; }
     // kBytes / 2 U bytes and as many V bytes, interleaved U, V, U, V …
     static V interleave(const uint8_t* u, const uint8_t* v) {
