@@ -3,6 +3,7 @@
 #if defined(__x86_64__)
 #include <immintrin.h>
 #include <stddef.h>
+#include <string.h>
 
 #include "vc_image_convert_fast.h"
 #include "vc_image_layout.h"
@@ -13,18 +14,14 @@ struct Avx2 {
     using V = __m256i;
     static V zero() { return _mm256_setzero_si256(); }
     static V load(const uint8_t* p) { return _mm256_loadu_si256(reinterpret_cast<const V*>(p)); }
-    // Streaming stores go out as two aligned halves: heap blocks are only
-    // 16-byte aligned.
+    // The kernels stream only to 64-byte-aligned lines.
     template <bool kStream = false>
     static void store(uint8_t* p, V v) {
-        if (kStream) {
-            _mm_stream_si128(reinterpret_cast<__m128i*>(p), _mm256_castsi256_si128(v));
-            _mm_stream_si128(reinterpret_cast<__m128i*>(p + 16), _mm256_extracti128_si256(v, 1));
-        } else {
+        if (kStream)
+            _mm256_stream_si256(reinterpret_cast<V*>(p), v);
+        else
             _mm256_storeu_si256(reinterpret_cast<V*>(p), v);
-        }
     }
-    static bool streamable(const uint8_t* p) { return (reinterpret_cast<uintptr_t>(p) & 15) == 0; }
     static void fence() { _mm_sfence(); }
     static void storeHalf(uint8_t* p, V v) {
         // Quadwords 0 and 2 hold the bytes of the two 128-bit lanes.
@@ -32,6 +29,7 @@ struct Avx2 {
                          _mm256_castsi256_si128(_mm256_permute4x64_epi64(v, 0x08)));
     }
     static V set1_8(int v) { return _mm256_set1_epi8(static_cast<char>(v)); }
+    static V pair8(int lo, int hi) { return _mm256_set1_epi16(static_cast<short>(hi << 8 | lo)); }
     static V set1_16(int v) { return _mm256_set1_epi16(static_cast<short>(v)); }
     static V set1_32(int v) { return _mm256_set1_epi32(v); }
     static V pair16(int lo, int hi) {
@@ -39,13 +37,16 @@ struct Avx2 {
             static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm256_add_epi16(a, b); }
+    static V max16(V a, V b) { return _mm256_max_epi16(a, b); }
+    static V mullo16(V a, V b) { return _mm256_mullo_epi16(a, b); }
     static V sub16(V a, V b) { return _mm256_sub_epi16(a, b); }
     static V add32(V a, V b) { return _mm256_add_epi32(a, b); }
-    static V sub32(V a, V b) { return _mm256_sub_epi32(a, b); }
     static V and_(V a, V b) { return _mm256_and_si256(a, b); }
-    static V or_(V a, V b) { return _mm256_or_si256(a, b); }
-    static V srai32(V a, int n) { return _mm256_srai_epi32(a, n); }
-    static V slli32(V a, int n) { return _mm256_slli_epi32(a, n); }
+    static V xor_(V a, V b) { return _mm256_xor_si256(a, b); }
+    static V srai16(V a, int n) { return _mm256_srai_epi16(a, n); }
+    // Unsigned bytes of a times signed bytes of b, adjacent products summed
+    // into words (saturating, which the kernels' sums never need).
+    static V maddubs(V a, V b) { return _mm256_maddubs_epi16(a, b); }
     static V slli16(V a, int n) { return _mm256_slli_epi16(a, n); }
     static V srli32(V a, int n) { return _mm256_srli_epi32(a, n); }
     // Byte moves inside every 4-byte pixel: one byte shuffle.
@@ -58,21 +59,26 @@ struct Avx2 {
     }
     static V shuffle(V p, const Shuffle& s) { return _mm256_shuffle_epi8(p, s); }
     static V srli16(V a, int n) { return _mm256_srli_epi16(a, n); }
-    static V min16(V a, V b) { return _mm256_min_epi16(a, b); }
-    static V max16(V a, V b) { return _mm256_max_epi16(a, b); }
-    static V combineEven(V a, V b) { return _mm256_blend_epi32(a, _mm256_slli_epi64(b, 32), 0xAA); }
-    // Words of four 8-pixel vectors a..d, lane 0: a0 b0 a2 b2 c0 d0 c2 d2,
-    // lane 1: a4 b4 a6 b6 c4 d4 c6 d6, to pixel order.
-    static V pairOrder(V w) {
-        const V grouped = _mm256_shufflehi_epi16(_mm256_shufflelo_epi16(w, 0xD8), 0xD8);
-        return _mm256_permutevar8x32_epi32(grouped, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));
+    // Dwords 0 and 2 of every 128-bit lane of a, then those of b.
+    static V evenPixels(V a, V b) {
+        return _mm256_castps_si256(
+            _mm256_shuffle_ps(_mm256_castsi256_ps(a), _mm256_castsi256_ps(b), 0x88));
+    }
+    // Bytes I and J of every 4-byte group as its two words.
+    template <int I, int J>
+    static V words(V p) {
+        if (I == 0 && J == 2) return _mm256_and_si256(p, _mm256_set1_epi32(0x00ff00ff));
+        if (I == 1 && J == 3) return _mm256_srli_epi16(p, 8);
+        return _mm256_shuffle_epi8(
+            p, _mm256_setr_epi8(I, -1, J, -1, I + 4, -1, J + 4, -1, I + 8, -1, J + 8, -1, I + 12,
+                                -1, J + 12, -1, I, -1, J, -1, I + 4, -1, J + 4, -1, I + 8, -1,
+                                J + 8, -1, I + 12, -1, J + 12, -1));
     }
     static V mulhi16(V a, V b) { return _mm256_mulhi_epi16(a, b); }
     static V addsu8(V a, V b) { return _mm256_adds_epu8(a, b); }
     static V subsu8(V a, V b) { return _mm256_subs_epu8(a, b); }
     static V cmpeq16(V a, V b) { return _mm256_cmpeq_epi16(a, b); }
     static bool any(V a) { return _mm256_movemask_epi8(a) != 0; }
-    static V mullo16(V a, V b) { return _mm256_mullo_epi16(a, b); }
     // Groups of 4 pixels (4 bytes of a byte plane) as 0 2 4 6 | 1 3 5 7, so
     // that the in-lane unpacks of store4 yield 8 consecutive pixels per
     // vector.
@@ -82,8 +88,6 @@ struct Avx2 {
     static V madd16(V a, V b) { return _mm256_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm256_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm256_packus_epi16(a, b); }
-    static V unpacklo8(V a, V b) { return _mm256_unpacklo_epi8(a, b); }
-    static V unpackhi8(V a, V b) { return _mm256_unpackhi_epi8(a, b); }
     // The two lane-wise packs leave 4-byte groups in the order 0 2 4 6 1 3 5 7.
     static V fixPackOrder(V v) {
         return _mm256_permutevar8x32_epi32(v, _mm256_setr_epi32(0, 4, 1, 5, 2, 6, 3, 7));

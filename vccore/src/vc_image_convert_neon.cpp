@@ -3,6 +3,7 @@
 #if defined(__aarch64__)
 #include <arm_neon.h>
 #include <stddef.h>
+#include <string.h>
 
 #include "vc_image_convert_fast.h"
 #include "vc_image_layout.h"
@@ -26,33 +27,44 @@ struct Neon {
     static V zero() { return vdupq_n_u8(0); }
     static V load(const uint8_t* p) { return vld1q_u8(p); }
     // No cache-bypassing store worth having here: the streaming variant is a
-    // plain store, and the alignment test only keeps the shared loops honest.
+    // plain store.
     template <bool kStream = false>
     static void store(uint8_t* p, V v) {
         vst1q_u8(p, v);
     }
-    static bool streamable(const uint8_t* p) { return (reinterpret_cast<uintptr_t>(p) & 15) == 0; }
     static void fence() {}
     static void storeHalf(uint8_t* p, V v) { vst1_u8(p, vget_low_u8(v)); }
     static V set1_8(int v) { return vdupq_n_u8(static_cast<uint8_t>(v)); }
+    static V pair8(int lo, int hi) { return b(vdupq_n_u16(static_cast<uint16_t>(hi << 8 | lo))); }
     static V set1_16(int v) { return b(vdupq_n_s16(static_cast<int16_t>(v))); }
     static V set1_32(int v) { return b(vdupq_n_s32(v)); }
     static V pair16(int lo, int hi) {
         return b(vdupq_n_u32((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V c) { return b(vaddq_s16(s16(a), s16(c))); }
+    static V max16(V a, V c) { return b(vmaxq_s16(s16(a), s16(c))); }
+    static V mullo16(V a, V c) { return b(vmulq_s16(s16(a), s16(c))); }
     static V sub16(V a, V c) { return b(vsubq_s16(s16(a), s16(c))); }
     static V add32(V a, V c) { return b(vaddq_s32(s32(a), s32(c))); }
-    static V sub32(V a, V c) { return b(vsubq_s32(s32(a), s32(c))); }
     static V and_(V a, V c) { return vandq_u8(a, c); }
-    static V or_(V a, V c) { return vorrq_u8(a, c); }
+    static V xor_(V a, V c) { return veorq_u8(a, c); }
+    // Unsigned bytes of a times signed bytes of c, adjacent products summed
+    // into words (x86's pmaddubsw; the kernels' sums always fit a word).
+    static V maddubs(V a, V c) {
+        const int16x8_t lo = vmulq_s16(vreinterpretq_s16_u16(vmovl_u8(vget_low_u8(a))),
+                                       vmovl_s8(vget_low_s8(vreinterpretq_s8_u8(c))));
+        const int16x8_t hi = vmulq_s16(vreinterpretq_s16_u16(vmovl_high_u8(a)),
+                                       vmovl_high_s8(vreinterpretq_s8_u8(c)));
+        return b(vpaddq_s16(lo, hi));
+    }
     // Shift counts come in as variables: register shifts (negative = right).
-    static V srai32(V a, int n) { return b(vshlq_s32(s32(a), vdupq_n_s32(-n))); }
-    static V slli32(V a, int n) { return b(vshlq_u32(u32(a), vdupq_n_s32(n))); }
     static V slli16(V a, int n) {
         return b(vshlq_u16(u16(a), vdupq_n_s16(static_cast<int16_t>(n))));
     }
     static V srli32(V a, int n) { return b(vshlq_u32(u32(a), vdupq_n_s32(-n))); }
+    static V srai16(V a, int n) {
+        return b(vshlq_s16(s16(a), vdupq_n_s16(static_cast<int16_t>(-n))));
+    }
     static V srli16(V a, int n) {
         return b(vshlq_u16(u16(a), vdupq_n_s16(static_cast<int16_t>(-n))));
     }
@@ -65,15 +77,15 @@ struct Neon {
         return vld1q_u8(index);
     }
     static V shuffle(V p, const Shuffle& s) { return vqtbl1q_u8(p, s); }
-    static V min16(V a, V c) { return b(vminq_s16(s16(a), s16(c))); }
-    static V max16(V a, V c) { return b(vmaxq_s16(s16(a), s16(c))); }
-    // Even 32-bit lanes of a, with the even lanes of c in between.
-    static V combineEven(V a, V c) { return b(vtrn1q_u32(u32(a), u32(c))); }
-    // Words a0 b0 a2 b2 c0 d0 c2 d2 (of four 4-pixel vectors) to pixel order:
-    // words 0 2 1 3 of each half.
-    static V pairOrder(V w) {
-        static const uint8_t kIndex[16] = {0, 1, 4, 5, 2, 3, 6, 7, 8, 9, 12, 13, 10, 11, 14, 15};
-        return vqtbl1q_u8(w, vld1q_u8(kIndex));
+    // Dwords 0 and 2 of a, then those of c.
+    static V evenPixels(V a, V c) { return b(vuzp1q_u32(u32(a), u32(c))); }
+    // Bytes I and J of every 4-byte group as its two words (out-of-range
+    // table indices read as zero).
+    template <int I, int J>
+    static V words(V p) {
+        static const uint8_t kIndex[16] = {I,     255, J,     255, I + 4,  255, J + 4,  255,
+                                           I + 8, 255, J + 8, 255, I + 12, 255, J + 12, 255};
+        return vqtbl1q_u8(p, vld1q_u8(kIndex));
     }
     // High halves of the signed 32-bit products.
     static V mulhi16(V a, V c) {
@@ -85,7 +97,6 @@ struct Neon {
     static V subsu8(V a, V c) { return vqsubq_u8(a, c); }
     static V cmpeq16(V a, V c) { return b(vceqq_u16(u16(a), u16(c))); }
     static bool any(V a) { return vmaxvq_u8(a) != 0; }
-    static V mullo16(V a, V c) { return b(vmulq_s16(s16(a), s16(c))); }
     static V toStoreOrder(V v) { return v; }
     // Sums of adjacent signed word products, as 32-bit lanes.
     static V madd16(V a, V c) {
@@ -95,8 +106,6 @@ struct Neon {
     }
     static V packs32(V a, V c) { return b(vcombine_s16(vqmovn_s32(s32(a)), vqmovn_s32(s32(c)))); }
     static V packus16(V a, V c) { return vcombine_u8(vqmovun_s16(s16(a)), vqmovun_s16(s16(c))); }
-    static V unpacklo8(V a, V c) { return vzip1q_u8(a, c); }
-    static V unpackhi8(V a, V c) { return vzip2q_u8(a, c); }
     static V fixPackOrder(V v) { return v; }
     // kBytes / 2 U bytes and as many V bytes, interleaved U, V, U, V …
     static V interleave(const uint8_t* u, const uint8_t* v) {

@@ -2,6 +2,7 @@
 #if defined(__x86_64__)
 #include <emmintrin.h>
 #include <stddef.h>
+#include <string.h>
 
 #include "vc_image_convert_fast.h"
 #include "vc_image_layout.h"
@@ -19,10 +20,10 @@ struct Sse2 {
         else
             _mm_storeu_si128(reinterpret_cast<V*>(p), v);
     }
-    static bool streamable(const uint8_t* p) { return (reinterpret_cast<uintptr_t>(p) & 15) == 0; }
     static void fence() { _mm_sfence(); }
     static void storeHalf(uint8_t* p, V v) { _mm_storel_epi64(reinterpret_cast<V*>(p), v); }
     static V set1_8(int v) { return _mm_set1_epi8(static_cast<char>(v)); }
+    static V pair8(int lo, int hi) { return _mm_set1_epi16(static_cast<short>(hi << 8 | lo)); }
     static V set1_16(int v) { return _mm_set1_epi16(static_cast<short>(v)); }
     static V set1_32(int v) { return _mm_set1_epi32(v); }
     static V pair16(int lo, int hi) {
@@ -30,13 +31,23 @@ struct Sse2 {
             static_cast<int>((static_cast<uint32_t>(hi) << 16) | static_cast<uint16_t>(lo)));
     }
     static V add16(V a, V b) { return _mm_add_epi16(a, b); }
+    static V max16(V a, V b) { return _mm_max_epi16(a, b); }
+    static V mullo16(V a, V b) { return _mm_mullo_epi16(a, b); }
     static V sub16(V a, V b) { return _mm_sub_epi16(a, b); }
     static V add32(V a, V b) { return _mm_add_epi32(a, b); }
-    static V sub32(V a, V b) { return _mm_sub_epi32(a, b); }
     static V and_(V a, V b) { return _mm_and_si128(a, b); }
-    static V or_(V a, V b) { return _mm_or_si128(a, b); }
-    static V srai32(V a, int n) { return _mm_srai_epi32(a, n); }
-    static V slli32(V a, int n) { return _mm_slli_epi32(a, n); }
+    static V xor_(V a, V b) { return _mm_xor_si128(a, b); }
+    static V srai16(V a, int n) { return _mm_srai_epi16(a, n); }
+    // Unsigned bytes of a times signed bytes of b, adjacent products summed
+    // into words. SSE2 has no such instruction: two word products instead
+    // (the kernels' sums always fit a word, so no saturation is lost).
+    static V maddubs(V a, V b) {
+        const V aEven = _mm_and_si128(a, _mm_set1_epi16(0xff));
+        const V aOdd = _mm_srli_epi16(a, 8);
+        const V bEven = _mm_srai_epi16(_mm_slli_epi16(b, 8), 8);
+        const V bOdd = _mm_srai_epi16(b, 8);
+        return _mm_add_epi16(_mm_mullo_epi16(aEven, bEven), _mm_mullo_epi16(aOdd, bOdd));
+    }
     static V slli16(V a, int n) { return _mm_slli_epi16(a, n); }
     static V srli32(V a, int n) { return _mm_srli_epi32(a, n); }
     // Byte moves inside every 4-byte pixel, by shifts and masks (SSE2 has no
@@ -63,26 +74,31 @@ struct Sse2 {
         return out;
     }
     static V srli16(V a, int n) { return _mm_srli_epi16(a, n); }
-    static V min16(V a, V b) { return _mm_min_epi16(a, b); }
-    static V max16(V a, V b) { return _mm_max_epi16(a, b); }
-    // Even 32-bit lanes of a, with the even lanes of b in between.
-    static V combineEven(V a, V b) {
-        return _mm_or_si128(_mm_and_si128(a, _mm_set_epi32(0, -1, 0, -1)), _mm_slli_epi64(b, 32));
+    // Dwords 0 and 2 of a, then those of b.
+    static V evenPixels(V a, V b) {
+        return _mm_castps_si128(_mm_shuffle_ps(_mm_castsi128_ps(a), _mm_castsi128_ps(b), 0x88));
     }
-    // Words a0 b0 a2 b2 c0 d0 c2 d2 (of four 4-pixel vectors) to pixel order.
-    static V pairOrder(V w) { return _mm_shufflehi_epi16(_mm_shufflelo_epi16(w, 0xD8), 0xD8); }
+    // Bytes I and J of every 4-byte group as its two words; I and J share a
+    // parity (a mask or a shift picks them, a word shuffle orders them).
+    template <int I, int J>
+    static V words(V p) {
+        static_assert(I % 2 == J % 2, "bytes of one parity");
+        const V both =
+            I % 2 == 0 ? _mm_and_si128(p, _mm_set1_epi32(0x00ff00ff)) : _mm_srli_epi16(p, 8);
+        constexpr int a = I / 2, b = J / 2;
+        if (a == 0 && b == 1) return both;
+        constexpr int order = _MM_SHUFFLE(b + 2, a + 2, b, a);
+        return _mm_shufflehi_epi16(_mm_shufflelo_epi16(both, order), order);
+    }
     static V mulhi16(V a, V b) { return _mm_mulhi_epi16(a, b); }
     static V addsu8(V a, V b) { return _mm_adds_epu8(a, b); }
     static V subsu8(V a, V b) { return _mm_subs_epu8(a, b); }
     static V cmpeq16(V a, V b) { return _mm_cmpeq_epi16(a, b); }
     static bool any(V a) { return _mm_movemask_epi8(a) != 0; }
-    static V mullo16(V a, V b) { return _mm_mullo_epi16(a, b); }
     static V toStoreOrder(V v) { return v; }
     static V madd16(V a, V b) { return _mm_madd_epi16(a, b); }
     static V packs32(V a, V b) { return _mm_packs_epi32(a, b); }
     static V packus16(V a, V b) { return _mm_packus_epi16(a, b); }
-    static V unpacklo8(V a, V b) { return _mm_unpacklo_epi8(a, b); }
-    static V unpackhi8(V a, V b) { return _mm_unpackhi_epi8(a, b); }
     static V fixPackOrder(V v) { return v; }
     // kBytes / 2 U bytes and as many V bytes, interleaved U, V, U, V …
     static V interleave(const uint8_t* u, const uint8_t* v) {
