@@ -1,6 +1,6 @@
 // Colour conversion between the FourCC formats of the image record. The plain
-// per-pixel loops here are the reference; vector paths (vc_image_convert_simd)
-// must reproduce them bit for bit.
+// per-pixel loops here are the reference; vector paths (vc_image_convert_fast and its
+// per-instruction-set kernels) must reproduce them bit for bit.
 #include <string.h>
 
 #include "vc_csc.h"
