@@ -2,7 +2,7 @@
 PRESET ?= release
 JOBS ?= $(shell nproc)
 
-.PHONY: deps build test test-asan test-tsan fuzz demo bench format clean
+.PHONY: deps build test test-asan test-tsan test-arm64 fuzz demo bench format clean
 
 deps:
 	@scripts/setup-deps
@@ -22,6 +22,10 @@ test-tsan: deps
 	@cmake --preset tsan >/dev/null
 	@cmake --build --preset tsan -j $(JOBS)
 	@ctest --preset tsan -j $(JOBS) -L threads
+
+# The vector conversion suite cross-built for arm64 (NEON) and run under qemu.
+test-arm64: deps
+	@scripts/test-arm64
 
 # A short libFuzzer run of the decoders (clang, ASan).
 fuzz: deps
