@@ -17,7 +17,9 @@ GlContext::GlContext() {
     mOk = true;
 }
 
-GlContext::~GlContext() { release(); }
+GlContext::~GlContext() {
+    release();
+}
 
 void GlContext::release() {
     if (mSurface != nullptr) {

@@ -30,7 +30,9 @@ LogCapture::LogCapture() : mPrevious(reinterpret_cast<void*>(VF_LogMsg)) {
     VF_LogMsg = captureLogMsg;
 }
 
-LogCapture::~LogCapture() { VF_LogMsg = reinterpret_cast<VF_LogMsg_t>(mPrevious); }
+LogCapture::~LogCapture() {
+    VF_LogMsg = reinterpret_cast<VF_LogMsg_t>(mPrevious);
+}
 
 std::vector<LoggedLine> LogCapture::lines() const {
     std::lock_guard<std::mutex> guard(gLock);
@@ -43,7 +45,9 @@ std::vector<std::string> LogCapture::texts() const {
     return out;
 }
 
-bool LogCapture::contains(const std::string& text) const { return count(text) > 0; }
+bool LogCapture::contains(const std::string& text) const {
+    return count(text) > 0;
+}
 
 bool LogCapture::contains(int level, const std::string& text) const {
     for (const LoggedLine& l : lines())

@@ -8,9 +8,9 @@
 #include "vccore/vc_error.h"
 
 // FourCC values keep their first character in the lowest byte.
-#define VC_FOURCC(a, b, c, d)                                              \
-    ((uint32_t)(uint8_t)(a) | ((uint32_t)(uint8_t)(b) << 8) |             \
-     ((uint32_t)(uint8_t)(c) << 16) | ((uint32_t)(uint8_t)(d) << 24))
+#define VC_FOURCC(a, b, c, d)                                                                  \
+    ((uint32_t)(uint8_t)(a) | ((uint32_t)(uint8_t)(b) << 8) | ((uint32_t)(uint8_t)(c) << 16) | \
+     ((uint32_t)(uint8_t)(d) << 24))
 
 #define VC_FORMAT_RGBA VC_FOURCC('R', 'G', 'B', 'A')
 #define VC_FORMAT_BGRA VC_FOURCC('B', 'G', 'R', 'A')
