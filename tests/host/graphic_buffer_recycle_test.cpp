@@ -11,17 +11,13 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
+#include "graphic_buffer_usage.h"
 #include "support/gl_context.h"
 
 using android::GraphicBuffer;
 using android::sp;
 
 namespace {
-
-const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
-const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
-const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
-const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
 
 // The buffer as the GPU sees it through an EGL image (row 0 first), or empty.
 std::vector<uint8_t> gpuPixels(EGLDisplay display, const sp<GraphicBuffer>& buffer) {

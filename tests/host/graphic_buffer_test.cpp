@@ -11,6 +11,7 @@
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
+#include "graphic_buffer_usage.h"
 #include "support/gl_context.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_image.h"
@@ -19,11 +20,6 @@ using android::GraphicBuffer;
 using android::sp;
 
 namespace {
-
-const uint32_t kRead = GraphicBuffer::USAGE_SW_READ_OFTEN;
-const uint32_t kWrite = GraphicBuffer::USAGE_SW_WRITE_OFTEN;
-const uint32_t kTextureUsage = GraphicBuffer::USAGE_HW_TEXTURE | kRead | kWrite;
-const uint32_t kRenderUsage = kTextureUsage | GraphicBuffer::USAGE_HW_RENDER;
 
 // Locks and returns the CPU pixels (null on failure, which fails the test).
 uint8_t* lock(const sp<GraphicBuffer>& buffer, uint32_t usage) {
