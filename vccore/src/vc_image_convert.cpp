@@ -15,13 +15,6 @@ const char* fourcc(const uint32_t& format) {
     return reinterpret_cast<const char*>(&format);
 }
 
-// 4:2:2 and 4:2:0 formats need even widths, 4:2:0 even heights; grey is free.
-bool parityOk(uint32_t format, int width, int height) {
-    if (!VCImage_isYUV(format) || format == VC_FORMAT_GREY) return true;
-    if (width % 2 != 0) return false;
-    return !VCImage_isYUV420(format) || height % 2 == 0;
-}
-
 // End of the bytes the planes of an image reach, for images whose chroma plane
 // may be displaced behind a caller-chosen offset (before or after the luma end).
 uint64_t planesEnd(const VCImage* image) {
@@ -197,8 +190,8 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
     if (required == 0) return VC_REPORT(VC_ERROR_INVALID_PARAM);
 
     // The destination is checked with its own geometry as it stands.
-    if (!parityOk(source->format, source->width, source->height) ||
-        !parityOk(destination->format, destination->width, destination->height))
+    if (!VCImage_parityOk(source->format, source->width, source->height) ||
+        !VCImage_parityOk(destination->format, destination->width, destination->height))
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
 
     uint32_t copyBytes = required;
@@ -223,10 +216,10 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
         probe.uvOffset = destination->uvOffset;
         if (destination->size < planesEnd(&probe)) return VC_REPORT(VC_ERROR_INVALID_SIZE);
     }
-    // An even destination may take an odd geometry; only the reference
-    // loops below bound their chroma writes for that, so neither the
-    // external module nor the vector paths get such a target.
-    const bool evenTarget = parityOk(destination->format, source->width, source->height);
+    // An even destination may take an odd geometry; only the reference loops
+    // bound their chroma writes for that, so the external module (whose
+    // writes cannot be known) does not get such a target.
+    const bool evenTarget = VCImage_parityOk(destination->format, source->width, source->height);
 
     destination->width = source->width;
     destination->height = source->height;
@@ -247,8 +240,7 @@ extern "C" int VCImage_convert(const VCImage* source, VCImage* destination) {
         }
     }
 
-    if (evenTarget && (srcYuv || srcRgb) && (dstYuv || dstRgb) &&
-        VCConvert_fast(source, destination))
+    if ((srcYuv || srcRgb) && (dstYuv || dstRgb) && VCConvert_fast(source, destination))
         return VC_OK;
     if (srcYuv && dstYuv) return yuvToYuv(source, destination);
     if (srcYuv && dstRgb) return yuvToRgb(source, destination);

@@ -2,6 +2,7 @@
 #include <atomic>
 
 #include "vc_image_convert_fast.h"
+#include "vc_image_layout.h"
 
 #if defined(__x86_64__)
 bool VCConvert_sse2(const VCImage* source, VCImage* destination);
@@ -53,6 +54,11 @@ int VCConvert_setLevel(int level) {
 }
 
 bool VCConvert_fast(const VCImage* source, VCImage* destination) {
+    // The kernels walk whole chroma blocks: odd 4:2:x geometry stays with the
+    // reference loops, which bound their writes for it.
+    if (!VCImage_parityOk(source->format, source->width, source->height) ||
+        !VCImage_parityOk(destination->format, destination->width, destination->height))
+        return false;
     switch (VCConvert_level()) {
 #if defined(__x86_64__)
         case kVCConvertAvx2:

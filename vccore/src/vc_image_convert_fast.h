@@ -82,7 +82,8 @@ int VCConvert_setLevel(int level);
 int VCConvert_level(void);
 
 // Tries a vector path for the pair; true when it converted. The images have
-// already passed every check of VCImage_convert and have the same geometry.
+// already passed every check of VCImage_convert and have the same geometry;
+// odd 4:2:x geometry is left to the reference loops (false).
 bool VCConvert_fast(const VCImage* source, VCImage* destination);
 
 #endif

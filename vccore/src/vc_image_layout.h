@@ -27,6 +27,14 @@ struct VCYuvLayout {
     int chromaStep;
 };
 
+// Whether an image of `format` can have this geometry: 4:2:2 and 4:2:0
+// formats need even widths, 4:2:0 even heights; grey is free.
+static inline bool VCImage_parityOk(uint32_t format, int width, int height) {
+    if (!VCImage_isYUV(format) || format == VC_FORMAT_GREY) return true;
+    if (width % 2 != 0) return false;
+    return !VCImage_isYUV420(format) || height % 2 == 0;
+}
+
 // False for formats outside the RGB family.
 bool VCImage_rgbLayout(uint32_t format, VCRgbLayout* layout);
 
