@@ -378,7 +378,11 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
         }
         mGpuDirty = false;
     }
-    if ((inUsage & USAGE_SW_WRITE_MASK) != 0) mZeroContent = false;
+    if ((inUsage & USAGE_SW_WRITE_MASK) != 0) {
+        mZeroContent = false;
+        // A recycled mirror no longer holds what the CPU copy will.
+        mSpareMatches = false;
+    }
     mLockUsage = inUsage;
     return NO_ERROR;
 }

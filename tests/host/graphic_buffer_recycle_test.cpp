@@ -111,6 +111,14 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
     EXPECT_EQ(gpuPixels(display(), source), cpu);
     EXPECT_EQ(source->getUploadCount(), 0u);
+
+    // Written before its first GPU use, a recycled texture shows the new bytes.
+    source.clear();
+    sp<GraphicBuffer> written = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    ASSERT_EQ(written->lock(kWrite, &pixels), android::NO_ERROR);
+    memset(pixels, 0x33, w * h * 4);
+    ASSERT_EQ(written->unlock(), android::NO_ERROR);
+    EXPECT_EQ(gpuPixels(display(), written), std::vector<uint8_t>(w * h * 4, 0x33));
 }
 
 TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {
