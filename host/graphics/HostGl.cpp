@@ -4,9 +4,11 @@
 #include <link.h>
 #include <stdlib.h>
 #include <string.h>
+#include <unistd.h>
 
 #include <map>
 
+#include "SharedPixels.h"
 #include "vccore/vc_log.h"
 
 namespace android {
@@ -30,6 +32,40 @@ const EGLint kContextAttribs[] = {EGL_CONTEXT_CLIENT_VERSION, 2, EGL_NONE};
 const EGLint kPbufferAttribs[] = {EGL_WIDTH, 1, EGL_HEIGHT, 1, EGL_NONE};
 
 std::atomic<void (*)()> gDisplayIdleHook{nullptr};
+
+// Whether textures can take shared memory as storage: unknown until the
+// first import tries, then settled for the process (one driver per process).
+enum ImportState { IMPORT_UNKNOWN, IMPORT_WORKS, IMPORT_FAILS };
+std::atomic<int> gImportState{IMPORT_UNKNOWN};
+
+struct MemoryObjectApi {
+    PFNGLCREATEMEMORYOBJECTSEXTPROC create = nullptr;
+    PFNGLDELETEMEMORYOBJECTSEXTPROC destroy = nullptr;
+    PFNGLIMPORTMEMORYFDEXTPROC importFd = nullptr;
+    PFNGLTEXSTORAGEMEM2DEXTPROC storage = nullptr;
+
+    // With a context current; null entries when the context lacks the extension.
+    static const MemoryObjectApi& get() {
+        static const MemoryObjectApi api = [] {
+            MemoryObjectApi a;
+            const char* extensions = reinterpret_cast<const char*>(glGetString(GL_EXTENSIONS));
+            if (extensions == nullptr || strstr(extensions, "GL_EXT_memory_object_fd") == nullptr)
+                return a;
+            a.create =
+                (PFNGLCREATEMEMORYOBJECTSEXTPROC)eglGetProcAddress("glCreateMemoryObjectsEXT");
+            a.destroy =
+                (PFNGLDELETEMEMORYOBJECTSEXTPROC)eglGetProcAddress("glDeleteMemoryObjectsEXT");
+            a.importFd = (PFNGLIMPORTMEMORYFDEXTPROC)eglGetProcAddress("glImportMemoryFdEXT");
+            a.storage = (PFNGLTEXSTORAGEMEM2DEXTPROC)eglGetProcAddress("glTexStorageMem2DEXT");
+            if (a.create == nullptr || a.destroy == nullptr || a.importFd == nullptr ||
+                a.storage == nullptr)
+                a = MemoryObjectApi();
+            return a;
+        }();
+        return api;
+    }
+    bool present() const { return create != nullptr; }
+};
 
 }  // namespace
 
@@ -176,6 +212,21 @@ bool HostGl::run(const std::function<bool()>& work) {
     return ok;
 }
 
+bool HostGl::waitForGpu() {
+    // llvmpipe rasterizes the flushed work of all its contexts one scene
+    // after another, and a fence from any context stands for the last scene
+    // queued by any of them: finishing the caller's own context (which
+    // flushes it first) waits for everything. Without a context of its own
+    // the caller borrows this one, whose visit ends with such a fence.
+    EGLDisplay display = eglGetCurrentDisplay();
+    if (eglGetCurrentContext() != EGL_NO_CONTEXT && display != EGL_NO_DISPLAY &&
+        display == mHeldDisplay.load()) {
+        glFinish();
+        return true;
+    }
+    return run([] { return true; });
+}
+
 void HostGl::holdCompiler_l() {
     // Mesa builds its GLSL built-in library for the first context that
     // compiles and frees it when the last one calls glReleaseShaderCompiler.
@@ -198,6 +249,102 @@ void HostGl::holdCompiler_l() {
 GLuint HostGl::framebuffer_l() {
     if (mFramebuffer == 0) glGenFramebuffers(1, &mFramebuffer);
     return mFramebuffer;
+}
+
+bool HostGl::mayImport() {
+    return gImportState.load() != IMPORT_FAILS;
+}
+
+GLuint HostGl::importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
+                               GLuint* memoryObject) {
+    *memoryObject = 0;
+    if (gImportState.load() == IMPORT_UNKNOWN) {
+        bool works = probeImport_l();
+        gImportState = works ? IMPORT_WORKS : IMPORT_FAILS;
+        if (!works) VF_LogMsg(VF_LOG_INFO, "HostGl: no shared texture memory; buffers are copied");
+    }
+    if (gImportState.load() != IMPORT_WORKS) return 0;
+    return import_l(pixels, width, height, memoryObject);
+}
+
+GLuint HostGl::import_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
+                        GLuint* memoryObject) {
+    const MemoryObjectApi& api = MemoryObjectApi::get();
+    if (!api.present() || pixels.empty()) return 0;
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    int fd = pixels.duplicateFd();
+    if (fd < 0) return 0;
+    GLuint memory = 0;
+    api.create(1, &memory);
+    api.importFd(memory, pixels.fileSize(), GL_HANDLE_TYPE_OPAQUE_FD_EXT, fd);
+    if (glGetError() != GL_NO_ERROR) {
+        // A refused import leaves the descriptor with us.
+        close(fd);
+        api.destroy(1, &memory);
+        return 0;
+    }
+    GLuint texture = 0;
+    glGenTextures(1, &texture);
+    glBindTexture(GL_TEXTURE_2D, texture);
+    api.storage(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)width, (GLsizei)height, memory, 0);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    glBindTexture(GL_TEXTURE_2D, 0);
+    if (glGetError() != GL_NO_ERROR) {
+        deleteImported_l(texture, memory);
+        return 0;
+    }
+    *memoryObject = memory;
+    return texture;
+}
+
+void HostGl::deleteImported_l(GLuint texture, GLuint memoryObject) {
+    if (texture != 0) glDeleteTextures(1, &texture);
+    if (memoryObject != 0) {
+        const MemoryObjectApi& api = MemoryObjectApi::get();
+        if (api.present()) api.destroy(1, &memoryObject);
+    }
+}
+
+bool HostGl::probeImport_l() {
+    // A 5x3 texture: its rows are padded, so a wrong row pitch or row order
+    // puts the one cleared texel somewhere else.
+    const uint32_t w = 5, h = 3, x = 3, y = 2;
+    SharedPixels pixels;
+    if (!MemoryObjectApi::get().present() || !pixels.allocate(w, h)) return false;
+    GLuint memory = 0;
+    GLuint texture = import_l(pixels, w, h, &memory);
+    if (texture == 0) return false;
+    GLuint framebuffer = framebuffer_l();
+    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer);
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, texture, 0);
+    bool ok = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+    if (ok) {
+        glEnable(GL_SCISSOR_TEST);
+        glScissor((GLint)x, (GLint)y, 1, 1);
+        glClearColor(10 / 255.0f, 20 / 255.0f, 30 / 255.0f, 40 / 255.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+        glDisable(GL_SCISSOR_TEST);
+        glFinish();
+    }
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, 0, 0);
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    const size_t pitch = SharedPixels::rowPitch(w);
+    const unsigned char expected[4] = {10, 20, 30, 40};
+    for (uint32_t row = 0; ok && row < h; ++row) {
+        for (uint32_t col = 0; ok && col < w; ++col) {
+            const unsigned char* p = pixels.pixels() + row * pitch + col * 4;
+            bool lit = row == y && col == x;
+            for (int c = 0; c < 4; ++c) ok = ok && p[c] == (lit ? expected[c] : 0);
+        }
+    }
+    deleteImported_l(texture, memory);
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    return ok;
 }
 
 void HostGl::setDisplayIdleHook(void (*hook)()) {

@@ -5,6 +5,8 @@
 #ifndef KIV_HOST_GRAPHICS_HOSTGL_H
 #define KIV_HOST_GRAPHICS_HOSTGL_H
 
+#include <stdint.h>
+
 #include <atomic>
 #include <functional>
 #include <mutex>
@@ -15,6 +17,8 @@
 #include <GLES2/gl2ext.h>
 
 namespace android {
+
+class SharedPixels;
 
 class HostGl {
 public:
@@ -36,12 +40,30 @@ public:
     // could not be made current or `work` returned false.
     bool run(const std::function<bool()>& work);
 
+    // Waits until all GL work flushed so far, by any context on the display,
+    // is done (run() waits only for the caller's own context). False when
+    // the context cannot be used.
+    bool waitForGpu();
+
     // Valid while acquired.
     EGLDisplay display() const { return mDisplay; }
     EGLContext context() const { return mContext; }
 
     // Framebuffer of the context, for readbacks (made on first use, in run()).
     GLuint framebuffer_l();
+
+    // In run(): an RGBA texture whose storage is `pixels` itself, so the CPU
+    // and the GPU see one copy; 0 when the driver cannot take it (tried once
+    // on a small texture first, whose rows must land where the CPU expects
+    // them). `memoryObject` gets the GL object that holds the import: it
+    // must outlive every user of the texture's storage.
+    GLuint importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
+                           GLuint* memoryObject);
+    // In run(): deletes an imported texture, then what holds its storage.
+    static void deleteImported_l(GLuint texture, GLuint memoryObject);
+    // False once an import has proven impossible, so callers can keep plain
+    // memory instead.
+    static bool mayImport();
 
     // Called (on the terminating thread, no lock held) when every other user
     // of the display this context lives on has terminated it, so that what
@@ -61,6 +83,9 @@ private:
     void fenceCurrent(EGLDisplay display);
     // With the context current: keeps the shader compiler loaded (see .cpp).
     void holdCompiler_l();
+    GLuint import_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
+                    GLuint* memoryObject);
+    bool probeImport_l();
 
     std::mutex mLock;
     int mUsers;

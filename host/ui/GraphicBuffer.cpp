@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "../graphics/HostGl.h"
+#include "../graphics/SharedPixels.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"
@@ -90,13 +91,21 @@ std::unique_ptr<unsigned char[]> scratch(size_t bytes) {
     return std::unique_ptr<unsigned char[]>(new (std::nothrow) unsigned char[bytes]);
 }
 
-// Deletes a mirror and lets go of the host context user it held.
-void deleteMirror(GLuint texture) {
-    HostGl::get().run([texture] {
-        glDeleteTextures(1, &texture);
+// Deletes a mirror (and what holds its imported storage, if any) and lets go
+// of the host context user it held.
+void deleteMirror(GLuint texture, GLuint memoryObject) {
+    HostGl::get().run([texture, memoryObject] {
+        HostGl::deleteImported_l(texture, memoryObject);
         return true;
     });
     HostGl::get().release();
+}
+
+// Whether a buffer can keep its pixels where the driver keeps a texture's:
+// RGBA rows exactly as far apart as the driver's.
+bool canShare(uint32_t fourcc, uint32_t width, uint32_t stride) {
+    return fourcc == VC_FORMAT_RGBA && (size_t)stride * 4 == SharedPixels::rowPitch(width) &&
+           HostGl::mayImport();
 }
 
 // The memory and mirror of a buffer that went away after GPU use.
@@ -109,16 +118,23 @@ struct Recycled {
     unsigned char* data = nullptr;
     GLuint texture = 0;
     std::unique_ptr<unsigned char[]> rgbaScratch;
+    std::unique_ptr<SharedPixels> shared;  // data points into it, when set
+    GLuint memoryObject = 0;               // the texture's storage is `shared`
 
     size_t bytes() const {
-        // The CPU copy, the mirror and the staging memory, if any.
+        // The CPU copy, the mirror and the staging memory, if any; shared
+        // memory is both of the first two.
         size_t rgba = (size_t)width * height * 4;
-        return bytesOf(fourcc, height, stride) + rgba + (rgbaScratch != nullptr ? rgba : 0);
+        size_t staging = rgbaScratch != nullptr ? rgba : 0;
+        if (memoryObject != 0) return shared->fileSize() + staging;
+        return bytesOf(fourcc, height, stride) + rgba + staging;
     }
     void free() {
-        if (texture != 0) deleteMirror(texture);
-        ::free(data);
+        if (texture != 0) deleteMirror(texture, memoryObject);
+        if (shared == nullptr) ::free(data);
+        shared.reset();
         texture = 0;
+        memoryObject = 0;
         data = nullptr;
     }
 };
@@ -245,6 +261,7 @@ GraphicBuffer::GraphicBuffer()
       mZeroContent(true),
       mZeroPending(false),
       mSpareMatches(false),
+      mMemoryObject(0),
       mImageCount(0),
       mGpuDirty(false),
       mUploadCount(0),
@@ -298,13 +315,30 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
         mData = recycled.data;
         mSpareTexture = recycled.texture;
         mRgbaScratch = std::move(recycled.rgbaScratch);
+        mShared = std::move(recycled.shared);
+        mMemoryObject = recycled.memoryObject;
         // What the GPU renders into starts clean, so that nothing drawn for
         // one buffer ever shows in another. A texture-only buffer keeps the
         // bytes it gets, and its mirror (their upload) with them, until the
         // CPU writes it: a new buffer's contents are undefined on a device too.
-        mZeroPending = render;
         mZeroContent = render;
-        mSpareMatches = !render;
+        if (shared_l()) {
+            // One storage for both sides: cleared now, both sides at once.
+            if (render) memset(mData, 0, mDataSize);
+            mSpareMatches = true;
+        } else {
+            mZeroPending = render;
+            mSpareMatches = !render;
+        }
+    } else if ((inUsage & USAGE_HW_MASK) != 0 && canShare(mFourcc, w, inStride)) {
+        // Fresh memory reads as zeros, as calloc's does.
+        std::unique_ptr<SharedPixels> shared(new (std::nothrow) SharedPixels());
+        if (shared != nullptr && shared->allocate(w, h)) {
+            mData = shared->pixels();
+            mShared = std::move(shared);
+        } else {
+            mData = static_cast<unsigned char*>(calloc(1, mDataSize));
+        }
     } else {
         mData = static_cast<unsigned char*>(calloc(1, mDataSize));
     }
@@ -328,12 +362,25 @@ GraphicBuffer::~GraphicBuffer() {
         entry.data = mData;
         entry.texture = texture;
         entry.rgbaScratch = std::move(mRgbaScratch);
+        entry.shared = std::move(mShared);
+        entry.memoryObject = mMemoryObject;
+        // The next owner writes the storage itself: nothing may still draw
+        // from or into it then.
+        if (entry.memoryObject != 0 && !HostGl::get().waitForGpu()) {
+            entry.free();
+            return;
+        }
         if (Recycler::get().keep(entry)) return;
         entry.free();
         return;
     }
-    if (texture != 0) deleteMirror(texture);
-    free(mData);
+    if (texture != 0) deleteMirror(texture, mMemoryObject);
+    if (mShared == nullptr) free(mData);
+}
+
+bool GraphicBuffer::sharesGpuStorage() {
+    std::lock_guard<std::mutex> guard(mLock);
+    return shared_l() && mMirrorTexture != 0;
 }
 
 void GraphicBuffer::incRef(android_native_base_t* base) {
@@ -358,6 +405,19 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
     if (mInitCheck != NO_ERROR) return NO_INIT;
     if ((inUsage & USAGE_SOFTWARE_MASK) == 0) return BAD_VALUE;
     if (mLockUsage != 0) return INVALID_OPERATION;
+    const bool cpuWrites = (inUsage & USAGE_SW_WRITE_MASK) != 0;
+    if (shared_l()) {
+        // One storage: the GPU must be done rendering into it before the CPU
+        // reads, and done sampling it before the CPU writes.
+        bool gpuWrote = (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty);
+        if ((gpuWrote || (cpuWrites && mImageCount > 0)) && !HostGl::get().waitForGpu()) {
+            return UNKNOWN_ERROR;
+        }
+        mGpuDirty = false;
+        if (cpuWrites) mZeroContent = false;
+        mLockUsage = inUsage;
+        return NO_ERROR;
+    }
     // GPU rendering into the mirror reaches the CPU copy here.
     bool readback =
         mMirrorTexture != 0 && (usage & USAGE_HW_RENDER) != 0 && (mImageCount > 0 || mGpuDirty);
@@ -378,7 +438,7 @@ status_t GraphicBuffer::lockCommon_l(uint32_t inUsage) {
         }
         mGpuDirty = false;
     }
-    if ((inUsage & USAGE_SW_WRITE_MASK) != 0) {
+    if (cpuWrites) {
         mZeroContent = false;
         // A recycled mirror no longer holds what the CPU copy will.
         mSpareMatches = false;
@@ -422,7 +482,7 @@ status_t GraphicBuffer::lockYCbCr(uint32_t inUsage, android_ycbcr* ycbcr) {
 status_t GraphicBuffer::unlock() {
     std::lock_guard<std::mutex> guard(mLock);
     if (mLockUsage == 0) return INVALID_OPERATION;
-    bool wrote = (mLockUsage & USAGE_SW_WRITE_MASK) != 0;
+    bool wrote = (mLockUsage & USAGE_SW_WRITE_MASK) != 0 && !shared_l();
     mLockUsage = 0;
     if (wrote && !mReadbackCopy.empty() &&
         memcmp(mReadbackCopy.data(), mData, mReadbackCopy.size()) == 0) {
@@ -523,12 +583,24 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
     GLuint texture = mSpareTexture;
     if (texture == 0 && !gl.acquire()) return false;
     // A recycled mirror may already hold the CPU copy; an untouched buffer
-    // needs no conversion: its mirror gets what zeros convert to.
+    // needs no conversion: its mirror gets what zeros convert to. Shared
+    // memory needs nothing at all: it is the mirror's storage.
     const bool matches = texture != 0 && mSpareMatches;
-    const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
     bool made = false;
-    bool ok = (matches || mZeroContent || rgba != nullptr) && gl.run([&] {
+    bool ok = gl.run([&] {
         bool fresh = texture == 0;
+        GLuint memory = 0;
+        if (fresh && mShared != nullptr) {
+            texture = gl.importTexture_l(*mShared, (uint32_t)width, (uint32_t)height, &memory);
+            if (texture != 0) {
+                mMirrorTexture = texture;
+                mMemoryObject = memory;
+                made = true;
+                return then();
+            }
+        }
+        const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
+        if (!matches && !mZeroContent && rgba == nullptr) return false;
         if (fresh) {
             glGenTextures(1, &texture);
             glBindTexture(GL_TEXTURE_2D, texture);

@@ -121,6 +121,32 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     EXPECT_EQ(gpuPixels(display(), written), std::vector<uint8_t>(w * h * 4, 0x33));
 }
 
+// Shared storage (rows as long as the driver's) is recycled with its texture:
+// clean for a render target on both sides at once, as it was for a texture.
+TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
+    const int w = 16, h = 4;
+    const size_t bytes = w * h * 4;
+    const void* old = useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
+    sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(bytes, 0));
+    EXPECT_TRUE(target->sharesGpuStorage());
+    void* pixels = nullptr;
+    ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
+    EXPECT_EQ(pixels, old);
+    const uint8_t* p = static_cast<const uint8_t*>(pixels);
+    EXPECT_EQ(std::vector<uint8_t>(p, p + bytes), std::vector<uint8_t>(bytes, 0));
+    ASSERT_EQ(target->unlock(), android::NO_ERROR);
+
+    useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
+    EXPECT_EQ(gpuPixels(display(), source), std::vector<uint8_t>(bytes, 0x5A));
+    ASSERT_EQ(source->lock(kWrite, &pixels), android::NO_ERROR);
+    memset(pixels, 0x33, bytes);
+    ASSERT_EQ(source->unlock(), android::NO_ERROR);
+    EXPECT_EQ(gpuPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
+    EXPECT_EQ(source->getUploadCount() + target->getReadbackCount(), 0u);
+}
+
 TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {
     GlContext gl;
     ASSERT_TRUE(gl.ok());

@@ -241,6 +241,75 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
     EXPECT_EQ(buffer->getReadbackCount(), 1u);
 }
 
+// 16 RGBA pixels make a row exactly as long as Mesa's texture rows: such a
+// buffer's CPU pixels are the GPU's storage, and nothing is ever copied.
+TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
+    const int w = 16, h = 6;
+    sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    uint8_t* pixels = lock(buffer, kWrite);
+    ASSERT_NE(pixels, nullptr);
+    std::vector<uint8_t> pattern(w * h * 4);
+    for (size_t i = 0; i < pattern.size(); ++i) pattern[i] = static_cast<uint8_t>(i * 7 + 3);
+    memcpy(pixels, pattern.data(), pattern.size());
+    ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+
+    BufferView view(display(), buffer);
+    ASSERT_TRUE(view.ok());
+    EXPECT_TRUE(buffer->sharesGpuStorage());
+    view.bind();
+    EXPECT_EQ(GlTest_readPixels(w, h), pattern);  // written before the image existed
+
+    // A CPU write shows at once; the same memory comes back on every lock.
+    uint8_t* again = lock(buffer, kWrite);
+    EXPECT_EQ(again, pixels);
+    memset(again, 0x44, pattern.size());
+    ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+    view.bind();
+    EXPECT_EQ(GlTest_readPixels(w, h), std::vector<uint8_t>(pattern.size(), 0x44));
+
+    // Rendering, not flushed: the lock waits for it.
+    view.bind();
+    GlTest_fillHalves(w, h);
+    pixels = lock(buffer, kRead);
+    ASSERT_NE(pixels, nullptr);
+    expectHalves(pixels, w, h, w * 4);
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(buffer->getUploadCount() + buffer->getReadbackCount(), 0u);
+
+    // Rows padded differently (10 pixels) keep a copy on each side.
+    sp<GraphicBuffer> narrow = new GraphicBuffer(10, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    BufferView narrowView(display(), narrow);
+    ASSERT_TRUE(narrowView.ok());
+    EXPECT_FALSE(narrow->sharesGpuStorage());
+}
+
+// Work flushed by one thread is complete for a lock on another, even when the
+// lock comes long before the rasterizer could have finished a picture this big.
+TEST_F(GraphicBufferSyncTest, SharedStorageIsCompleteForALockOnAnotherThread) {
+    const int w = 2048, h = 2048;
+    sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
+    BufferView view(display(), buffer);
+    ASSERT_TRUE(view.ok());
+    ASSERT_TRUE(buffer->sharesGpuStorage());
+    view.bind();
+    GlTest_fillHalves(w, h);
+    glFlush();
+    bool locked = false;
+    std::vector<uint8_t> column;  // the last pixel of every row
+    std::thread reader([&] {
+        void* address = nullptr;
+        if (buffer->lock(kRead, &address) != android::NO_ERROR) return;
+        locked = true;
+        const uint8_t* p = static_cast<const uint8_t*>(address);
+        for (int y = 0; y < h; ++y)
+            column.insert(column.end(), p + (y * w + w - 1) * 4, p + (y * w + w) * 4);
+        buffer->unlock();
+    });
+    reader.join();
+    ASSERT_TRUE(locked);
+    expectHalves(column.data(), 1, h, 4);
+}
+
 TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDisplay) {
     const int w = 4, h = 4;
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);

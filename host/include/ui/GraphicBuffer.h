@@ -47,6 +47,8 @@
 
 namespace android {
 
+class SharedPixels;
+
 class GraphicBuffer : public ANativeWindowBuffer, public RefBase {
 public:
     enum {
@@ -111,7 +113,8 @@ public:
 
     // An EGL image over the GPU mirror (created on first use), for `display`,
     // which must be the display of the host graphics context. EGL_NO_IMAGE_KHR
-    // on failure.
+    // on failure. The image must not outlive the buffer (the EGL seam's
+    // images hold a reference on theirs): its storage may be the buffer's.
     EGLImageKHR createEglImage(EGLDisplay display);
     // Called after an image from createEglImage() was destroyed.
     void onEglImageDestroyed();
@@ -124,6 +127,8 @@ public:
     // Counters for tests: transfers between the CPU copy and the mirror.
     uint32_t getUploadCount() const { return mUploadCount; }
     uint32_t getReadbackCount() const { return mReadbackCount; }
+    // For tests: the CPU pixels are the GPU's storage itself (no transfers).
+    bool sharesGpuStorage();
 
     GraphicBuffer(const GraphicBuffer&) = delete;
     GraphicBuffer& operator=(const GraphicBuffer&) = delete;
@@ -151,6 +156,8 @@ private:
     bool fromRgba_l(const unsigned char* rgba);
     // Clears the mirror to what an all-zero CPU copy converts to.
     bool clearMirror_l(unsigned int texture);
+    // Whether the mirror (or the spare) is the CPU copy's own memory.
+    bool shared_l() const { return mMemoryObject != 0; }
 
     static void incRef(android_native_base_t* base);
     static void decRef(android_native_base_t* base);
@@ -175,6 +182,12 @@ private:
     bool mZeroPending;
     // mSpareTexture already holds the CPU copy (a recycled texture-only buffer).
     bool mSpareMatches;
+    // Memory the driver can take as a texture's storage (RGBA buffers whose
+    // rows fall where the driver's texture rows do): mData points into it.
+    std::unique_ptr<SharedPixels> mShared;
+    // Holds the import of mShared by the mirror (or the spare), 0 when the
+    // mirror has storage of its own and is kept up to date by copies.
+    unsigned int mMemoryObject;
     int mImageCount;
     bool mGpuDirty;
     // The CPU copy as the last readback left it, while that lock is held: an
