@@ -17,6 +17,7 @@ target_link_options(kiv_android INTERFACE "LINKER:-rpath,${KIV_ANDROID_LIBDIR}")
 pkg_check_modules(KIV_EGL REQUIRED IMPORTED_TARGET egl)
 pkg_check_modules(KIV_GLES REQUIRED IMPORTED_TARGET glesv2)
 pkg_check_modules(KIV_TURBOJPEG REQUIRED IMPORTED_TARGET libturbojpeg)
+pkg_check_modules(KIV_JPEG REQUIRED IMPORTED_TARGET libjpeg)
 pkg_check_modules(KIV_PNG REQUIRED IMPORTED_TARGET libpng)
 pkg_check_modules(KIV_EXIF REQUIRED IMPORTED_TARGET libexif)
 

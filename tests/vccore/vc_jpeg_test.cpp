@@ -193,6 +193,69 @@ TEST(VcJpeg, DecodeIntoEachFormat) {
     for (VCImage* i : {source, rgba, bgr, nv21, odd, refused}) VCImage_destroy(i);
 }
 
+// NV21 and NV12 are decoded a band of rows at a time; the result must be the
+// whole picture decoded to RGBA (by TurboJPEG) and then converted, byte for
+// byte, whatever the stream's sampling, scan structure and size.
+TEST(VcJpeg, BandedDecodeEqualsWholeDecodeAndConversion) {
+    REQUIRE_GENERAL_CODECS();
+    struct Case {
+        int w, h, subsampling, flags;
+    } cases[] = {{64, 48, TJSAMP_420, 0},  {250, 38, TJSAMP_420, 0},  // bands of 16, 16 and 6 rows
+                 {96, 34, TJSAMP_422, 0},  {48, 18, TJSAMP_444, TJFLAG_PROGRESSIVE},
+                 {40, 20, TJSAMP_GRAY, 0}, {2, 2, TJSAMP_420, 0}};
+    for (const Case& c : cases) {
+        // A handle per picture: TurboJPEG keeps the progressive setting on one.
+        tjhandle tj = tjInitCompress();
+        VCImage* source = makeRgba(c.w, c.h);
+        unsigned char* stream = nullptr;
+        unsigned long length = 0;
+        ASSERT_EQ(tjCompress2(tj, source->data, c.w, 0, c.h, TJPF_RGBA, &stream, &length,
+                              c.subsampling, 90, c.flags),
+                  0);
+        Bytes jpeg(stream, stream + length);
+        tjFree(stream);
+        tjDestroy(tj);
+        int w, h, s, rc = 1;
+        Bytes whole = turboDecode(jpeg, TJPF_RGBA, &w, &h, &s);
+        ASSERT_FALSE(whole.empty()) << c.w << "x" << c.h;
+        for (uint32_t format : {VC_FORMAT_NV21, VC_FORMAT_NV12}) {
+            VCImage* decoded = decodeInto(format, jpeg, &rc);
+            ASSERT_EQ(rc, 0) << c.w << "x" << c.h;
+            EXPECT_EQ(bytesOf(decoded), convertBytes(whole, c.w, c.h, VC_FORMAT_RGBA, format))
+                << c.w << "x" << c.h << " sampling " << c.subsampling;
+            VCImage_destroy(decoded);
+        }
+        // Into a caller's buffer whose chroma plane is kept apart (a padded
+        // camera buffer): each band's chroma rows land there.
+        const size_t luma = static_cast<size_t>(c.w) * c.h, chromaAt = luma + 64;
+        Bytes caller(chromaAt + luma / 2, 0xEE);
+        VCImage* padded = VCImage_createWrap(caller.data(), c.w, c.h, VC_FORMAT_NV21, 0,
+                                             static_cast<uint32_t>(chromaAt));
+        ASSERT_EQ(VCImage_decodeFromJpeg(padded, jpeg.data(), static_cast<int>(jpeg.size())), 0);
+        VCImage* wholeImage = VCImage_createWrap(whole.data(), c.w, c.h, VC_FORMAT_RGBA, 0, 0);
+        EXPECT_EQ(caller, convertTo(wholeImage, VC_FORMAT_NV21, static_cast<uint32_t>(chromaAt)))
+            << c.w << "x" << c.h;
+        for (VCImage* i : {source, padded, wholeImage}) VCImage_destroy(i);
+    }
+
+    // PNG too, interlaced (whole first) or not (row by row).
+    for (bool interlaced : {false, true}) {
+        PngPicture picture;
+        picture.width = 36;
+        picture.height = 22;
+        picture.interlaced = interlaced;
+        for (int i = 0; i < 36 * 22 * 4; ++i)
+            picture.samples.push_back(static_cast<unsigned char>(i % 4 == 3 ? 255 : i * 37 % 251));
+        int rc = 1;
+        VCImage* decoded = decodeInto(VC_FORMAT_NV21, makePng(picture), &rc);
+        ASSERT_EQ(rc, 0) << interlaced;
+        EXPECT_EQ(bytesOf(decoded),
+                  convertBytes(picture.samples, 36, 22, VC_FORMAT_RGBA, VC_FORMAT_NV21))
+            << interlaced;
+        VCImage_destroy(decoded);
+    }
+}
+
 TEST(VcJpeg, DecodeIntoExistingBuffers) {
     REQUIRE_GENERAL_CODECS();
     VCImage* source = makeRgba(64, 48);

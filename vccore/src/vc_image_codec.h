@@ -5,6 +5,7 @@
 #include <stddef.h>
 #include <stdint.h>
 
+#include <functional>
 #include <memory>
 
 #include "vccore/vc_image.h"
@@ -24,21 +25,30 @@ typedef unsigned char* (*VCFastJpegDecode_t)(const unsigned char* bytes, uint32_
                                              int* width, int* height, uint32_t format);
 }
 
-// TurboJPEG settings of the general codec; the benchmark uses the same ones.
-// Decoding stops at the first warning, so truncated and corrupt streams fail
-// instead of yielding grey-filled pictures, and scan counts are bounded.
+// TurboJPEG settings of the general codec; the benchmark and the tests hand
+// the same ones to TurboJPEG. Decoding stops at the first warning, so
+// truncated and corrupt streams fail instead of yielding grey-filled
+// pictures, and scan counts are bounded (the decoder, on libjpeg's scanline
+// interface, applies these rules itself).
 #define VC_JPEG_DECODE_FLAGS (TJFLAG_STOPONWARNING | TJFLAG_LIMITSCANS)
 #define VC_JPEG_ENCODE_FLAGS 0
 #define VC_JPEG_SUBSAMPLING TJSAMP_420
 
 // One decoding of a compressed picture by the general decoders: the header
-// first, then straight-alpha RGBA pixels (stride width·4). Nothing is logged.
+// first, then straight-alpha RGBA pixels (stride width·4), whole or in bands
+// of rows. Nothing is logged.
 class VCPictureReader {
 public:
     virtual ~VCPictureReader() = default;
     virtual bool readHeader(int* width, int* height) = 0;
     // Only after a successful readHeader; rgba holds width·height·4 bytes.
     virtual bool readRgba(unsigned char* rgba) = 0;
+    // Only after a successful readHeader, instead of readRgba: decodes `rows`
+    // rows at a time (fewer in the last band) into `rgba`, which holds that
+    // many, and calls band(firstRow, count) after each. False when decoding
+    // or a band fails.
+    virtual bool readRgbaBands(unsigned char* rgba, int rows,
+                               const std::function<bool(int, int)>& band) = 0;
 };
 
 // A reader for JPEG or PNG data, null for anything else.

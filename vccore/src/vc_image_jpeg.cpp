@@ -67,8 +67,48 @@ bool decodeWithFastCodec(VCImage* image, const unsigned char* bytes, int length)
     return true;
 }
 
-// The general decoders write straight-alpha RGBA; other formats go through a
-// temporary RGBA picture and the converter.
+// Formats converted from RGBA a band of rows at a time: rows depend only on
+// their own pair of source rows, and one chroma plane follows the luma.
+bool convertsInBands(uint32_t format) {
+    return format == VC_FORMAT_NV21 || format == VC_FORMAT_NV12;
+}
+
+// Rows of a band: even (4:2:0 chroma pairs them), and small enough for the
+// cache.
+const int kBandRows = 16;
+
+// Decodes into `image` (which has the picture's geometry and a buffer) band by
+// band through a small RGBA buffer: no picture-sized RGBA intermediate.
+int decodeInBands(VCPictureReader& reader, VCImage* image) {
+    const int width = image->width;
+    const int height = image->height;
+    unsigned char* band =
+        static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4 * kBandRows));
+    if (band == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    const size_t luma = static_cast<size_t>(width) * height;
+    const size_t chroma = image->uvOffset != 0 ? image->uvOffset : luma;
+    int converted = 0;
+    bool ok = reader.readRgbaBands(band, kBandRows, [&](int first, int count) {
+        // The band's rows of the picture, their chroma rows where the
+        // picture keeps them.
+        size_t start = static_cast<size_t>(first) * width;
+        size_t bandChroma = chroma + static_cast<size_t>(first / 2) * width;
+        VCImage* from = VCImage_createWrap(band, width, count, VC_FORMAT_RGBA, 0, 0);
+        VCImage* to = VCImage_createWrap(image->data + start, width, count, image->format, 0,
+                                         static_cast<uint32_t>(bandChroma - start));
+        converted =
+            (from != nullptr && to != nullptr) ? VCImage_convert(from, to) : VC_ERROR_ALLOC_FAILED;
+        VCImage_destroy(from);
+        VCImage_destroy(to);
+        return converted == 0;
+    });
+    free(band);
+    if (converted != 0) return converted;
+    return ok ? 0 : VC_ERROR_CODEC_FAILED;
+}
+
+// The general decoders write straight-alpha RGBA; NV21 and NV12 are converted
+// band by band, other formats through a temporary RGBA picture.
 int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
     std::unique_ptr<VCPictureReader> reader =
         VCPictureReader_create(bytes, static_cast<size_t>(length));
@@ -96,6 +136,15 @@ int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
     if (!hadBuffer) {
         int allocated = VCImage_allocate(image);
         if (allocated < 0) return allocated;
+    }
+    if (convertsInBands(image->format) && required != 0) {
+        int rc = decodeInBands(*reader, image);
+        if (rc != VC_ERROR_CODEC_FAILED) return rc;
+        // As below: a stream that does not decode leaves the record as it was.
+        if (!hadBuffer) VCImage_deallocate(image);
+        image->width = oldWidth;
+        image->height = oldHeight;
+        return VC_REPORT(VC_ERROR_CODEC_FAILED);
     }
     const bool inPlace = image->format == VC_FORMAT_RGBA;
     VCImage* rgba = inPlace ? VCImage_createWrap(image->data, width, height, VC_FORMAT_RGBA,

@@ -7,6 +7,7 @@
 #include <png.h>
 #include <stdio.h>
 #include <stdlib.h>
+#include <string.h>
 
 #include "vc_image_codec.h"
 
@@ -62,7 +63,7 @@ public:
             png_set_gray_to_rgb(mPng);
         if ((colorType & PNG_COLOR_MASK_ALPHA) == 0 && !transparency)
             png_set_add_alpha(mPng, 0xFF, PNG_FILLER_AFTER);
-        png_set_interlace_handling(mPng);
+        mPasses = png_set_interlace_handling(mPng);
         png_read_update_info(mPng, mInfo);
         mWidth = png_get_image_width(mPng, mInfo);
         mHeight = png_get_image_height(mPng, mInfo);
@@ -86,16 +87,52 @@ public:
         return true;
     }
 
+    bool readRgbaBands(unsigned char* rgba, int rows,
+                       const std::function<bool(int, int)>& band) override {
+        if (mHeight == 0 || rows < 1) return false;
+        const size_t stride = static_cast<size_t>(mWidth) * 4;
+        const int height = static_cast<int>(mHeight);
+        if (mPasses != 1) {
+            // Interlaced rows are only complete after the last pass.
+            unsigned char* whole = static_cast<unsigned char*>(malloc(stride * mHeight));
+            bool ok = whole != nullptr && readRgba(whole);
+            for (int first = 0; ok && first < height; first += rows) {
+                int count = height - first < rows ? height - first : rows;
+                memcpy(rgba, whole + first * stride, count * stride);
+                ok = band(first, count);
+            }
+            free(whole);
+            return ok;
+        }
+        free(mRows);
+        mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * rows));
+        if (mRows == nullptr) return false;
+        for (int i = 0; i < rows; ++i) mRows[i] = rgba + i * stride;
+        for (int first = 0; first < height; first += rows) {
+            int count = height - first < rows ? height - first : rows;
+            if (!readRows(count) || !band(first, count)) return false;
+        }
+        return true;
+    }
+
     PngReader(const PngReader&) = delete;
     PngReader& operator=(const PngReader&) = delete;
 
 private:
+    // The next `count` rows into mRows; a libpng error returns here.
+    bool readRows(int count) {
+        if (setjmp(png_jmpbuf(mPng))) return false;
+        png_read_rows(mPng, mRows, nullptr, static_cast<png_uint_32>(count));
+        return true;
+    }
+
     MemorySource mSource;
     png_structp mPng = nullptr;
     png_infop mInfo = nullptr;
     png_bytep* mRows = nullptr;
     png_uint_32 mWidth = 0;
     png_uint_32 mHeight = 0;
+    int mPasses = 1;
 };
 
 struct PngWriteState {

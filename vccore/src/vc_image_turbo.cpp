@@ -1,8 +1,14 @@
-// The general JPEG codec: libjpeg-turbo's TurboJPEG API, used where the
-// platform's fast codec is not installed.
+// The general JPEG codec: libjpeg-turbo (its TurboJPEG API to encode, its
+// scanline interface to decode), used where the platform's fast codec is not
+// installed.
+#include <setjmp.h>
+#include <stdint.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 #include <turbojpeg.h>
+// jpeglib.h needs stdio.h (FILE) before it.
+#include <jpeglib.h>
 
 #include <vector>
 
@@ -11,41 +17,125 @@
 
 namespace {
 
+// Decoding goes through libjpeg-turbo's scanline interface (the engine under
+// TurboJPEG, with TurboJPEG's default settings), so that a picture can be
+// decoded a band of rows at a time instead of whole.
+//
+// libjpeg reports errors by longjmp back to the setjmp of the calling
+// function, so the functions that call into it keep no objects with
+// destructors of their own.
 class JpegReader : public VCPictureReader {
 public:
-    JpegReader(const unsigned char* bytes, size_t length)
-        : mTurbo(tjInitDecompress()), mBytes(bytes), mLength(length) {}
+    JpegReader(const unsigned char* bytes, size_t length) : mBytes(bytes), mLength(length) {
+        mInfo.err = jpeg_std_error(&mError.base);
+        mError.base.error_exit = onError;
+        mError.base.emit_message = onMessage;
+        mError.base.output_message = [](j_common_ptr) {};
+        mProgress.progress_monitor = onProgress;
+    }
     ~JpegReader() override {
-        if (mTurbo != nullptr) tjDestroy(mTurbo);
+        if (mCreated) jpeg_destroy_decompress(&mInfo);
     }
 
     bool readHeader(int* width, int* height) override {
-        if (mTurbo == nullptr) return false;
-        int subsampling = 0;
-        int colorspace = 0;
-        if (tjDecompressHeader3(mTurbo, mBytes, mLength, &mWidth, &mHeight, &subsampling,
-                                &colorspace) != 0)
+        if (setjmp(mError.jump)) return false;
+        jpeg_create_decompress(&mInfo);
+        mCreated = true;
+        mInfo.progress = &mProgress;
+        jpeg_mem_src(&mInfo, mBytes, static_cast<unsigned long>(mLength));
+        jpeg_read_header(&mInfo, TRUE);
+        if (mInfo.image_width < 1 || mInfo.image_height < 1 ||
+            mInfo.image_width > static_cast<JDIMENSION>(INT32_MAX / 4) ||
+            mInfo.image_height > static_cast<JDIMENSION>(INT32_MAX))
             return false;
-        if (mWidth < 1 || mHeight < 1) return false;
-        *width = mWidth;
-        *height = mHeight;
+        *width = static_cast<int>(mInfo.image_width);
+        *height = static_cast<int>(mInfo.image_height);
+        mHeaderRead = true;
         return true;
     }
 
     bool readRgba(unsigned char* rgba) override {
-        return tjDecompress2(mTurbo, mBytes, mLength, rgba, mWidth, mWidth * 4, mHeight, TJPF_RGBA,
-                             VC_JPEG_DECODE_FLAGS) == 0;
+        return mHeaderRead && readRgbaBands(rgba, static_cast<int>(mInfo.image_height),
+                                            [](int, int) { return true; });
+    }
+
+    bool readRgbaBands(unsigned char* rgba, int rows,
+                       const std::function<bool(int, int)>& band) override {
+        if (!mHeaderRead || rows < 1 || !start()) return false;
+        const int height = static_cast<int>(mInfo.image_height);
+        for (int first = 0; first < height; first += rows) {
+            const int count = height - first < rows ? height - first : rows;
+            if (!readRows(rgba, count) || !band(first, count)) return false;
+        }
+        return finish();
     }
 
     JpegReader(const JpegReader&) = delete;
     JpegReader& operator=(const JpegReader&) = delete;
 
 private:
-    tjhandle mTurbo;
+    static constexpr int kMaxRowsPerRead = 16;
+    // Beyond this many scans a progressive picture is refused: each one costs
+    // a pass over the whole image, and a few bytes of stream make one.
+    static constexpr int kMaxScans = 500;
+
+    struct ErrorManager {
+        jpeg_error_mgr base;
+        jmp_buf jump;
+    };
+
+    [[noreturn]] static void onError(j_common_ptr info) {
+        longjmp(reinterpret_cast<ErrorManager*>(info->err)->jump, 1);
+    }
+    // A warning (a corrupt or truncated stream that would decode as grey)
+    // stops the picture; trace messages (level > 0) are ignored.
+    static void onMessage(j_common_ptr info, int level) {
+        if (level < 0) onError(info);
+    }
+    static void onProgress(j_common_ptr info) {
+        if (info->is_decompressor &&
+            reinterpret_cast<j_decompress_ptr>(info)->input_scan_number > kMaxScans)
+            onError(info);
+    }
+
+    // Each call into libjpeg sits in a function of its own with its own
+    // setjmp, so that nothing a longjmp skips is still in use.
+    bool start() {
+        if (setjmp(mError.jump)) return false;
+        mInfo.out_color_space = JCS_EXT_RGBA;
+        jpeg_start_decompress(&mInfo);
+        return mInfo.output_width == mInfo.image_width &&
+               mInfo.output_height == mInfo.image_height && mInfo.output_components == 4;
+    }
+
+    // The next `count` rows, at the start of `rgba`.
+    bool readRows(unsigned char* rgba, int count) {
+        const size_t stride = static_cast<size_t>(mInfo.output_width) * 4;
+        JSAMPROW pointers[kMaxRowsPerRead];
+        if (setjmp(mError.jump)) return false;
+        for (int done = 0; done < count;) {
+            int want = count - done < kMaxRowsPerRead ? count - done : kMaxRowsPerRead;
+            for (int i = 0; i < want; ++i) pointers[i] = rgba + (done + i) * stride;
+            JDIMENSION got = jpeg_read_scanlines(&mInfo, pointers, static_cast<JDIMENSION>(want));
+            if (got == 0) return false;  // the source ran dry
+            done += static_cast<int>(got);
+        }
+        return true;
+    }
+
+    bool finish() {
+        if (setjmp(mError.jump)) return false;
+        jpeg_finish_decompress(&mInfo);
+        return true;
+    }
+
     const unsigned char* mBytes;
-    unsigned long mLength;
-    int mWidth = 0;
-    int mHeight = 0;
+    size_t mLength;
+    jpeg_decompress_struct mInfo{};
+    ErrorManager mError{};
+    jpeg_progress_mgr mProgress{};
+    bool mCreated = false;
+    bool mHeaderRead = false;
 };
 
 // TurboJPEG pixel format of an RGB-family or grey image, -1 otherwise.
