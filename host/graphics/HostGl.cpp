@@ -37,6 +37,7 @@ std::atomic<void (*)()> gDisplayIdleHook{nullptr};
 // first import tries, then settled for the process (one driver per process).
 enum ImportState { IMPORT_UNKNOWN, IMPORT_WORKS, IMPORT_FAILS };
 std::atomic<int> gImportState{IMPORT_UNKNOWN};
+std::atomic<bool> gImportAllowed{true};
 
 struct MemoryObjectApi {
     PFNGLCREATEMEMORYOBJECTSEXTPROC create = nullptr;
@@ -252,7 +253,11 @@ GLuint HostGl::framebuffer_l() {
 }
 
 bool HostGl::mayImport() {
-    return gImportState.load() != IMPORT_FAILS;
+    return gImportAllowed.load() && gImportState.load() != IMPORT_FAILS;
+}
+
+void HostGl::allowImports(bool allowed) {
+    gImportAllowed = allowed;
 }
 
 GLuint HostGl::importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
@@ -263,7 +268,7 @@ GLuint HostGl::importTexture_l(const SharedPixels& pixels, uint32_t width, uint3
         gImportState = works ? IMPORT_WORKS : IMPORT_FAILS;
         if (!works) VF_LogMsg(VF_LOG_INFO, "HostGl: no shared texture memory; buffers are copied");
     }
-    if (gImportState.load() != IMPORT_WORKS) return 0;
+    if (gImportState.load() != IMPORT_WORKS || !gImportAllowed.load()) return 0;
     return import_l(pixels, width, height, memoryObject);
 }
 

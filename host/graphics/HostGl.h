@@ -64,6 +64,8 @@ public:
     // False once an import has proven impossible, so callers can keep plain
     // memory instead.
     static bool mayImport();
+    // Whether imports may be tried at all (see GraphicBuffer::allowSharedStorage).
+    static void allowImports(bool allowed);
 
     // Called (on the terminating thread, no lock held) when every other user
     // of the display this context lives on has terminated it, so that what

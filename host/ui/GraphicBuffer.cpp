@@ -118,21 +118,24 @@ struct Recycled {
     unsigned char* data = nullptr;
     GLuint texture = 0;
     std::unique_ptr<unsigned char[]> rgbaScratch;
-    std::unique_ptr<SharedPixels> shared;  // data points into it, when set
-    GLuint memoryObject = 0;               // the texture's storage is `shared`
+    std::unique_ptr<SharedPixels> shared;        // data points into it, when set
+    std::unique_ptr<SharedPixels> mirrorPixels;  // the texture's own storage, when set
+    GLuint memoryObject = 0;                     // the import of either
 
     size_t bytes() const {
         // The CPU copy, the mirror and the staging memory, if any; shared
         // memory is both of the first two.
         size_t rgba = (size_t)width * height * 4;
         size_t staging = rgbaScratch != nullptr ? rgba : 0;
-        if (memoryObject != 0) return shared->fileSize() + staging;
-        return bytesOf(fourcc, height, stride) + rgba + staging;
+        if (memoryObject != 0 && shared != nullptr) return shared->fileSize() + staging;
+        size_t mirror = mirrorPixels != nullptr ? mirrorPixels->fileSize() : rgba;
+        return bytesOf(fourcc, height, stride) + mirror + staging;
     }
     void free() {
         if (texture != 0) deleteMirror(texture, memoryObject);
         if (shared == nullptr) ::free(data);
         shared.reset();
+        mirrorPixels.reset();
         texture = 0;
         memoryObject = 0;
         data = nullptr;
@@ -180,10 +183,11 @@ public:
     bool take(uint32_t fourcc, uint32_t w, uint32_t h, uint32_t stride, bool render,
               Recycled* out) {
         std::lock_guard<std::mutex> guard(mLock);
+        const bool imports = HostGl::mayImport();
         for (size_t i = mEntries.size(); i-- > 0;) {
             Recycled& e = mEntries[i];
             if (e.fourcc == fourcc && e.width == w && e.height == h && e.stride == stride &&
-                e.render == render) {
+                e.render == render && (imports || e.memoryObject == 0)) {
                 mBytes -= e.bytes();
                 *out = std::move(e);
                 mEntries.erase(mEntries.begin() + (ptrdiff_t)i);
@@ -316,6 +320,7 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
         mSpareTexture = recycled.texture;
         mRgbaScratch = std::move(recycled.rgbaScratch);
         mShared = std::move(recycled.shared);
+        mMirrorPixels = std::move(recycled.mirrorPixels);
         mMemoryObject = recycled.memoryObject;
         // What the GPU renders into starts clean, so that nothing drawn for
         // one buffer ever shows in another. A texture-only buffer keeps the
@@ -363,9 +368,10 @@ GraphicBuffer::~GraphicBuffer() {
         entry.texture = texture;
         entry.rgbaScratch = std::move(mRgbaScratch);
         entry.shared = std::move(mShared);
+        entry.mirrorPixels = std::move(mMirrorPixels);
         entry.memoryObject = mMemoryObject;
-        // The next owner writes the storage itself: nothing may still draw
-        // from or into it then.
+        // The next owner reaches the storage from the CPU: nothing may still
+        // draw from or into it then.
         if (entry.memoryObject != 0 && !HostGl::get().waitForGpu()) {
             entry.free();
             return;
@@ -376,6 +382,10 @@ GraphicBuffer::~GraphicBuffer() {
     }
     if (texture != 0) deleteMirror(texture, mMemoryObject);
     if (mShared == nullptr) free(mData);
+}
+
+void GraphicBuffer::allowSharedStorage(bool allowed) {
+    HostGl::allowImports(allowed);
 }
 
 bool GraphicBuffer::sharesGpuStorage() {
@@ -588,9 +598,8 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
     const bool matches = texture != 0 && mSpareMatches;
     bool made = false;
     bool ok = gl.run([&] {
-        bool fresh = texture == 0;
         GLuint memory = 0;
-        if (fresh && mShared != nullptr) {
+        if (texture == 0 && mShared != nullptr) {
             texture = gl.importTexture_l(*mShared, (uint32_t)width, (uint32_t)height, &memory);
             if (texture != 0) {
                 mMirrorTexture = texture;
@@ -599,9 +608,23 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
                 return then();
             }
         }
+        // Storage of its own the CPU can reach, when the driver takes it.
+        bool imported = false;
+        if (texture == 0 && mShared == nullptr && HostGl::mayImport()) {
+            std::unique_ptr<SharedPixels> storage(new (std::nothrow) SharedPixels());
+            if (storage != nullptr && storage->allocate((uint32_t)width, (uint32_t)height)) {
+                texture = gl.importTexture_l(*storage, (uint32_t)width, (uint32_t)height, &memory);
+            }
+            if (texture != 0) {
+                mMirrorPixels = std::move(storage);
+                mMemoryObject = memory;
+                imported = true;
+            }
+        }
+        const bool fresh = texture == 0;
         const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
-        if (!matches && !mZeroContent && rgba == nullptr) return false;
-        if (fresh) {
+        bool fill = matches || mZeroContent || rgba != nullptr;
+        if (fill && fresh) {
             glGenTextures(1, &texture);
             glBindTexture(GL_TEXTURE_2D, texture);
             // Level 0 only: the texture must be complete to become an EGL image.
@@ -611,12 +634,20 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
             glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
             glBindTexture(GL_TEXTURE_2D, 0);
         }
-        made = (matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
-                                            : zeroMirror_l(texture, fresh))) &&
+        // Imported storage starts as zeros, RGBA zeros already.
+        bool zeroed = imported && !isYuv(mFourcc);
+        made = fill &&
+               (matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
+                                            : zeroed || zeroMirror_l(texture, fresh))) &&
                glGetError() == GL_NO_ERROR;
         if (!made) {
             VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed", width, height);
-            if (fresh) glDeleteTextures(1, &texture);
+            if (fresh && texture != 0) glDeleteTextures(1, &texture);
+            if (imported) {
+                HostGl::deleteImported_l(texture, mMemoryObject);
+                mMirrorPixels.reset();
+                mMemoryObject = 0;
+            }
             return false;
         }
         mMirrorTexture = texture;
@@ -672,7 +703,52 @@ bool GraphicBuffer::clearMirror_l(unsigned int texture) {
     return complete;
 }
 
+bool GraphicBuffer::writeMapped_l() {
+    unsigned char* mirror = mMirrorPixels->pixels();
+    const size_t pitch = SharedPixels::rowPitch((uint32_t)width);
+    const size_t row = (size_t)width * 4;
+    const Plane mirrorRows = {0, pitch, row, (size_t)height};
+    if (mFourcc == VC_FORMAT_RGBA) {
+        Plane own[1];
+        planesOf(mFourcc, width, height, stride, own);
+        restride(mData, own, mirror, &mirrorRows, 1);
+        return true;
+    }
+    // Converted straight into the mirror when its rows are packed.
+    if (pitch == row) return toRgba_l(mirror);
+    unsigned char* rgba = rgbaScratch_l();
+    if (rgba == nullptr || !toRgba_l(rgba)) return false;
+    const Plane packed = {0, row, row, (size_t)height};
+    restride(rgba, &packed, mirror, &mirrorRows, 1);
+    return true;
+}
+
+bool GraphicBuffer::readMapped_l() {
+    const unsigned char* mirror = mMirrorPixels->pixels();
+    const size_t pitch = SharedPixels::rowPitch((uint32_t)width);
+    const size_t row = (size_t)width * 4;
+    const Plane mirrorRows = {0, pitch, row, (size_t)height};
+    if (mFourcc == VC_FORMAT_RGBA) {
+        Plane own[1];
+        planesOf(mFourcc, width, height, stride, own);
+        restride(mirror, &mirrorRows, mData, own, 1);
+        return true;
+    }
+    if (pitch == row) return fromRgba_l(mirror);
+    unsigned char* rgba = rgbaScratch_l();
+    if (rgba == nullptr) return false;
+    const Plane packed = {0, row, row, (size_t)height};
+    restride(mirror, &mirrorRows, rgba, &packed, 1);
+    return fromRgba_l(rgba);
+}
+
 bool GraphicBuffer::upload_l() {
+    if (mapped_l()) {
+        // Once the GPU is done sampling the mirror, the CPU writes it.
+        if (!HostGl::get().waitForGpu() || !writeMapped_l()) return false;
+        ++mUploadCount;
+        return true;
+    }
     const unsigned char* rgba = rgbaForUpload_l();
     if (rgba == nullptr) return false;
     GLuint texture = mMirrorTexture;
@@ -688,6 +764,15 @@ bool GraphicBuffer::upload_l() {
 }
 
 bool GraphicBuffer::readback_l() {
+    if (mapped_l()) {
+        // Once the GPU is done rendering into the mirror, the CPU reads it.
+        if (!HostGl::get().waitForGpu() || !readMapped_l()) {
+            VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot read the GPU copy back");
+            return false;
+        }
+        ++mReadbackCount;
+        return true;
+    }
     // A compact RGBA copy is read straight into; other layouts convert after.
     unsigned char* rgba = isCompactRgba_l() ? mData : rgbaScratch_l();
     if (rgba == nullptr) return false;

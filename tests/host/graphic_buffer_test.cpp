@@ -150,32 +150,61 @@ TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
     EXPECT_EQ(buffer->getReadbackCount(), 0u);
 }
 
-TEST_F(GraphicBufferSyncTest, Nv21WritesReachTheGpuAsFullRangeRgba) {
-    const int w = 8, h = 4;
-    sp<GraphicBuffer> buffer =
-        new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
-    BufferView view(display(), buffer);
-    ASSERT_TRUE(view.ok());
-    uint8_t* nv21 = lock(buffer, kWrite);
-    ASSERT_NE(nv21, nullptr);
-    for (int i = 0; i < w * h; ++i) nv21[i] = (uint8_t)(16 + i * 7);
-    for (int i = 0; i < w * h / 2; ++i)
-        nv21[w * h + i] = (uint8_t)(i % 2 ? 40 + i * 9 : 230 - i * 11);
-    ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+// NV21 crosses as the image core's full-range conversion, both ways: through
+// GPU storage the CPU reaches (rows packed at 16 pixels, padded at 8) and
+// through GL transfers (when the driver cannot share memory).
+TEST_F(GraphicBufferSyncTest, Nv21CrossesAsFullRangeRgbaBothWays) {
+    auto converted = [](const uint8_t* pixels, int w, int h, uint32_t from, uint32_t to) {
+        VCImage* source = VCImage_createWrap(const_cast<uint8_t*>(pixels), w, h, from, 0, 0);
+        VCImage* target = VCImage_createNew(w, h, to);
+        EXPECT_EQ(VCImage_convert(source, target), 0);
+        std::vector<uint8_t> out(target->data, target->data + VCImage_size(target));
+        VCImage_destroy(target);
+        VCImage_destroy(source);
+        return out;
+    };
+    const int h = 4;
+    for (bool shared : {true, false}) {
+        for (int w : {8, 16}) {
+            SCOPED_TRACE(::testing::Message() << w << " wide, shared " << shared);
+            GraphicBuffer::allowSharedStorage(shared);
+            sp<GraphicBuffer> buffer =
+                new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
+            BufferView view(display(), buffer);
+            ASSERT_TRUE(view.ok());
+            uint8_t* nv21 = lock(buffer, kWrite);
+            ASSERT_NE(nv21, nullptr);
+            for (int i = 0; i < w * h; ++i) nv21[i] = (uint8_t)(16 + i * 7);
+            for (int i = 0; i < w * h / 2; ++i)
+                nv21[w * h + i] = (uint8_t)(i % 2 ? 40 + i * 9 : 230 - i * 11);
+            ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+            view.bind();
+            EXPECT_EQ(GlTest_readPixels(w, h),
+                      converted(nv21, w, h, VC_FORMAT_NV21, VC_FORMAT_RGBA));
+            // The CPU copy is the original, not the (lossy) RGBA mirror.
+            EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
+            EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+            EXPECT_EQ(buffer->getUploadCount(), 1u);
+            EXPECT_EQ(buffer->getReadbackCount(), 0u);
 
-    view.bind();
-    std::vector<uint8_t> gpu = GlTest_readPixels(w, h);
-    // The mirror holds exactly the image core's NV21 -> RGBA of the pixels.
-    VCImage* source = VCImage_createWrap(nv21, w, h, VC_FORMAT_NV21, 0, 0);
-    VCImage* expected = VCImage_createNew(w, h, VC_FORMAT_RGBA);
-    ASSERT_EQ(VCImage_convert(source, expected), 0);
-    EXPECT_EQ(gpu, std::vector<uint8_t>(expected->data, expected->data + w * h * 4));
-    VCImage_destroy(expected);
-    VCImage_destroy(source);
-    // The CPU copy is the original, not the (lossy) RGBA mirror.
-    EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
-    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getReadbackCount(), 0u);
+            // Rendered RGBA comes back converted to NV21.
+            sp<GraphicBuffer> target =
+                new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kRenderUsage);
+            BufferView targetView(display(), target);
+            ASSERT_TRUE(targetView.ok());
+            targetView.bind();
+            GlTest_fillHalves(w, h);
+            std::vector<uint8_t> rendered = GlTest_readPixels(w, h);
+            const uint8_t* back = lock(target, kRead);
+            ASSERT_NE(back, nullptr);
+            EXPECT_EQ(std::vector<uint8_t>(back, back + w * h * 3 / 2),
+                      converted(rendered.data(), w, h, VC_FORMAT_RGBA, VC_FORMAT_NV21));
+            EXPECT_EQ(target->unlock(), android::NO_ERROR);
+            EXPECT_EQ(target->getReadbackCount(), 1u);
+            EXPECT_FALSE(target->sharesGpuStorage());
+        }
+    }
+    GraphicBuffer::allowSharedStorage(true);
 }
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {

@@ -5,6 +5,7 @@
 #include <atomic>
 
 #include <GLES2/gl2.h>
+#include <ui/GraphicBuffer.h>
 
 namespace {
 
@@ -33,6 +34,9 @@ void GlFault_failProgramCreations(int count) {
 
 void GlFault_failPictureReads(int count) {
     gReadFaults = count;
+    // Host buffers that share their storage with the GPU have no read-back
+    // to fail: while armed, new ones copy through GL.
+    android::GraphicBuffer::allowSharedStorage(count == 0);
 }
 
 extern "C" GLuint glCreateProgram() {

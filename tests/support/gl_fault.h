@@ -5,7 +5,9 @@
 //  - glCreateProgram returns 0, as a driver out of program objects does;
 //  - glReadPixels of more than one pixel is passed on with a negative width,
 //    so that the driver itself records GL_INVALID_VALUE and writes nothing
-//    (how a failed read-back of a whole picture looks to its caller).
+//    (how a failed read-back of a whole picture looks to its caller); while
+//    armed, host buffers made from then on copy through GL instead of sharing
+//    their storage with the GPU, so that there is a read-back to fail.
 // Counts are per process; arming replaces the previous count.
 #ifndef KIV_TESTS_GL_FAULT_H
 #define KIV_TESTS_GL_FAULT_H

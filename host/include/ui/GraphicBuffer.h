@@ -129,6 +129,10 @@ public:
     uint32_t getReadbackCount() const { return mReadbackCount; }
     // For tests: the CPU pixels are the GPU's storage itself (no transfers).
     bool sharesGpuStorage();
+    // For tests of GL transfer failures: while false, buffers made (or
+    // recycled) from then on keep their GPU storage to the driver and move
+    // pixels with GL calls, as when the driver cannot share memory.
+    static void allowSharedStorage(bool allowed);
 
     GraphicBuffer(const GraphicBuffer&) = delete;
     GraphicBuffer& operator=(const GraphicBuffer&) = delete;
@@ -156,8 +160,13 @@ private:
     bool fromRgba_l(const unsigned char* rgba);
     // Clears the mirror to what an all-zero CPU copy converts to.
     bool clearMirror_l(unsigned int texture);
-    // Whether the mirror (or the spare) is the CPU copy's own memory.
-    bool shared_l() const { return mMemoryObject != 0; }
+    // Whether the mirror (or the spare) is the CPU copy's own memory...
+    bool shared_l() const { return mShared != nullptr && mMemoryObject != 0; }
+    // ...or has storage of its own that the CPU can reach, so that transfers
+    // are CPU copies and conversions instead of GL calls.
+    bool mapped_l() const { return mMirrorPixels != nullptr && mMemoryObject != 0; }
+    bool writeMapped_l();
+    bool readMapped_l();
 
     static void incRef(android_native_base_t* base);
     static void decRef(android_native_base_t* base);
@@ -185,8 +194,12 @@ private:
     // Memory the driver can take as a texture's storage (RGBA buffers whose
     // rows fall where the driver's texture rows do): mData points into it.
     std::unique_ptr<SharedPixels> mShared;
-    // Holds the import of mShared by the mirror (or the spare), 0 when the
-    // mirror has storage of its own and is kept up to date by copies.
+    // The mirror's own storage, when the driver took it but the CPU copy's
+    // layout differs (YUV, BGRA, rows padded otherwise).
+    std::unique_ptr<SharedPixels> mMirrorPixels;
+    // Holds the import of mShared or mMirrorPixels by the mirror (or the
+    // spare); 0 when the mirror's storage is the driver's own, reached by GL
+    // transfers only.
     unsigned int mMemoryObject;
     int mImageCount;
     bool mGpuDirty;
