@@ -703,41 +703,31 @@ bool GraphicBuffer::clearMirror_l(unsigned int texture) {
     return complete;
 }
 
-bool GraphicBuffer::writeMapped_l() {
+bool GraphicBuffer::transferMapped_l(bool toMirror) {
     unsigned char* mirror = mMirrorPixels->pixels();
     const size_t pitch = SharedPixels::rowPitch((uint32_t)width);
     const size_t row = (size_t)width * 4;
     const Plane mirrorRows = {0, pitch, row, (size_t)height};
-    if (mFourcc == VC_FORMAT_RGBA) {
-        Plane own[1];
-        planesOf(mFourcc, width, height, stride, own);
-        restride(mData, own, mirror, &mirrorRows, 1);
-        return true;
-    }
-    // Converted straight into the mirror when its rows are packed.
-    if (pitch == row) return toRgba_l(mirror);
-    unsigned char* rgba = rgbaScratch_l();
-    if (rgba == nullptr || !toRgba_l(rgba)) return false;
     const Plane packed = {0, row, row, (size_t)height};
-    restride(rgba, &packed, mirror, &mirrorRows, 1);
-    return true;
-}
-
-bool GraphicBuffer::readMapped_l() {
-    const unsigned char* mirror = mMirrorPixels->pixels();
-    const size_t pitch = SharedPixels::rowPitch((uint32_t)width);
-    const size_t row = (size_t)width * 4;
-    const Plane mirrorRows = {0, pitch, row, (size_t)height};
     if (mFourcc == VC_FORMAT_RGBA) {
         Plane own[1];
         planesOf(mFourcc, width, height, stride, own);
-        restride(mirror, &mirrorRows, mData, own, 1);
+        if (toMirror) {
+            restride(mData, own, mirror, &mirrorRows, 1);
+        } else {
+            restride(mirror, &mirrorRows, mData, own, 1);
+        }
         return true;
     }
-    if (pitch == row) return fromRgba_l(mirror);
+    // Converted straight into (or out of) the mirror when its rows are packed.
+    if (pitch == row) return toMirror ? toRgba_l(mirror) : fromRgba_l(mirror);
     unsigned char* rgba = rgbaScratch_l();
     if (rgba == nullptr) return false;
-    const Plane packed = {0, row, row, (size_t)height};
+    if (toMirror) {
+        if (!toRgba_l(rgba)) return false;
+        restride(rgba, &packed, mirror, &mirrorRows, 1);
+        return true;
+    }
     restride(mirror, &mirrorRows, rgba, &packed, 1);
     return fromRgba_l(rgba);
 }
@@ -745,7 +735,7 @@ bool GraphicBuffer::readMapped_l() {
 bool GraphicBuffer::upload_l() {
     if (mapped_l()) {
         // Once the GPU is done sampling the mirror, the CPU writes it.
-        if (!HostGl::get().waitForGpu() || !writeMapped_l()) return false;
+        if (!HostGl::get().waitForGpu() || !transferMapped_l(true)) return false;
         ++mUploadCount;
         return true;
     }
@@ -766,7 +756,7 @@ bool GraphicBuffer::upload_l() {
 bool GraphicBuffer::readback_l() {
     if (mapped_l()) {
         // Once the GPU is done rendering into the mirror, the CPU reads it.
-        if (!HostGl::get().waitForGpu() || !readMapped_l()) {
+        if (!HostGl::get().waitForGpu() || !transferMapped_l(false)) {
             VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot read the GPU copy back");
             return false;
         }

@@ -165,8 +165,9 @@ private:
     // ...or has storage of its own that the CPU can reach, so that transfers
     // are CPU copies and conversions instead of GL calls.
     bool mapped_l() const { return mMirrorPixels != nullptr && mMemoryObject != 0; }
-    bool writeMapped_l();
-    bool readMapped_l();
+    // Copies or converts the CPU copy into the mirror's mapped storage
+    // (toMirror) or back.
+    bool transferMapped_l(bool toMirror);
 
     static void incRef(android_native_base_t* base);
     static void decRef(android_native_base_t* base);
