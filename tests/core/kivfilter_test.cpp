@@ -11,15 +11,6 @@
 
 namespace {
 
-// Error lines end in the reporting line number, which moves with edits.
-size_t errorLines(const LogCapture& log, const std::string& prefix) {
-    size_t n = 0;
-    for (const LoggedLine& line : log.lines()) {
-        if (line.level == VF_LOG_ERROR && line.text.rfind(prefix, 0) == 0) ++n;
-    }
-    return n;
-}
-
 TEST(KivFilter, Values) {
     ProbeEffect effect(431);
     KivFilter* f = &effect;
@@ -89,7 +80,7 @@ TEST(KivFilter, ImageReplacement) {
     {
         LogCapture log;
         EXPECT_EQ(KivImaging_setInputImage(f, a, 4, 4, VC_FORMAT_NV21, 0), VC_ERROR_UNSUPPORTED);
-        EXPECT_EQ(errorLines(log, "VC_ERROR_UNSUPPORTED (-6): core/KivFilter:"), 1u);
+        EXPECT_EQ(log.countPrefix("VC_ERROR_UNSUPPORTED (-6): core/KivFilter:", VF_LOG_ERROR), 1u);
     }
     EXPECT_EQ(effect.inputImage(), nullptr);
     EXPECT_EQ(KivImaging_supportsInputFormat(f, static_cast<int>(VC_FORMAT_NV21)), 0);
@@ -118,7 +109,7 @@ TEST(KivFilter, WorkImageLifecycle) {
     std::vector<unsigned char> pixels(8 * 8 * 4, 0x5a);
     LogCapture log;
     EXPECT_EQ(KivImaging_init(f), VC_ERROR_UNKNOWN);  // no input yet
-    EXPECT_EQ(errorLines(log, "VC_ERROR_UNKNOWN (-1): core/KivFilter:"), 1u);
+    EXPECT_EQ(log.countPrefix("VC_ERROR_UNKNOWN (-1): core/KivFilter:", VF_LOG_ERROR), 1u);
 
     ASSERT_EQ(KivImaging_setInputImage(f, pixels.data(), 8, 4, VC_FORMAT_RGBA, 0), 0);
     ASSERT_EQ(KivImaging_init(f), 0);
@@ -161,7 +152,7 @@ TEST(KivFilter, WorkImageLifecycle) {
     effect->wantsWorkImage = true;
     ASSERT_EQ(KivImaging_setInputImage(f, pixels.data(), 4, 4, 0x12345678, 0), 0);
     EXPECT_EQ(KivImaging_init(f), VC_ERROR_ALLOC_FAILED);
-    EXPECT_EQ(errorLines(log, "VC_ERROR_ALLOC_FAILED (-5): core/KivFilter:"), 1u);
+    EXPECT_EQ(log.countPrefix("VC_ERROR_ALLOC_FAILED (-5): core/KivFilter:", VF_LOG_ERROR), 1u);
     EXPECT_EQ(effect->workImage(), nullptr);  // the old buffer is gone, not left dangling
     ASSERT_EQ(KivImaging_setOutputImage(f, pixels.data(), 4, 4, 0x12345678, 0), 0);
     ASSERT_EQ(KivImaging_init(f), VC_ERROR_ALLOC_FAILED);

@@ -30,11 +30,7 @@ TEST(KivFilterOptions, RegisteredOncePerProcess) {
         OnceEffect::VCOPTION_REGISTER();
     }
     OnceEffect c;
-    size_t registrations = 0;
-    for (const std::string& text : log.texts()) {
-        if (text.rfind("DEBUG: Registering option 'kivtest_once'", 0) == 0) ++registrations;
-    }
-    EXPECT_EQ(registrations, 1u);
+    EXPECT_EQ(log.countPrefix("DEBUG: Registering option 'kivtest_once'"), 1u);
     const VCOption_t* record = c.getOptionDesc("kivtest_once");
     ASSERT_NE(record, nullptr);
     EXPECT_EQ(VCOption_FindIdByName("kivtest_once"), record->key);

@@ -39,13 +39,8 @@ TEST(KivFilterOptionsThreads, ConcurrentFirstUseRegistersOnce) {
     go = true;
     for (std::thread& t : threads) t.join();
     for (int c : counts) EXPECT_EQ(c, 2);
-    size_t a = 0, b = 0;
-    for (const std::string& text : log.texts()) {
-        if (text.rfind("DEBUG: Registering option 'kivtest_raced_a'", 0) == 0) ++a;
-        if (text.rfind("DEBUG: Registering option 'kivtest_raced_b'", 0) == 0) ++b;
-    }
-    EXPECT_EQ(a, 1u);
-    EXPECT_EQ(b, 1u);
+    EXPECT_EQ(log.countPrefix("DEBUG: Registering option 'kivtest_raced_a'"), 1u);
+    EXPECT_EQ(log.countPrefix("DEBUG: Registering option 'kivtest_raced_b'"), 1u);
     const VCOption_t* const* options = RacedEffect::optionTable().options();
     EXPECT_EQ(VCOption_FindIdByName("kivtest_raced_a"), options[0]->key);
     EXPECT_EQ(VCOption_FindIdByName("kivtest_raced_b"), options[1]->key);

@@ -175,13 +175,9 @@ TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {
     log.clear();
     surface->release();
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Call to eglDestroySurface() failed."));
-    bool sawCheckLine = false;
-    for (const auto& l : log.texts()) {
-        sawCheckLine |=
-            l.rfind("EGL Error: 0x3001 'EGL_NOT_INITIALIZED' - result = eglDestroySurface(", 0) ==
-            0;
-    }
-    EXPECT_TRUE(sawCheckLine);
+    EXPECT_EQ(
+        log.countPrefix("EGL Error: 0x3001 'EGL_NOT_INITIALIZED' - result = eglDestroySurface("),
+        1u);
     EXPECT_EQ(surface->getEGLSurface(), EGL_NO_SURFACE);
 
     // A surface on the terminated display cannot be made.

@@ -192,11 +192,7 @@ TEST_F(EglImageTest, BadSizesAndFormatsFailAndLeaveNothing) {
     sp<EglImage> image = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 0, 0);
     LogCapture log;
     EXPECT_EQ(image->initialize(), VC_ERROR_INVALID_STATE);
-    bool reported = false;
-    for (const std::string& line : log.texts()) {
-        reported |= line.rfind("VC_ERROR_INVALID_STATE (-7): core/egl/EglImage:", 0) == 0;
-    }
-    EXPECT_TRUE(reported);
+    EXPECT_EQ(log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/egl/EglImage:"), 1u);
     EXPECT_EQ(image->getTextureID(), 0u);
     EXPECT_EQ(image->getFrameBufferID(), 0u);
     EXPECT_FALSE(image->isInitialized());

@@ -90,12 +90,6 @@ Pixels expectedFor(const Pixels& src, int type, bool keepAlpha = false) {
     return out;
 }
 
-bool loggedPrefix(const LogCapture& log, const std::string& prefix) {
-    for (const auto& l : log.texts())
-        if (l.rfind(prefix, 0) == 0) return true;
-    return false;
-}
-
 class EglProgramTest : public GlContextTest {
 protected:
     void SetUp() override {
@@ -332,7 +326,7 @@ TEST_F(EglProgramTest, DownloadableEffectSuppliesACompleteShader) {
     LogCapture log;
     normal();
     EXPECT_EQ(draw(), expectedFor(mSrc, EglProgram::GEOMETRY_NORMAL));
-    EXPECT_TRUE(loggedPrefix(log, "VC_ERROR_UNKNOWN (-1): core/egl/EglProgram:"));
+    EXPECT_EQ(log.countPrefix("VC_ERROR_UNKNOWN (-1): core/egl/EglProgram:"), 1u);
     EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
 }
 

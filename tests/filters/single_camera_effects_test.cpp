@@ -150,11 +150,8 @@ TEST_F(GlContextTest, BaseSnippetDrawsAndBrokenSnippetsFallBack) {
         LogCapture log;
         r = renderWithProgram(&effect, picture);
         EXPECT_TRUE(log.contains(4, "SingleEffect: could not load this shader"));
-        size_t reports = 0;
-        for (const std::string& line : log.texts())
-            reports +=
-                line.rfind("VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:", 0) == 0;
-        EXPECT_EQ(1u, reports);
+        EXPECT_EQ(1u,
+                  log.countPrefix("VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:"));
         EXPECT_TRUE(log.contains("GL Error: failed to load effect shader. Loading default."));
         EXPECT_EQ(opaque, r.pixels);
     }
@@ -165,10 +162,7 @@ TEST_F(GlContextTest, BaseSnippetDrawsAndBrokenSnippetsFallBack) {
         LogCapture log;
         r = renderWithProgram(&effect, picture);
         EXPECT_FALSE(log.contains("SingleEffect: could not load this shader"));
-        bool linkLine = false;
-        for (const std::string& line : log.texts())
-            linkLine |= line.rfind("SingleEffect: failed to link this shader: ", 0) == 0;
-        EXPECT_TRUE(linkLine);
+        EXPECT_EQ(1u, log.countPrefix("SingleEffect: failed to link this shader: "));
         EXPECT_EQ(opaque, r.pixels);
     }
 }

@@ -158,12 +158,9 @@ TEST(BufferedProcessorApi, StatusCodesWithoutContextOrBuffers) {
     EXPECT_EQ(-7, p.doProcessRGBA(in.data(), 4, 4, out.data(), VC_FORMAT_RGBA));
     EXPECT_EQ(-7, p.doProcessNV21(in.data(), 4, 4, out.data()));
     EXPECT_EQ(std::vector<uint8_t>(16 * 4, 0xAB), out);
-    size_t invalidState = 0;
-    for (const std::string& l : log.texts())
-        if (l.rfind("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:", 0) == 0)
-            ++invalidState;
     // bindGLEnvironment's line and the caller's own, for each call.
-    EXPECT_EQ(4u, invalidState);
+    EXPECT_EQ(4u,
+              log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
 }
 
 TEST_F(BufferedProcessorTest, EveryLookThroughRgbaAndBgra) {
@@ -290,11 +287,6 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     std::vector<uint8_t> in(w * h * 4, 60), out(w * h * 4, 0xC3);
     Nv21Picture nv21 = makeNv21(w, h);
     ASSERT_EQ(0, mProcessor->setEffect(403));
-    auto lines = [](const LogCapture& log, const std::string& prefix) {
-        size_t n = 0;
-        for (const std::string& l : log.texts()) n += l.rfind(prefix, 0) == 0 ? 1 : 0;
-        return n;
-    };
     // The picture cannot be read back: drawn, logged, output untouched, 0.
     LogCapture log;
     GlFault_failPictureReads(2);
@@ -304,7 +296,7 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
     EXPECT_EQ(2u, log.count("EGL: Synchronously waiting for rendering..."));
     EXPECT_EQ(2u, log.count("EGL: Can't access this FBO's pixels"));
-    EXPECT_EQ(2u, lines(log, "VC_ERROR_UNKNOWN (-1): core/VFilterBufferedProcessorImpl:"));
+    EXPECT_EQ(2u, log.countPrefix("VC_ERROR_UNKNOWN (-1): core/VFilterBufferedProcessorImpl:"));
 
     // No program can be made: -7 before anything is drawn.
     log.clear();
@@ -314,7 +306,8 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Program could not be loaded."));
     // bindGLEnvironment's line and the caller's.
-    EXPECT_EQ(2u, lines(log, "VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
+    EXPECT_EQ(2u,
+              log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
     EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
 
     // Both were passing: the next call draws the negative look.

@@ -61,6 +61,13 @@ size_t LogCapture::count(const std::string& text) const {
                          [&](const LoggedLine& l) { return l.text == text; });
 }
 
+size_t LogCapture::countPrefix(const std::string& prefix, int level) const {
+    auto all = lines();
+    return std::count_if(all.begin(), all.end(), [&](const LoggedLine& l) {
+        return (level < 0 || l.level == level) && l.text.rfind(prefix, 0) == 0;
+    });
+}
+
 void LogCapture::clear() {
     std::lock_guard<std::mutex> guard(gLock);
     gLines.clear();

@@ -21,6 +21,9 @@ public:
     bool contains(const std::string& text) const;
     bool contains(int level, const std::string& text) const;
     size_t count(const std::string& text) const;
+    // Lines starting with prefix (at that level, unless level is negative):
+    // for lines that end in a source line number, which moves with edits.
+    size_t countPrefix(const std::string& prefix, int level = -1) const;
     void clear();
 
     LogCapture(const LogCapture&) = delete;
