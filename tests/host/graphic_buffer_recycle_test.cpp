@@ -13,6 +13,7 @@
 #include "core/egl/EglNativeSeam.h"
 #include "graphic_buffer_usage.h"
 #include "support/gl_context.h"
+#include "support/open_files.h"
 
 using android::GraphicBuffer;
 using android::sp;
@@ -151,12 +152,16 @@ TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser)
     GlContext gl;
     ASSERT_TRUE(gl.ok());
     EGLDisplay display = gl.env()->getEGLDisplay();
-    useAndDrop(display, 4, 4, HAL_PIXEL_FORMAT_RGBA_8888);
+    const int files = Test_openFiles();
+    // Storage shared with the GPU (16 wide) and storage of the mirror's own.
+    for (int w : {16, 4}) useAndDrop(display, w, 4, HAL_PIXEL_FORMAT_RGBA_8888);
+    EXPECT_GT(Test_openFiles(), files);
     // The kept buffer holds the host context and its display reference...
     EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);
     gl.release();
     // ...until the environment's eglTerminate: then both go, and the display ends.
     EXPECT_EQ(eglQueryString(display, EGL_VENDOR), nullptr);
+    EXPECT_EQ(Test_openFiles(), files);
 
     // A buffer that outlives every other user of the display is not kept.
     GlContext again;

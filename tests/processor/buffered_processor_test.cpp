@@ -17,6 +17,7 @@
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/Platform.h"
 #include "support/gl_fault.h"
+#include "support/open_files.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
 #include "vccore/vc_convert.h"
@@ -335,6 +336,7 @@ TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     ASSERT_EQ(0, mProcessor->bindGLEnvironment());
     const int before = liveGlObjects(4096);
     mProcessor->unbindGLEnvironment();
+    const int filesBefore = Test_openFiles();
     for (int i = 20; i < 1020; ++i) {
         run(i);
         if (HasFatalFailure()) return;
@@ -344,6 +346,7 @@ TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     mProcessor->unbindGLEnvironment();
     // Only bindGLEnvironment's own program (and its shaders) is alive each time.
     EXPECT_EQ(before, after);
+    EXPECT_EQ(filesBefore, Test_openFiles());
     EXPECT_LE(after, 3);
     // Not current after a call: the context is bound only around each draw.
     EXPECT_EQ(EGL_NO_CONTEXT, eglGetCurrentContext());
