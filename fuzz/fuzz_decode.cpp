@@ -3,8 +3,10 @@
 #include <limits.h>
 #include <stddef.h>
 #include <stdint.h>
-#include <turbojpeg.h>
 
+#include <memory>
+
+#include "vc_image_codec.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 
@@ -17,22 +19,12 @@ void quietLog(int, const char*, ...) {}
 // the library's own refusal of unrepresentable sizes is covered by its tests.
 const uint64_t kMaxPixels = 4096ull * 4096ull;
 
-uint32_t be32(const uint8_t* p) {
-    return (uint32_t(p[0]) << 24) | (uint32_t(p[1]) << 16) | (uint32_t(p[2]) << 8) | p[3];
-}
-
+// The size the library's own decoders read from the header (JPEG or PNG).
 bool declaresTooMuch(const uint8_t* data, size_t size) {
-    if (size >= 2 && data[0] == 0xFF && data[1] == 0xD8) {
-        tjhandle tj = tjInitDecompress();
-        int w = 0, h = 0, subsampling = 0, colorspace = 0;
-        bool known = tjDecompressHeader3(tj, data, size, &w, &h, &subsampling, &colorspace) == 0;
-        tjDestroy(tj);
-        return known && uint64_t(w) * uint64_t(h) > kMaxPixels;
-    }
-    // The PNG header chunk comes first: width and height at bytes 16 and 20.
-    if (size >= 24 && data[0] == 0x89 && data[1] == 'P')
-        return uint64_t(be32(data + 16)) * uint64_t(be32(data + 20)) > kMaxPixels;
-    return false;
+    std::unique_ptr<VCPictureReader> reader = VCPictureReader_create(data, size);
+    int w = 0, h = 0;
+    return reader != nullptr && reader->readHeader(&w, &h) &&
+           uint64_t(w) * uint64_t(h) > kMaxPixels;
 }
 
 }  // namespace
