@@ -622,31 +622,38 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
             }
         }
         const bool fresh = texture == 0;
-        const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
-        bool fill = matches || mZeroContent || rgba != nullptr;
-        if (fill && fresh) {
-            glGenTextures(1, &texture);
-            glBindTexture(GL_TEXTURE_2D, texture);
-            // Level 0 only: the texture must be complete to become an EGL image.
-            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-            glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
-            glBindTexture(GL_TEXTURE_2D, 0);
+        bool filled = false;
+        if (imported) {
+            // Imported storage starts as zeros (RGBA zeros already); other
+            // contents are written into it from the CPU.
+            filled =
+                mZeroContent ? !isYuv(mFourcc) || clearMirror_l(texture) : transferMapped_l(true);
+        } else {
+            const unsigned char* rgba = (matches || mZeroContent) ? nullptr : rgbaForUpload_l();
+            if (matches || mZeroContent || rgba != nullptr) {
+                if (fresh) {
+                    glGenTextures(1, &texture);
+                    glBindTexture(GL_TEXTURE_2D, texture);
+                    // Level 0 only: the texture must be complete to become an EGL image.
+                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+                    glBindTexture(GL_TEXTURE_2D, 0);
+                }
+                filled = matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
+                                                     : zeroMirror_l(texture, fresh));
+            }
         }
-        // Imported storage starts as zeros, RGBA zeros already.
-        bool zeroed = imported && !isYuv(mFourcc);
-        made = fill &&
-               (matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
-                                            : zeroed || zeroMirror_l(texture, fresh))) &&
-               glGetError() == GL_NO_ERROR;
+        made = filled && glGetError() == GL_NO_ERROR;
         if (!made) {
             VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: mirror texture %dx%d failed", width, height);
-            if (fresh && texture != 0) glDeleteTextures(1, &texture);
             if (imported) {
                 HostGl::deleteImported_l(texture, mMemoryObject);
                 mMirrorPixels.reset();
                 mMemoryObject = 0;
+            } else if (fresh && texture != 0) {
+                glDeleteTextures(1, &texture);
             }
             return false;
         }
