@@ -51,6 +51,16 @@ public:
                                const std::function<bool(int, int)>& band) = 0;
 };
 
+// Calls band(firstRow, count) for `height` rows taken `rows` at a time (fewer
+// in the last band), stopping at the first false.
+inline bool VCPictureReader_forEachBand(int height, int rows,
+                                        const std::function<bool(int, int)>& band) {
+    for (int first = 0; first < height; first += rows) {
+        if (!band(first, height - first < rows ? height - first : rows)) return false;
+    }
+    return true;
+}
+
 // A reader for JPEG or PNG data, null for anything else.
 std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length);
 std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length);

@@ -137,14 +137,18 @@ int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
         int allocated = VCImage_allocate(image);
         if (allocated < 0) return allocated;
     }
-    if (convertsInBands(image->format) && required != 0) {
-        int rc = decodeInBands(*reader, image);
-        if (rc != VC_ERROR_CODEC_FAILED) return rc;
-        // As below: a stream that does not decode leaves the record as it was.
+    // The pixels are decoded only now, straight into their buffer; a stream
+    // that fails here is one that does not decode at all, which leaves the
+    // record as it was (bar the pixels of a buffer it had).
+    auto undecodable = [&] {
         if (!hadBuffer) VCImage_deallocate(image);
         image->width = oldWidth;
         image->height = oldHeight;
         return VC_REPORT(VC_ERROR_CODEC_FAILED);
+    };
+    if (convertsInBands(image->format) && required != 0) {
+        int rc = decodeInBands(*reader, image);
+        return rc == VC_ERROR_CODEC_FAILED ? undecodable() : rc;
     }
     const bool inPlace = image->format == VC_FORMAT_RGBA;
     VCImage* rgba = inPlace ? VCImage_createWrap(image->data, width, height, VC_FORMAT_RGBA,
@@ -153,13 +157,7 @@ int decodeGeneral(VCImage* image, const unsigned char* bytes, int length) {
     if (rgba == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     if (!reader->readRgba(rgba->data)) {
         VCImage_destroy(rgba);
-        // The pixels are decoded only now, straight into their buffer; a
-        // stream that fails here is one that does not decode at all, which
-        // leaves the record as it was (bar the pixels of a buffer it had).
-        if (!hadBuffer) VCImage_deallocate(image);
-        image->width = oldWidth;
-        image->height = oldHeight;
-        return VC_REPORT(VC_ERROR_CODEC_FAILED);
+        return undecodable();
     }
     int rc = inPlace ? 0 : VCImage_convert(rgba, image);
     VCImage_destroy(rgba);

@@ -95,12 +95,11 @@ public:
         if (mPasses != 1) {
             // Interlaced rows are only complete after the last pass.
             unsigned char* whole = static_cast<unsigned char*>(malloc(stride * mHeight));
-            bool ok = whole != nullptr && readRgba(whole);
-            for (int first = 0; ok && first < height; first += rows) {
-                int count = height - first < rows ? height - first : rows;
-                memcpy(rgba, whole + first * stride, count * stride);
-                ok = band(first, count);
-            }
+            bool ok = whole != nullptr && readRgba(whole) &&
+                      VCPictureReader_forEachBand(height, rows, [&](int first, int count) {
+                          memcpy(rgba, whole + first * stride, count * stride);
+                          return band(first, count);
+                      });
             free(whole);
             return ok;
         }
@@ -108,11 +107,9 @@ public:
         mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * rows));
         if (mRows == nullptr) return false;
         for (int i = 0; i < rows; ++i) mRows[i] = rgba + i * stride;
-        for (int first = 0; first < height; first += rows) {
-            int count = height - first < rows ? height - first : rows;
-            if (!readRows(count) || !band(first, count)) return false;
-        }
-        return true;
+        return VCPictureReader_forEachBand(height, rows, [&](int first, int count) {
+            return readRows(count) && band(first, count);
+        });
     }
 
     PngReader(const PngReader&) = delete;

@@ -62,12 +62,11 @@ public:
     bool readRgbaBands(unsigned char* rgba, int rows,
                        const std::function<bool(int, int)>& band) override {
         if (!mHeaderRead || rows < 1 || !start()) return false;
-        const int height = static_cast<int>(mInfo.image_height);
-        for (int first = 0; first < height; first += rows) {
-            const int count = height - first < rows ? height - first : rows;
-            if (!readRows(rgba, count) || !band(first, count)) return false;
-        }
-        return finish();
+        return VCPictureReader_forEachBand(static_cast<int>(mInfo.image_height), rows,
+                                           [&](int first, int count) {
+                                               return readRows(rgba, count) && band(first, count);
+                                           }) &&
+               finish();
     }
 
     JpegReader(const JpegReader&) = delete;
