@@ -293,17 +293,22 @@ GLuint HostGl::import_l(const SharedPixels& pixels, uint32_t width, uint32_t hei
     glGenTextures(1, &texture);
     glBindTexture(GL_TEXTURE_2D, texture);
     api.storage(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)width, (GLsizei)height, memory, 0);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
-    glBindTexture(GL_TEXTURE_2D, 0);
+    setMirrorSampling_l(texture);
     if (glGetError() != GL_NO_ERROR) {
         deleteImported_l(texture, memory);
         return 0;
     }
     *memoryObject = memory;
     return texture;
+}
+
+void HostGl::setMirrorSampling_l(GLuint texture) {
+    glBindTexture(GL_TEXTURE_2D, texture);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+    glBindTexture(GL_TEXTURE_2D, 0);
 }
 
 void HostGl::deleteImported_l(GLuint texture, GLuint memoryObject) {

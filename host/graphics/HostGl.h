@@ -59,6 +59,9 @@ public:
     // must outlive every user of the texture's storage.
     GLuint importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
                            GLuint* memoryObject);
+    // In run(): a mirror texture's sampling (linear, clamped), bound
+    // texture left unbound.
+    static void setMirrorSampling_l(GLuint texture);
     // In run(): deletes an imported texture, then what holds its storage.
     static void deleteImported_l(GLuint texture, GLuint memoryObject);
     // False once an import has proven impossible, so callers can keep plain

@@ -633,13 +633,9 @@ bool GraphicBuffer::ensureMirror_l(const std::function<bool()>& then) {
             if (matches || mZeroContent || rgba != nullptr) {
                 if (fresh) {
                     glGenTextures(1, &texture);
-                    glBindTexture(GL_TEXTURE_2D, texture);
-                    // Level 0 only: the texture must be complete to become an EGL image.
-                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-                    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
-                    glBindTexture(GL_TEXTURE_2D, 0);
+                    // Level 0 only (no mipmap filter): the texture must be
+                    // complete to become an EGL image.
+                    HostGl::setMirrorSampling_l(texture);
                 }
                 filled = matches || (rgba != nullptr ? fillMirror_l(texture, rgba, fresh)
                                                      : zeroMirror_l(texture, fresh));
