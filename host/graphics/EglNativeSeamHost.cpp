@@ -19,7 +19,7 @@
 #include <system/window.h>
 #include <ui/GraphicBuffer.h>
 
-#include "../../core/egl/EglNativeSeam.h"
+#include "core/egl/EglNativeSeam.h"
 #include "HostGl.h"
 #include "vccore/vc_log.h"
 

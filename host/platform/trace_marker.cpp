@@ -4,6 +4,8 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include "vccore/vc_log.h"
+
 namespace {
 
 int openMarker() {
@@ -21,6 +23,11 @@ int openMarker() {
     }
     return -1;
 }
+
+// The image core's trace records go to the host's marker in every program
+// that links the host layer (which links this file whole for that reason),
+// before main() and so before any thread.
+[[maybe_unused]] const bool gInstalled = (VF_TraceMarker = KivPlatform_traceMarkerFd, true);
 
 }  // namespace
 

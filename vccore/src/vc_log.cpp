@@ -7,11 +7,13 @@
 #include <time.h>
 #include <unistd.h>
 
-#include "kivplatform/trace_marker.h"
-
 VF_LogMsg_t VF_LogMsg = AndroidLogMsg;
 
 namespace {
+
+int noTraceMarker() {
+    return -1;
+}
 
 const char kLogTag[] = "kivcamera";
 
@@ -48,6 +50,8 @@ int64_t elapsedMicros() {
 }
 
 }  // namespace
+
+VF_TraceMarker_t VF_TraceMarker = noTraceMarker;
 
 extern "C" const char* VF_LogLabel(int level) {
     switch (level) {
@@ -96,7 +100,7 @@ extern "C" void AndroidLogMsg(int level, const char* format, ...) {
 }
 
 extern "C" void VF_TraceBegin(const char* name) {
-    int fd = KivPlatform_traceMarkerFd();
+    int fd = VF_TraceMarker();
     if (fd < 0) return;
     char buf[1024];
     int n = snprintf(buf, sizeof(buf), "B|%d|%s", getpid(), name != nullptr ? name : "");
@@ -107,7 +111,7 @@ extern "C" void VF_TraceBegin(const char* name) {
 }
 
 extern "C" void VF_TraceEnd(void) {
-    int fd = KivPlatform_traceMarkerFd();
+    int fd = VF_TraceMarker();
     if (fd < 0) return;
     ssize_t ignored = write(fd, "E", 1);
     (void)ignored;

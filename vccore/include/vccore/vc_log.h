@@ -36,6 +36,13 @@ int VF_LogPriority(int level);
 void VF_TraceBegin(const char* name);
 void VF_TraceEnd(void);
 
+// The platform trace marker: a function giving the file descriptor that trace
+// records are written to, or -1 while tracing is off. The image core knows no
+// platform of its own: until the platform layer (or an embedding program)
+// points this elsewhere, it gives -1. Set it once, before other threads start.
+typedef int (*VF_TraceMarker_t)(void);
+extern VF_TraceMarker_t VF_TraceMarker;
+
 #ifdef __cplusplus
 }  // extern "C"
 
