@@ -3,10 +3,11 @@
 #include <string.h>
 
 #include <GLES2/gl2ext.h>
-#include <system/graphics.h>
 #include <ui/GraphicBuffer.h>
 
 #include "core/egl/EglCheck.h"
+#include "core/egl/EglExtensions.h"
+#include "core/egl/HalPixelFormat.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/Platform.h"
 #include "vccore/vc_convert.h"
@@ -19,22 +20,6 @@ using android::GraphicBuffer;
 
 namespace {
 
-// Buffer pixel format for a FourCC; 0 when a GraphicBuffer cannot hold it.
-int pixelFormatOf(uint32_t fourcc) {
-    switch (fourcc) {
-        case VC_FORMAT_RGBA:
-            return HAL_PIXEL_FORMAT_RGBA_8888;
-        case VC_FORMAT_NV21:
-            return HAL_PIXEL_FORMAT_YCrCb_420_SP;
-        case VC_FORMAT_NV12:
-            return 261;  // the vendor NV12 code Platform maps back
-        case VC_FORMAT_YV12:
-            return HAL_PIXEL_FORMAT_YV12;
-        default:
-            return 0;
-    }
-}
-
 // Sampling the CPU writes, rendering the GPU writes the CPU reads back.
 uint32_t usageOf(EglImage::IMAGE_TYPE type) {
     uint32_t software = GraphicBuffer::USAGE_SW_READ_OFTEN | GraphicBuffer::USAGE_SW_WRITE_OFTEN;
@@ -42,18 +27,6 @@ uint32_t usageOf(EglImage::IMAGE_TYPE type) {
         return software | GraphicBuffer::USAGE_HW_RENDER | GraphicBuffer::USAGE_HW_TEXTURE;
     }
     return software | GraphicBuffer::USAGE_HW_TEXTURE;
-}
-
-PFNGLEGLIMAGETARGETTEXTURE2DOESPROC imageTargetTexture2D() {
-    static const auto function =
-        (PFNGLEGLIMAGETARGETTEXTURE2DOESPROC)eglGetProcAddress("glEGLImageTargetTexture2DOES");
-    return function;
-}
-
-PFNGLEGLIMAGETARGETRENDERBUFFERSTORAGEOESPROC imageTargetRenderbuffer() {
-    static const auto function = (PFNGLEGLIMAGETARGETRENDERBUFFERSTORAGEOESPROC)eglGetProcAddress(
-        "glEGLImageTargetRenderbufferStorageOES");
-    return function;
 }
 
 // Nearest source index for a destination index: the sample under the
@@ -158,7 +131,7 @@ void EglImage::dropGraphicBuffer_l() {
 
 int EglImage::initializeGraphicBuffer_l() {
     uint32_t format = mType == IMAGE_EXTERNAL_FRAMEBUFFER ? VC_FORMAT_RGBA : mFormat;
-    int pixelFormat = pixelFormatOf(format);
+    int pixelFormat = HalPixelFormat::codeOf(format);
     if (pixelFormat == 0) {
         if (VCImage_isYUV(format)) {
             EglLog(VF_LOG_ERROR, "Unsupported format for the EgImage: %4.4s", (const char*)&format);
@@ -198,7 +171,7 @@ int EglImage::initializeGraphicBuffer_l() {
 
     bool ok;
     if (mType == IMAGE_EXTERNAL) {
-        const auto glEGLImageTargetTexture2DOES = imageTargetTexture2D();
+        const auto glEGLImageTargetTexture2DOES = EglExtensions::get().glEGLImageTargetTexture2DOES;
         ok = GL_CHECK(glGenTextures(1, &mTexture)) &&
              GL_CHECK(glBindTexture(GL_TEXTURE_EXTERNAL_OES, mTexture)) &&
              GL_CHECK(glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_LINEAR)) &&
@@ -212,7 +185,8 @@ int EglImage::initializeGraphicBuffer_l() {
         // clang-format on
         glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
     } else {
-        const auto glEGLImageTargetRenderbufferStorageOES = imageTargetRenderbuffer();
+        const auto glEGLImageTargetRenderbufferStorageOES =
+            EglExtensions::get().glEGLImageTargetRenderbufferStorageOES;
         ok = GL_CHECK(glGenRenderbuffers(1, &mRenderBuffer)) &&
              GL_CHECK(glBindRenderbuffer(GL_RENDERBUFFER, mRenderBuffer)) &&
              GL_CHECK(glEGLImageTargetRenderbufferStorageOES(GL_RENDERBUFFER,
@@ -367,8 +341,8 @@ int EglImage::writeGraphicBuffer(const VCImage& image) {
         return VC_REPORT(VC_ERROR_INVALID_STATE);
     }
     // A wrapping lock: the writes must land in the buffer itself.
-    VCImage* target =
-        Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_WRAP, pixelFormatOf(mFormat));
+    VCImage* target = Platform::lockGraphicBuffer(mGraphicBuffer, Platform::LOCK_WRAP,
+                                                  HalPixelFormat::codeOf(mFormat));
     if (target == nullptr) {
         EglLog(VF_LOG_ERROR, "EGL: Failed to lock the graphic buffer");
         return VC_REPORT(VC_ERROR_UNKNOWN);

@@ -6,10 +6,10 @@
 
 #include <GLES2/gl2.h>
 #include <cutils/properties.h>
-#include <system/graphics.h>
 #include <ui/GraphicBuffer.h>
 
 #include "core/egl/EglCheck.h"
+#include "core/egl/HalPixelFormat.h"
 #include "vccore/vc_log.h"
 
 #define VC_SOURCE "core/egl/Platform"
@@ -62,22 +62,6 @@ int lookup(const BoardName* table, size_t count, const char* name, int fallback)
 
 bool chipIs(const char* chip, const char* name) {
     return strcasecmp(chip, name) == 0;
-}
-
-uint32_t fourccOfPixelFormat(int format) {
-    switch (format) {
-        case HAL_PIXEL_FORMAT_RGBA_8888:
-            return VC_FORMAT_RGBA;
-        case HAL_PIXEL_FORMAT_YCrCb_420_SP:
-        case 286:
-            return VC_FORMAT_NV21;
-        case 261:
-            return VC_FORMAT_NV12;
-        case HAL_PIXEL_FORMAT_YV12:
-            return VC_FORMAT_YV12;
-        default:
-            return 0;
-    }
 }
 
 bool badAddress(const void* address) {
@@ -189,7 +173,7 @@ VCImage* Platform::lockGraphicBuffer(const android::sp<android::GraphicBuffer>& 
     if (buffer == nullptr) return nullptr;
     int pixelFormat = buffer->getPixelFormat();
     if (pixelFormat == kImplementationDefinedFormat) pixelFormat = format;
-    uint32_t fourcc = fourccOfPixelFormat(pixelFormat);
+    uint32_t fourcc = HalPixelFormat::fourccOf(pixelFormat, true);
     if (fourcc == 0) {
         EglLog(VF_LOG_ERROR, "%s: Unsupported pixel format 0x%x", "lockGraphicBuffer", pixelFormat);
         return nullptr;

@@ -19,6 +19,7 @@
 #include <system/window.h>
 #include <ui/GraphicBuffer.h>
 
+#include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "HostGl.h"
 #include "vccore/vc_log.h"
@@ -154,9 +155,7 @@ public:
     }
 
     EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) override {
-        static const auto destroy =
-            (PFNEGLDESTROYIMAGEKHRPROC)eglGetProcAddress("eglDestroyImageKHR");
-        EGLBoolean result = destroy(display, image);
+        EGLBoolean result = EglExtensions::get().eglDestroyImageKHR(display, image);
         sp<GraphicBuffer> buffer;
         {
             std::lock_guard<std::mutex> guard(mLock);

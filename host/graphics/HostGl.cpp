@@ -9,6 +9,7 @@
 #include <map>
 
 #include "SharedPixels.h"
+#include "core/egl/EglExtensions.h"
 #include "vccore/vc_log.h"
 
 namespace android {
@@ -39,34 +40,16 @@ enum ImportState { IMPORT_UNKNOWN, IMPORT_WORKS, IMPORT_FAILS };
 std::atomic<int> gImportState{IMPORT_UNKNOWN};
 std::atomic<bool> gImportAllowed{true};
 
-struct MemoryObjectApi {
-    PFNGLCREATEMEMORYOBJECTSEXTPROC create = nullptr;
-    PFNGLDELETEMEMORYOBJECTSEXTPROC destroy = nullptr;
-    PFNGLIMPORTMEMORYFDEXTPROC importFd = nullptr;
-    PFNGLTEXSTORAGEMEM2DEXTPROC storage = nullptr;
-
-    // With a context current; null entries when the context lacks the extension.
-    static const MemoryObjectApi& get() {
-        static const MemoryObjectApi api = [] {
-            MemoryObjectApi a;
-            const char* extensions = reinterpret_cast<const char*>(glGetString(GL_EXTENSIONS));
-            if (extensions == nullptr || strstr(extensions, "GL_EXT_memory_object_fd") == nullptr)
-                return a;
-            a.create =
-                (PFNGLCREATEMEMORYOBJECTSEXTPROC)eglGetProcAddress("glCreateMemoryObjectsEXT");
-            a.destroy =
-                (PFNGLDELETEMEMORYOBJECTSEXTPROC)eglGetProcAddress("glDeleteMemoryObjectsEXT");
-            a.importFd = (PFNGLIMPORTMEMORYFDEXTPROC)eglGetProcAddress("glImportMemoryFdEXT");
-            a.storage = (PFNGLTEXSTORAGEMEM2DEXTPROC)eglGetProcAddress("glTexStorageMem2DEXT");
-            if (a.create == nullptr || a.destroy == nullptr || a.importFd == nullptr ||
-                a.storage == nullptr)
-                a = MemoryObjectApi();
-            return a;
-        }();
-        return api;
-    }
-    bool present() const { return create != nullptr; }
-};
+// With a context current: whether it can take imported memory as texture storage.
+bool memoryObjectsPresent() {
+    static const bool present = [] {
+        const EglExtensions& ext = EglExtensions::get();
+        return EglExtensions::hasGl("GL_EXT_memory_object_fd") &&
+               ext.glCreateMemoryObjectsEXT != nullptr && ext.glDeleteMemoryObjectsEXT != nullptr &&
+               ext.glImportMemoryFdEXT != nullptr && ext.glTexStorageMem2DEXT != nullptr;
+    }();
+    return present;
+}
 
 }  // namespace
 
@@ -89,9 +72,7 @@ HostGl::HostGl()
       mFramebuffer(0),
       mCompilerResident(false),
       mHeldDisplay(EGL_NO_DISPLAY),
-      mCreateSync(nullptr),
-      mClientWaitSync(nullptr),
-      mDestroySync(nullptr) {}
+      mFences(false) {}
 
 bool HostGl::acquire() {
     std::lock_guard<std::mutex> guard(mLock);
@@ -124,13 +105,9 @@ bool HostGl::create_l() {
         destroy_l();
         return false;
     }
-    mCreateSync = (PFNEGLCREATESYNCKHRPROC)eglGetProcAddress("eglCreateSyncKHR");
-    mClientWaitSync = (PFNEGLCLIENTWAITSYNCKHRPROC)eglGetProcAddress("eglClientWaitSyncKHR");
-    mDestroySync = (PFNEGLDESTROYSYNCKHRPROC)eglGetProcAddress("eglDestroySyncKHR");
-    const char* extensions = eglQueryString(mDisplay, EGL_EXTENSIONS);
-    if (extensions == nullptr || strstr(extensions, "EGL_KHR_fence_sync") == nullptr) {
-        mCreateSync = nullptr;  // glFinish() orders instead
-    }
+    // Without fences glFinish() orders instead.
+    mFences = EglExtensions::hasEgl(mDisplay, "EGL_KHR_fence_sync") &&
+              EglExtensions::get().eglCreateSyncKHR != nullptr;
     mHeldDisplay = mDisplay;
     return true;
 }
@@ -165,11 +142,13 @@ void HostGl::destroy_l() {
 }
 
 void HostGl::fenceCurrent(EGLDisplay display) {
-    if (mCreateSync != nullptr && display == mDisplay) {
-        EGLSyncKHR sync = mCreateSync(mDisplay, EGL_SYNC_FENCE_KHR, nullptr);
+    const EglExtensions& ext = EglExtensions::get();
+    if (mFences && display == mDisplay) {
+        EGLSyncKHR sync = ext.eglCreateSyncKHR(mDisplay, EGL_SYNC_FENCE_KHR, nullptr);
         if (sync != EGL_NO_SYNC_KHR) {
-            mClientWaitSync(mDisplay, sync, EGL_SYNC_FLUSH_COMMANDS_BIT_KHR, EGL_FOREVER_KHR);
-            mDestroySync(mDisplay, sync);
+            ext.eglClientWaitSyncKHR(mDisplay, sync, EGL_SYNC_FLUSH_COMMANDS_BIT_KHR,
+                                     EGL_FOREVER_KHR);
+            ext.eglDestroySyncKHR(mDisplay, sync);
             return;
         }
     }
@@ -274,25 +253,26 @@ GLuint HostGl::importTexture_l(const SharedPixels& pixels, uint32_t width, uint3
 
 GLuint HostGl::import_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
                         GLuint* memoryObject) {
-    const MemoryObjectApi& api = MemoryObjectApi::get();
-    if (!api.present() || pixels.empty()) return 0;
+    const EglExtensions& ext = EglExtensions::get();
+    if (!memoryObjectsPresent() || pixels.empty()) return 0;
     while (glGetError() != GL_NO_ERROR) {
     }
     int fd = pixels.duplicateFd();
     if (fd < 0) return 0;
     GLuint memory = 0;
-    api.create(1, &memory);
-    api.importFd(memory, pixels.fileSize(), GL_HANDLE_TYPE_OPAQUE_FD_EXT, fd);
+    ext.glCreateMemoryObjectsEXT(1, &memory);
+    ext.glImportMemoryFdEXT(memory, pixels.fileSize(), GL_HANDLE_TYPE_OPAQUE_FD_EXT, fd);
     if (glGetError() != GL_NO_ERROR) {
         // A refused import leaves the descriptor with us.
         close(fd);
-        api.destroy(1, &memory);
+        ext.glDeleteMemoryObjectsEXT(1, &memory);
         return 0;
     }
     GLuint texture = 0;
     glGenTextures(1, &texture);
     glBindTexture(GL_TEXTURE_2D, texture);
-    api.storage(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)width, (GLsizei)height, memory, 0);
+    ext.glTexStorageMem2DEXT(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)width, (GLsizei)height,
+                             memory, 0);
     setMirrorSampling_l(texture);
     if (glGetError() != GL_NO_ERROR) {
         deleteImported_l(texture, memory);
@@ -313,9 +293,8 @@ void HostGl::setMirrorSampling_l(GLuint texture) {
 
 void HostGl::deleteImported_l(GLuint texture, GLuint memoryObject) {
     if (texture != 0) glDeleteTextures(1, &texture);
-    if (memoryObject != 0) {
-        const MemoryObjectApi& api = MemoryObjectApi::get();
-        if (api.present()) api.destroy(1, &memoryObject);
+    if (memoryObject != 0 && memoryObjectsPresent()) {
+        EglExtensions::get().glDeleteMemoryObjectsEXT(1, &memoryObject);
     }
 }
 
@@ -324,7 +303,7 @@ bool HostGl::probeImport_l() {
     // puts the one cleared texel somewhere else.
     const uint32_t w = 5, h = 3, x = 3, y = 2;
     SharedPixels pixels;
-    if (!MemoryObjectApi::get().present() || !pixels.allocate(w, h)) return false;
+    if (!memoryObjectsPresent() || !pixels.allocate(w, h)) return false;
     GLuint memory = 0;
     GLuint texture = import_l(pixels, w, h, &memory);
     if (texture == 0) return false;

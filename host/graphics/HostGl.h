@@ -102,9 +102,7 @@ private:
     // The display this context holds a reference on, readable without the
     // lock (eglTerminate is called under it).
     std::atomic<EGLDisplay> mHeldDisplay;
-    PFNEGLCREATESYNCKHRPROC mCreateSync;
-    PFNEGLCLIENTWAITSYNCKHRPROC mClientWaitSync;
-    PFNEGLDESTROYSYNCKHRPROC mDestroySync;
+    bool mFences;  // the display has EGL_KHR_fence_sync
 };
 
 }  // namespace android

@@ -7,8 +7,10 @@
 #include <memory>
 #include <vector>
 
-#include "../graphics/HostGl.h"
-#include "../graphics/SharedPixels.h"
+#include "core/egl/EglExtensions.h"
+#include "core/egl/HalPixelFormat.h"
+#include "host/graphics/HostGl.h"
+#include "host/graphics/SharedPixels.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"
@@ -16,27 +18,6 @@
 namespace android {
 
 namespace {
-
-// Layout of the CPU copy for a pixel format; 0 when the host cannot hold it.
-uint32_t fourccOf(PixelFormat format) {
-    switch (format) {
-        case HAL_PIXEL_FORMAT_RGBA_8888:
-        case HAL_PIXEL_FORMAT_RGBX_8888:
-        case HAL_PIXEL_FORMAT_IMPLEMENTATION_DEFINED:  // an RGBA buffer on the host
-            return VC_FORMAT_RGBA;
-        case HAL_PIXEL_FORMAT_BGRA_8888:
-            return VC_FORMAT_BGRA;
-        case HAL_PIXEL_FORMAT_YCrCb_420_SP:
-        case HAL_PIXEL_FORMAT_VENDOR_YCrCb_420_SP:
-            return VC_FORMAT_NV21;
-        case HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP:
-            return VC_FORMAT_NV12;
-        case HAL_PIXEL_FORMAT_YV12:
-            return VC_FORMAT_YV12;
-        default:
-            return 0;
-    }
-}
 
 bool isYuv(uint32_t fourcc) {
     return fourcc == VC_FORMAT_NV21 || fourcc == VC_FORMAT_NV12 || fourcc == VC_FORMAT_YV12;
@@ -301,7 +282,7 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
     handle = nullptr;
     if (w == 0 && h == 0) return;  // the empty buffer
 
-    mFourcc = fourccOf(f);
+    mFourcc = HalPixelFormat::fourccOf(f, false);
     // 4:2:0 layouts need even sizes; planar chroma rows need an even stride.
     bool bad = mFourcc == 0 || w == 0 || h == 0 || w > 16384 || h > 16384 || inStride < w ||
                inStride > 16384 || (isYuv(mFourcc) && ((w | h | inStride) & 1) != 0);
@@ -795,8 +776,7 @@ EGLImageKHR GraphicBuffer::createEglImage(EGLDisplay display) {
     std::lock_guard<std::mutex> guard(mLock);
     if (mInitCheck != NO_ERROR) return EGL_NO_IMAGE_KHR;
     HostGl& gl = HostGl::get();
-    static const auto createImage =
-        (PFNEGLCREATEIMAGEKHRPROC)eglGetProcAddress("eglCreateImageKHR");
+    const auto createImage = EglExtensions::get().eglCreateImageKHR;
     const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_IMAGE_PRESERVED_KHR, EGL_TRUE,
                               EGL_NONE};
     EGLImageKHR image = EGL_NO_IMAGE_KHR;

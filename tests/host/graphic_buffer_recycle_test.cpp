@@ -10,6 +10,8 @@
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
+#include "core/egl/HalPixelFormat.h"
+#include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "graphic_buffer_usage.h"
 #include "support/gl_context.h"
@@ -25,8 +27,7 @@ std::vector<uint8_t> gpuPixels(EGLDisplay display, const sp<GraphicBuffer>& buff
     std::vector<uint8_t> pixels;
     EGLImageKHR image = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
     if (image == EGL_NO_IMAGE_KHR) return pixels;
-    auto target = reinterpret_cast<PFNGLEGLIMAGETARGETRENDERBUFFERSTORAGEOESPROC>(
-        eglGetProcAddress("glEGLImageTargetRenderbufferStorageOES"));
+    auto target = EglExtensions::get().glEGLImageTargetRenderbufferStorageOES;
     GLuint renderbuffer = 0, framebuffer = 0;
     glGenRenderbuffers(1, &renderbuffer);
     glBindRenderbuffer(GL_RENDERBUFFER, renderbuffer);

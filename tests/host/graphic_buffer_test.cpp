@@ -9,6 +9,8 @@
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
+#include "core/egl/HalPixelFormat.h"
+#include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 #include "graphic_buffer_usage.h"
@@ -35,8 +37,7 @@ public:
     BufferView(EGLDisplay display, const sp<GraphicBuffer>& buffer) : mDisplay(display) {
         mImage = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
         if (mImage == EGL_NO_IMAGE_KHR) return;
-        auto target = reinterpret_cast<PFNGLEGLIMAGETARGETRENDERBUFFERSTORAGEOESPROC>(
-            eglGetProcAddress("glEGLImageTargetRenderbufferStorageOES"));
+        auto target = EglExtensions::get().glEGLImageTargetRenderbufferStorageOES;
         glGenRenderbuffers(1, &mRenderbuffer);
         glBindRenderbuffer(GL_RENDERBUFFER, mRenderbuffer);
         target(GL_RENDERBUFFER, static_cast<GLeglImageOES>(mImage));

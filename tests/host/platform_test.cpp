@@ -10,6 +10,7 @@
 
 #include <string>
 
+#include "core/egl/HalPixelFormat.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
 #include "vccore/vc_log.h"

@@ -4,6 +4,7 @@
 #include <string.h>
 
 #include "core/egl/EglEnvironment.h"
+#include "core/egl/EglExtensions.h"
 #include "core/egl/EglWindowSurface.h"
 
 GlContext::GlContext() {
@@ -58,10 +59,8 @@ GLuint GlTest_makeTexture2D(int width, int height, const uint8_t* pixels) {
 
 bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
                                 GlExternalTexture* out) {
-    auto createImage =
-        reinterpret_cast<PFNEGLCREATEIMAGEKHRPROC>(eglGetProcAddress("eglCreateImageKHR"));
-    auto targetTexture = reinterpret_cast<PFNGLEGLIMAGETARGETTEXTURE2DOESPROC>(
-        eglGetProcAddress("glEGLImageTargetTexture2DOES"));
+    auto createImage = EglExtensions::get().eglCreateImageKHR;
+    auto targetTexture = EglExtensions::get().glEGLImageTargetTexture2DOES;
     if (createImage == nullptr || targetTexture == nullptr) return false;
 
     out->storage = GlTest_makeTexture2D(width, height, pixels);
@@ -79,8 +78,7 @@ bool GlTest_makeExternalTexture(int width, int height, const uint8_t* pixels,
 }
 
 void GlTest_deleteExternalTexture(GlExternalTexture* texture) {
-    auto destroyImage =
-        reinterpret_cast<PFNEGLDESTROYIMAGEKHRPROC>(eglGetProcAddress("eglDestroyImageKHR"));
+    auto destroyImage = EglExtensions::get().eglDestroyImageKHR;
     if (texture->external != 0) glDeleteTextures(1, &texture->external);
     if (texture->storage != 0) glDeleteTextures(1, &texture->storage);
     if (texture->image != EGL_NO_IMAGE_KHR && destroyImage != nullptr) {

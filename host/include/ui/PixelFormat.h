@@ -20,9 +20,4 @@ enum {
 
 }  // namespace android
 
-// Vendor codes for the semi-planar 4:2:0 layouts that some camera HALs
-// allocate instead of HAL_PIXEL_FORMAT_YCrCb_420_SP.
-#define HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP 0x105  // NV12
-#define HAL_PIXEL_FORMAT_VENDOR_YCrCb_420_SP 0x11E  // NV21
-
 #endif
