@@ -13,6 +13,7 @@
 #include "support/log_capture.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
+#include "vccore/vc_picture.h"
 
 using namespace jpegtest;
 
@@ -176,6 +177,22 @@ TEST(VcFile, PngSaveStoresStraightAlpha) {
         }
     }
     VCImage_destroy(back);
+
+    // The encoder of our own keeps straight alpha as it is.
+    size_t length = 0;
+    unsigned char* stream = VCPicture_encodePng(image, &length);
+    ASSERT_NE(stream, nullptr);
+    back = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
+    ASSERT_EQ(VCImage_decodeFromJpeg(back, stream, static_cast<int>(length)), 0);
+    EXPECT_EQ(bytesOf(back), premultiplied);
+    free(stream);
+    VCImage_destroy(back);
+    VCImage* shortRgba = VCImage_createWrap(premultiplied.data(), 4, 2, VC_FORMAT_RGBA, 16, 0);
+    VCImage* bgra = VCImage_createWrap(premultiplied.data(), 4, 1, VC_FORMAT_BGRA, 16, 0);
+    for (VCImage* refused : {shortRgba, bgra, static_cast<VCImage*>(nullptr)}) {
+        EXPECT_EQ(VCPicture_encodePng(refused, &length), nullptr);
+        VCImage_destroy(refused);
+    }
     VCImage_destroy(image);
 
     // Other formats go through an RGBA copy.
@@ -236,20 +253,35 @@ TEST(VcFile, LoadFromFile) {
         VCImage_destroy(direct);
 
         // A picture that decodes but cannot become NV21 (odd width) leaves the
-        // record with the picture's geometry: the raw fall-back then takes
-        // the file itself.
+        // record as it was, and so does a header promising 3.6 GB of
+        // pixels: neither is then taken for raw pixels of its own geometry.
         VCImage* oddRgba = VCImage_createNew(63, 48, VC_FORMAT_RGBA);
         memset(oddRgba->data, 0x40, oddRgba->size);
         ASSERT_EQ(VCImage_saveToFile(oddRgba, dir.file("odd.jpg").c_str(), 90), 0);
-        VCImage* oddNv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
-        LogCapture oddLog;
-        ASSERT_EQ(VCImage_loadFromFile(oddNv21, dir.file("odd.jpg").c_str()), 0);
-        EXPECT_EQ(countErrors(oddLog, "VC_ERROR_INVALID_SIZE", -4), 1);
-        EXPECT_TRUE(oddLog.contains(VF_LOG_DEBUG, "Decoding as raw image: 63x48 'NV21'"));
-        EXPECT_EQ(shapeOf(oddNv21), "63x48");
-        EXPECT_EQ(bytesOf(oddNv21), readFile(dir.file("odd.jpg")));
+        Bytes bomb = readFile(dir.file("odd.jpg"));
+        for (size_t i = 2; i + 8 < bomb.size(); ++i)
+            if (bomb[i] == 0xFF && bomb[i + 1] == 0xC0) {
+                bomb[i + 5] = bomb[i + 7] = 30000 >> 8;  // 30000x30000
+                bomb[i + 6] = bomb[i + 8] = 30000 & 0xFF;
+                break;
+            }
+        writeFile(dir.file("bomb.jpg"), bomb);
+        struct Case {
+            const char* file;
+            uint32_t format;
+            int status;
+        } refusals[] = {{"odd.jpg", VC_FORMAT_NV21, VC_ERROR_INVALID_SIZE},
+                        {"bomb.jpg", VC_FORMAT_RGBA, VC_ERROR_INVALID_SIZE}};
+        for (const Case& c : refusals) {
+            VCImage* target = VCImage_createEmpty(0, 0, c.format);
+            LogCapture refusedLog;
+            EXPECT_EQ(VCImage_loadFromFile(target, dir.file(c.file).c_str()), c.status) << c.file;
+            EXPECT_EQ(shapeOf(target), "0x0") << c.file;
+            EXPECT_EQ(target->data, nullptr) << c.file;
+            EXPECT_EQ(refusedLog.countPrefix("Decoding as raw image"), 0u) << c.file;
+            VCImage_destroy(target);
+        }
         VCImage_destroy(oddRgba);
-        VCImage_destroy(oddNv21);
     }
 
     // Raw NV21 bytes into an image that already knows its geometry; the file
@@ -279,8 +311,10 @@ TEST(VcFile, LoadFromFile) {
     EXPECT_EQ(VCImage_loadFromFile(target, dir.file("absent.jpg").c_str()), VC_ERROR_IO_FAILED);
     EXPECT_EQ(VCImage_loadFromFile(target, dir.path().c_str()), VC_ERROR_IO_FAILED);
     EXPECT_EQ(countErrors(log, "VC_ERROR_IO_FAILED", -8), 3);
+    EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_READ_FAILED);
     writeFile(dir.file("garbage.jpg"), text("not a picture at all"));
     EXPECT_EQ(VCImage_loadFromFile(target, dir.file("garbage.jpg").c_str()), VC_ERROR_CODEC_FAILED);
+    EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_NOT_A_PICTURE);
     EXPECT_EQ(target->data, nullptr);
     EXPECT_FALSE(log.contains(VF_LOG_DEBUG, "Decoding as raw image: 0x0 'RGBA'"));
     log.clear();

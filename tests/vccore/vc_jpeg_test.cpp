@@ -5,12 +5,15 @@
 #include <turbojpeg.h>
 
 #include <cmath>
+#include <set>
+#include <thread>
 
 #include "jpeg_standin/jpeg_test_util.h"
 #include "support/log_capture.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
+#include "vccore/vc_picture.h"
 
 using namespace jpegtest;
 
@@ -181,16 +184,7 @@ TEST(VcJpeg, DecodeIntoEachFormat) {
     ASSERT_EQ(VCImage_size(nv21), n * 3 / 2);
     EXPECT_EQ(bytesOf(nv21), convertBytes(ref, 64, 48, VC_FORMAT_RGBA, VC_FORMAT_NV21));
 
-    // An odd-sized picture cannot become NV21: the conversion refuses it
-    // after the record has taken the picture's geometry and a buffer for it.
-    VCImage* odd = makeRgba(63, 48);
-    VCImage* refused = decodeInto(VC_FORMAT_NV21, encodeBytes(odd, 90), &rc);
-    EXPECT_EQ(rc, VC_ERROR_INVALID_SIZE);
-    EXPECT_EQ(shapeOf(refused), "63x48");
-    ASSERT_NE(refused->data, nullptr);
-    EXPECT_EQ(refused->wrapped, 0);
-    EXPECT_EQ(refused->size, VCImage_requiredSize(63, 48, VC_FORMAT_NV21));
-    for (VCImage* i : {source, rgba, bgr, nv21, odd, refused}) VCImage_destroy(i);
+    for (VCImage* i : {source, rgba, bgr, nv21}) VCImage_destroy(i);
 }
 
 // NV21 and NV12 are decoded a band of rows at a time; the result must be the
@@ -390,11 +384,39 @@ TEST(VcJpeg, EncodeRefusals) {
     }
 }
 
-TEST(VcJpeg, DecodeRejectsBadInput) {
+namespace {
+
+// Every field of a record, to see that a failed decoding left it as it was.
+std::string recordOf(const VCImage* image) {
+    char text[160];
+    snprintf(text, sizeof(text), "data %p %dx%d %4.4s wrapped %d size %u uv %u",
+             static_cast<const void*>(image->data), image->width, image->height,
+             reinterpret_cast<const char*>(&image->format), image->wrapped, image->size,
+             image->uvOffset);
+    return text;
+}
+
+// A JPEG stream whose frame header is rewritten to declare width×height.
+Bytes jpegDeclaring(Bytes jpeg, int width, int height) {
+    size_t sof = findMarker(jpeg, 0xC0);
+    EXPECT_NE(sof, 0u);
+    jpeg[sof + 3] = static_cast<unsigned char>(height >> 8);
+    jpeg[sof + 4] = static_cast<unsigned char>(height);
+    jpeg[sof + 5] = static_cast<unsigned char>(width >> 8);
+    jpeg[sof + 6] = static_cast<unsigned char>(width);
+    return jpeg;
+}
+
+}  // namespace
+
+TEST(VcJpeg, DecodeFailuresSayWhyAndLeaveTheRecordAsFound) {
     REQUIRE_GENERAL_CODECS();
     VCImage* source = makeRgba(32, 32);
     Bytes jpeg = encodeBytes(source, 90);
     VCImage_destroy(source);
+    VCImage* oddSource = makeRgba(3, 3);
+    Bytes odd = encodeBytes(oddSource, 90);
+    VCImage_destroy(oddSource);
     ASSERT_FALSE(jpeg.empty());
     LogCapture log;
 
@@ -404,15 +426,19 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     EXPECT_EQ(VCImage_decodeFromJpeg(image, jpeg.data(), 0), VC_ERROR_NULL_PARAM);
     EXPECT_EQ(countErrors(log, "VC_ERROR_NULL_PARAM", -2), 3);
     EXPECT_EQ(VCImage_decodeFromJpeg(image, jpeg.data(), -3), VC_ERROR_INVALID_PARAM);
+    EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_NOT_A_PICTURE);
+    VCImage_destroy(image);
 
     Bytes badTable = jpeg;
     size_t dqt = findMarker(badTable, 0xDB);
     ASSERT_NE(dqt, 0u);
     badTable[dqt + 2] = 0x07;  // table index out of range
-    Bytes huge = jpeg;
-    size_t sof = findMarker(huge, 0xC0);
-    ASSERT_NE(sof, 0u);
-    for (int i = 3; i < 7; ++i) huge[sof + i] = i % 2 ? 0xFD : 0xE8;  // 65000 × 65000
+    Bytes twelveBit = jpeg;
+    twelveBit[findMarker(jpeg, 0xC0) + 2] = 12;
+    Bytes lossless = jpeg;
+    lossless[findMarker(jpeg, 0xC0) - 1] = 0xC3;
+    // Two channels of no known colour space.
+    Bytes twoChannels = makeJpeg(8, 8, JCS_UNKNOWN, 2, JCS_UNKNOWN, Bytes(8 * 8 * 2, 99));
 
     PngPicture picture;
     picture.width = picture.height = 16;
@@ -422,37 +448,183 @@ TEST(VcJpeg, DecodeRejectsBadInput) {
     pngBadCrc[29] ^= 0x55;  // inside the header chunk's checksum
 
     const char garbage[] = "hello, this is not a picture";
+    const uint32_t kUnknown = VC_FOURCC('X', 'X', 'X', 'X');
     struct Case {
         const char* what;
         Bytes data;
+        uint32_t format;
+        int side;     // the record's preset square geometry
+        bool buffer;  // whether the record owns a buffer of that geometry
+        int status;
+        VCDecodeFailure why;
     } cases[] = {
-        {"garbage", Bytes(garbage, garbage + sizeof(garbage))},
-        {"truncated JPEG", Bytes(jpeg.begin(), jpeg.begin() + jpeg.size() / 2)},
-        {"marker only", {0xFF, 0xD8}},
-        {"bad quantisation table", badTable},
-        {"enormous JPEG", huge},
-        {"truncated PNG", Bytes(png.begin(), png.begin() + png.size() * 2 / 3)},
-        {"PNG with a bad checksum", pngBadCrc},
-        {"PNG of 50000x30000", pngDeclaring(50000, 30000)},
-        {"PNG of 2000000x2", pngDeclaring(2000000, 2)},
+        {"garbage", Bytes(garbage, garbage + sizeof(garbage)), VC_FORMAT_RGBA, 5, false,
+         VC_ERROR_CODEC_FAILED, VC_DECODE_NOT_A_PICTURE},
+        {"truncated JPEG", Bytes(jpeg.begin(), jpeg.begin() + jpeg.size() / 2), VC_FORMAT_RGBA, 5,
+         false, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+        {"truncated JPEG into NV21", Bytes(jpeg.begin(), jpeg.begin() + jpeg.size() / 2),
+         VC_FORMAT_NV21, 40, true, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+        {"marker only",
+         {0xFF, 0xD8},
+         VC_FORMAT_RGBA,
+         5,
+         false,
+         VC_ERROR_CODEC_FAILED,
+         VC_DECODE_TRUNCATED},
+        {"bad quantisation table", badTable, VC_FORMAT_RGBA, 5, false, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_CORRUPT},
+        {"12-bit JPEG", twelveBit, VC_FORMAT_RGBA, 5, false, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_UNSUPPORTED_CODING},
+        {"lossless JPEG", lossless, VC_FORMAT_RGBA, 5, false, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_UNSUPPORTED_CODING},
+        {"two-channel JPEG", twoChannels, VC_FORMAT_RGBA, 5, false, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_UNSUPPORTED_COLOR},
+        {"JPEG of 65000x65000", jpegDeclaring(jpeg, 65000, 65000), VC_FORMAT_RGBA, 5, false,
+         VC_ERROR_CODEC_FAILED, VC_DECODE_TOO_LARGE},
+        // 3.6 GB of RGBA fits the record's byte count but not its buffers.
+        {"JPEG of 30000x30000", jpegDeclaring(jpeg, 30000, 30000), VC_FORMAT_RGBA, 0, false,
+         VC_ERROR_INVALID_SIZE, VC_DECODE_TOO_LARGE},
+        {"JPEG of 30000x30000 into BGR8", jpegDeclaring(jpeg, 30000, 30000), VC_FORMAT_BGR8, 0,
+         false, VC_ERROR_INVALID_SIZE, VC_DECODE_TOO_LARGE},
+        {"into a buffer too small", jpeg, VC_FORMAT_RGBA, 10, true, VC_ERROR_INVALID_SIZE,
+         VC_DECODE_NO_ROOM},
+        // Odd pictures have no 4:2:x form: refused after a buffer was made.
+        {"3x3 into NV21", odd, VC_FORMAT_NV21, 0, false, VC_ERROR_INVALID_SIZE,
+         VC_DECODE_CONVERSION},
+        {"3x3 into an NV21 buffer", odd, VC_FORMAT_NV21, 8, true, VC_ERROR_INVALID_SIZE,
+         VC_DECODE_CONVERSION},
+        {"3x3 into YUYV", odd, VC_FORMAT_YUYV, 0, false, VC_ERROR_INVALID_SIZE,
+         VC_DECODE_CONVERSION},
+        {"into an unknown format", jpeg, kUnknown, 0, false, VC_ERROR_INVALID_PARAM,
+         VC_DECODE_CONVERSION},
+        {"truncated PNG", Bytes(png.begin(), png.begin() + png.size() * 2 / 3), VC_FORMAT_RGBA, 5,
+         false, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+        {"PNG with a bad checksum", pngBadCrc, VC_FORMAT_RGBA, 5, false, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_CORRUPT},
+        {"PNG of 50000x30000", pngDeclaring(50000, 30000), VC_FORMAT_RGBA, 5, false,
+         VC_ERROR_CODEC_FAILED, VC_DECODE_TOO_LARGE},
+        {"PNG of 2000000x2", pngDeclaring(2000000, 2), VC_FORMAT_RGBA, 5, false,
+         VC_ERROR_CODEC_FAILED, VC_DECODE_TOO_LARGE},
     };
     for (const Case& c : cases) {
+        VCImage* target = c.buffer ? VCImage_createNew(c.side, c.side, c.format)
+                                   : VCImage_createEmpty(c.side, c.side, c.format);
+        ASSERT_NE(target, nullptr) << c.what;
+        const std::string before = recordOf(target);
         log.clear();
-        EXPECT_EQ(VCImage_decodeFromJpeg(image, c.data.data(), static_cast<int>(c.data.size())),
-                  VC_ERROR_CODEC_FAILED)
+        EXPECT_EQ(VCImage_decodeFromJpeg(target, c.data.data(), static_cast<int>(c.data.size())),
+                  c.status)
             << c.what;
-        EXPECT_EQ(log.lines().size(), 1u) << c.what;
-        EXPECT_EQ(countErrors(log, "VC_ERROR_CODEC_FAILED", -9), 1) << c.what;
-        EXPECT_EQ(image->data, nullptr) << c.what;
-        EXPECT_EQ(shapeOf(image), "5x5") << c.what;
+        EXPECT_EQ(VCPicture_lastFailure(), c.why) << c.what;
+        // One error line, where the failure arose.
+        EXPECT_EQ(countErrors(log, VCError_name(c.status), c.status), 1) << c.what;
+        size_t errors = 0;
+        for (const LoggedLine& l : log.lines()) errors += l.level == VF_LOG_ERROR;
+        EXPECT_EQ(errors, 1u) << c.what;
+        EXPECT_EQ(recordOf(target), before) << c.what;
+        VCImage_destroy(target);
     }
-    // The valid streams these were made from do decode.
+    // Each reason has words of its own.
+    std::set<std::string> texts;
+    for (const Case& c : cases) texts.insert(VCPicture_failureText(c.why));
+    EXPECT_EQ(texts.size(), 8u);
+
+    // The valid streams these were made from do decode, and say so.
+    image = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
     EXPECT_EQ(VCImage_decodeFromJpeg(image, png.data(), static_cast<int>(png.size())), 0);
+    EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_OK);
     EXPECT_EQ(image->width, 16);
     VCImage_deallocate(image);
     EXPECT_EQ(VCImage_decodeFromJpeg(image, jpeg.data(), static_cast<int>(jpeg.size())), 0);
     EXPECT_EQ(image->width, 32);
     VCImage_destroy(image);
+
+    // The reason belongs to the thread that decoded.
+    ASSERT_NE(VCImage_decodeFromJpeg(nullptr, jpeg.data(), 1), 0);
+    VCDecodeFailure other = VC_DECODE_NOT_A_PICTURE;
+    std::thread([&] {
+        VCImage* mine = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
+        VCImage_decodeFromJpeg(mine, jpeg.data(), static_cast<int>(jpeg.size()));
+        other = VCPicture_lastFailure();
+        VCImage_destroy(mine);
+    }).join();
+    EXPECT_EQ(other, VC_DECODE_OK);
+    EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_NOT_A_PICTURE);
+}
+
+TEST(VcJpeg, HeaderAloneGivesTheDeclaredSize) {
+    VCImage* source = makeRgba(32, 24);
+    Bytes jpeg = encodeBytes(source, 90);
+    VCImage_destroy(source);
+    LogCapture log;
+    struct Case {
+        Bytes data;
+        int status, width, height;
+        VCDecodeFailure why;
+    } cases[] = {
+        {jpeg, 0, 32, 24, VC_DECODE_OK},
+        {jpegDeclaring(jpeg, 30000, 20000), 0, 30000, 20000, VC_DECODE_OK},
+        {pngDeclaring(20000, 17), 0, 20000, 17, VC_DECODE_OK},
+        {Bytes(jpeg.begin(), jpeg.begin() + 40), VC_ERROR_CODEC_FAILED, -1, -1,
+         VC_DECODE_TRUNCATED},
+        {Bytes(64, 'x'), VC_ERROR_CODEC_FAILED, -1, -1, VC_DECODE_NOT_A_PICTURE},
+    };
+    for (const Case& c : cases) {
+        int w = -1, h = -1;
+        EXPECT_EQ(VCPicture_readHeader(c.data.data(), static_cast<int>(c.data.size()), &w, &h),
+                  c.status);
+        EXPECT_EQ(w, c.width);
+        EXPECT_EQ(h, c.height);
+        EXPECT_EQ(VCPicture_lastFailure(), c.why);
+    }
+    int w = 0;
+    EXPECT_EQ(VCPicture_readHeader(jpeg.data(), 0, &w, &w), VC_ERROR_NULL_PARAM);
+    EXPECT_EQ(VCPicture_readHeader(nullptr, 10, &w, &w), VC_ERROR_NULL_PARAM);
+    EXPECT_EQ(countErrors(log, "VC_ERROR_CODEC_FAILED", -9), 2);
+    EXPECT_EQ(countErrors(log, "VC_ERROR_NULL_PARAM", -2), 2);
+}
+
+// CMYK and YCCK JPEGs (print workflows, some scanners) become RGB through the
+// inks: each channel is its ink's light times black's light.
+TEST(VcJpeg, CmykAndYcckDecodeThroughTheirInks) {
+    REQUIRE_GENERAL_CODECS();
+    const int w = 48, h = 32;
+    Bytes cmyk(static_cast<size_t>(w) * h * 4);
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x) {
+            unsigned char* p = &cmyk[(static_cast<size_t>(y) * w + x) * 4];
+            p[0] = static_cast<unsigned char>(40 + x * 4);
+            p[1] = static_cast<unsigned char>(60 + y * 5);
+            p[2] = 200;
+            p[3] = static_cast<unsigned char>(255 - (x + y));
+        }
+    struct Case {
+        const char* what;
+        J_COLOR_SPACE stored;
+        bool adobe;  // inks stored inverted, as Adobe's marker says
+    } cases[] = {
+        {"CMYK", JCS_CMYK, true}, {"YCCK", JCS_YCCK, true}, {"plain CMYK", JCS_CMYK, false}};
+    for (const Case& c : cases) {
+        Bytes stream = makeJpeg(w, h, JCS_CMYK, 4, c.stored, cmyk, c.adobe);
+        int rc = 1;
+        VCImage* rgba = decodeInto(VC_FORMAT_RGBA, stream, &rc);
+        ASSERT_EQ(rc, 0) << c.what;
+        ASSERT_EQ(shapeOf(rgba), "48x32");
+        // Quality 100; YCCK's chroma is subsampled, so edges move a little more.
+        int worst = 0;
+        for (size_t i = 0; i < static_cast<size_t>(w) * h; ++i) {
+            const unsigned char* ink = &cmyk[i * 4];
+            unsigned k = c.adobe ? ink[3] : 255u - ink[3];
+            for (int ch = 0; ch < 3; ++ch) {
+                unsigned light = c.adobe ? ink[ch] : 255u - ink[ch];
+                int want = static_cast<int>((light * k + 127) / 255);
+                worst = std::max(worst, std::abs(want - rgba->data[i * 4 + ch]));
+            }
+            ASSERT_EQ(rgba->data[i * 4 + 3], 255);
+        }
+        EXPECT_LE(worst, 4) << c.what << ": largest deviation from the ink products";
+        VCImage_destroy(rgba);
+    }
 }
 
 namespace {

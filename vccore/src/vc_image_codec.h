@@ -9,6 +9,7 @@
 #include <memory>
 
 #include "vccore/vc_image.h"
+#include "vccore/vc_picture.h"
 
 // The platform's fast JPEG codec, opened at run time when installed.
 #define VC_FAST_JPEG_LIBRARY "libkivjpeginterface.so"
@@ -49,6 +50,9 @@ public:
     // or a band fails.
     virtual bool readRgbaBands(unsigned char* rgba, int rows,
                                const std::function<bool(int, int)>& band) = 0;
+    // Why the last call returned false; VC_DECODE_OK when it was a band's
+    // own refusal.
+    virtual VCDecodeFailure failure() const = 0;
 };
 
 // Calls band(firstRow, count) for `height` rows taken `rows` at a time (fewer
@@ -65,6 +69,10 @@ inline bool VCPictureReader_forEachBand(int height, int rows,
 std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length);
 std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length);
 std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, size_t length);
+
+// Sets what VCPicture_lastFailure reports on this thread (the file loader's
+// own failures happen before any decoding).
+void VCPicture_setLastFailure(VCDecodeFailure failure);
 
 // Encodes with TurboJPEG: a new "JPEG" image, or null (not logged). The
 // caller has checked the image, its pixels and the quality (1…100).

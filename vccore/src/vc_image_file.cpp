@@ -113,6 +113,7 @@ extern "C" int VCImage_saveToFile(const VCImage* image, const char* path, int qu
 }
 
 extern "C" int VCImage_loadFromFile(VCImage* image, const char* path) {
+    VCPicture_setLastFailure(VC_DECODE_READ_FAILED);
     if (image == nullptr || path == nullptr) return VC_REPORT(VC_ERROR_NULL_PARAM);
     FILE* file = fopen(path, "rb");
     if (file == nullptr) return VC_REPORT(VC_ERROR_IO_FAILED);
@@ -129,11 +130,13 @@ extern "C" int VCImage_loadFromFile(VCImage* image, const char* path) {
     // The decoders take an int length.
     if (length > INT_MAX) {
         fclose(file);
+        VCPicture_setLastFailure(VC_DECODE_TOO_LARGE);
         return VC_REPORT(VC_ERROR_INVALID_SIZE);
     }
     unsigned char* buffer = static_cast<unsigned char*>(malloc(static_cast<size_t>(length)));
     if (buffer == nullptr) {
         fclose(file);
+        VCPicture_setLastFailure(VC_DECODE_NO_MEMORY);
         return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     }
     size_t total = 0;
@@ -156,12 +159,15 @@ extern "C" int VCImage_loadFromFile(VCImage* image, const char* path) {
     }
     // A picture the caller has described already: the file holds its raw
     // pixels (the length is deliberately not compared with the geometry).
+    // The decoder leaves a failed record as it found it, so this is the
+    // caller's own description, never a header's promise.
     if (image->width >= 1 && image->height >= 1 && VCImage_size(image) != 0) {
         VF_LogMsg(VF_LOG_DEBUG, "Decoding as raw image: %dx%d '%4.4s'", image->width, image->height,
                   reinterpret_cast<const char*>(&image->format));
         VCImage_deallocate(image);
         image->data = buffer;
         image->size = static_cast<uint32_t>(total);
+        VCPicture_setLastFailure(VC_DECODE_OK);
         return 0;
     }
     free(buffer);

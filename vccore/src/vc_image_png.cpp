@@ -5,6 +5,7 @@
 // destructors of their own: everything they own lives in members or in a
 // state record that is cleaned up once control is back.
 #include <png.h>
+#include <stdint.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
@@ -13,12 +14,31 @@
 
 namespace {
 
-[[noreturn]] void onPngError(png_structp png, png_const_charp) {
+// What a libpng error means to someone holding the file; libpng says it
+// only in words.
+VCDecodeFailure failureOf(const char* message) {
+    if (message == nullptr) return VC_DECODE_CORRUPT;
+    if (strcmp(message, "truncated") == 0) return VC_DECODE_TRUNCATED;
+    if (strstr(message, "exceeds user limit") != nullptr || strstr(message, "too large") != nullptr)
+        return VC_DECODE_TOO_LARGE;
+    if (strstr(message, "memory") != nullptr) return VC_DECODE_NO_MEMORY;
+    return VC_DECODE_CORRUPT;
+}
+
+// Readers pass where their failure goes as the error pointer; the writer none.
+// A size beyond libpng's limits is told by a warning just before the error.
+[[noreturn]] void onPngError(png_structp png, png_const_charp message) {
+    VCDecodeFailure* failure = static_cast<VCDecodeFailure*>(png_get_error_ptr(png));
+    if (failure != nullptr && *failure == VC_DECODE_OK) *failure = failureOf(message);
     png_longjmp(png, 1);
 }
 
 // Warnings (bad ancillary chunks and the like) do not stop a picture.
-void onPngWarning(png_structp, png_const_charp) {}
+void onPngWarning(png_structp png, png_const_charp message) {
+    VCDecodeFailure* failure = static_cast<VCDecodeFailure*>(png_get_error_ptr(png));
+    if (failure != nullptr && failureOf(message) == VC_DECODE_TOO_LARGE)
+        *failure = VC_DECODE_TOO_LARGE;
+}
 
 struct MemorySource {
     const unsigned char* bytes;
@@ -37,7 +57,7 @@ void readFromMemory(png_structp png, png_bytep out, png_size_t count) {
 class PngReader : public VCPictureReader {
 public:
     PngReader(const unsigned char* bytes, size_t length) : mSource{bytes, length, 0} {
-        mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
+        mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, &mFailure, onPngError, onPngWarning);
         if (mPng != nullptr) mInfo = png_create_info_struct(mPng);
     }
     ~PngReader() override {
@@ -47,7 +67,7 @@ public:
     }
 
     bool readHeader(int* width, int* height) override {
-        if (mPng == nullptr || mInfo == nullptr) return false;
+        if (mPng == nullptr || mInfo == nullptr) return fail(VC_DECODE_NO_MEMORY);
         if (setjmp(png_jmpbuf(mPng))) return false;
         png_set_read_fn(mPng, &mSource, readFromMemory);
         png_read_info(mPng, mInfo);
@@ -70,7 +90,7 @@ public:
         // libpng keeps sizes below 2^31; the row size proves the transforms took.
         if (mWidth == 0 || mHeight == 0 ||
             png_get_rowbytes(mPng, mInfo) != static_cast<size_t>(mWidth) * 4)
-            return false;
+            return fail(VC_DECODE_CORRUPT);
         *width = static_cast<int>(mWidth);
         *height = static_cast<int>(mHeight);
         return true;
@@ -79,7 +99,7 @@ public:
     bool readRgba(unsigned char* rgba) override {
         free(mRows);
         mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * mHeight));
-        if (mRows == nullptr) return false;
+        if (mRows == nullptr) return fail(VC_DECODE_NO_MEMORY);
         size_t stride = static_cast<size_t>(mWidth) * 4;
         for (png_uint_32 y = 0; y < mHeight; ++y) mRows[y] = rgba + y * stride;
         if (setjmp(png_jmpbuf(mPng))) return false;
@@ -95,7 +115,8 @@ public:
         if (mPasses != 1) {
             // Interlaced rows are only complete after the last pass.
             unsigned char* whole = static_cast<unsigned char*>(malloc(stride * mHeight));
-            bool ok = whole != nullptr && readRgba(whole) &&
+            if (whole == nullptr) return fail(VC_DECODE_NO_MEMORY);
+            bool ok = readRgba(whole) &&
                       VCPictureReader_forEachBand(height, rows, [&](int first, int count) {
                           memcpy(rgba, whole + first * stride, count * stride);
                           return band(first, count);
@@ -105,17 +126,24 @@ public:
         }
         free(mRows);
         mRows = static_cast<png_bytep*>(malloc(sizeof(png_bytep) * rows));
-        if (mRows == nullptr) return false;
+        if (mRows == nullptr) return fail(VC_DECODE_NO_MEMORY);
         for (int i = 0; i < rows; ++i) mRows[i] = rgba + i * stride;
         return VCPictureReader_forEachBand(height, rows, [&](int first, int count) {
             return readRows(count) && band(first, count);
         });
     }
 
+    VCDecodeFailure failure() const override { return mFailure; }
+
     PngReader(const PngReader&) = delete;
     PngReader& operator=(const PngReader&) = delete;
 
 private:
+    bool fail(VCDecodeFailure failure) {
+        mFailure = failure;
+        return false;
+    }
+
     // The next `count` rows into mRows; a libpng error returns here.
     bool readRows(int count) {
         if (setjmp(png_jmpbuf(mPng))) return false;
@@ -130,10 +158,44 @@ private:
     png_uint_32 mWidth = 0;
     png_uint_32 mHeight = 0;
     int mPasses = 1;
+    VCDecodeFailure mFailure = VC_DECODE_OK;
 };
 
+// Where a PNG stream goes: a FILE, or a growing malloc'ed buffer.
+struct PngSink {
+    FILE* file = nullptr;
+    unsigned char* bytes = nullptr;
+    size_t length = 0;
+    size_t capacity = 0;
+};
+
+void writeToSink(png_structp png, png_bytep data, png_size_t count) {
+    PngSink* sink = static_cast<PngSink*>(png_get_io_ptr(png));
+    if (sink->file != nullptr) {
+        if (fwrite(data, 1, count, sink->file) != count) png_error(png, "write failed");
+        return;
+    }
+    if (count > sink->capacity - sink->length) {
+        size_t capacity = sink->capacity < 4096 ? 4096 : sink->capacity;
+        while (count > capacity - sink->length) {
+            if (capacity > SIZE_MAX / 2) png_error(png, "too large");
+            capacity *= 2;
+        }
+        unsigned char* grown = static_cast<unsigned char*>(realloc(sink->bytes, capacity));
+        if (grown == nullptr) png_error(png, "out of memory");
+        sink->bytes = grown;
+        sink->capacity = capacity;
+    }
+    memcpy(sink->bytes + sink->length, data, count);
+    sink->length += count;
+}
+
+void flushSink(png_structp png) {
+    PngSink* sink = static_cast<PngSink*>(png_get_io_ptr(png));
+    if (sink->file != nullptr && fflush(sink->file) != 0) png_error(png, "write failed");
+}
+
 struct PngWriteState {
-    FILE* file;
     png_structp png;
     png_infop info;
     unsigned char* row;
@@ -158,20 +220,40 @@ void unpremultiplyRow(const unsigned char* from, unsigned char* to, png_uint_32 
     }
 }
 
-bool writeRows(PngWriteState* state, const unsigned char* rgba, png_uint_32 width,
-               png_uint_32 height) {
+bool writeRows(PngWriteState* state, PngSink* sink, const unsigned char* rgba, png_uint_32 width,
+               png_uint_32 height, bool premultiplied) {
     if (setjmp(png_jmpbuf(state->png))) return false;
-    png_init_io(state->png, state->file);
+    png_set_write_fn(state->png, sink, writeToSink, flushSink);
     png_set_IHDR(state->png, state->info, width, height, 8, PNG_COLOR_TYPE_RGB_ALPHA,
                  PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
     png_write_info(state->png, state->info);
     size_t stride = static_cast<size_t>(width) * 4;
     for (png_uint_32 y = 0; y < height; ++y) {
-        unpremultiplyRow(rgba + y * stride, state->row, width);
-        png_write_row(state->png, state->row);
+        const unsigned char* row = rgba + y * stride;
+        if (premultiplied) {
+            unpremultiplyRow(row, state->row, width);
+            row = state->row;
+        }
+        png_write_row(state->png, row);
     }
     png_write_end(state->png, nullptr);
     return true;
+}
+
+// RGBA pixels (premultiplied or straight) as a straight-alpha PNG into the sink.
+bool writePng(PngSink* sink, const unsigned char* rgba, int width, int height, bool premultiplied) {
+    if (rgba == nullptr || width < 1 || height < 1) return false;
+    PngWriteState state = {nullptr, nullptr, nullptr};
+    state.row = static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4));
+    state.png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
+    if (state.png != nullptr) state.info = png_create_info_struct(state.png);
+    bool ok = state.row != nullptr && state.info != nullptr &&
+              writeRows(&state, sink, rgba, static_cast<png_uint_32>(width),
+                        static_cast<png_uint_32>(height), premultiplied);
+    if (state.png != nullptr)
+        png_destroy_write_struct(&state.png, state.info != nullptr ? &state.info : nullptr);
+    free(state.row);
+    return ok;
 }
 
 }  // namespace
@@ -181,20 +263,27 @@ std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, 
 }
 
 bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height) {
-    if (path == nullptr || rgba == nullptr || width < 1 || height < 1) return false;
-    PngWriteState state = {nullptr, nullptr, nullptr, nullptr};
-    state.row = static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4));
-    state.png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
-    if (state.png != nullptr) state.info = png_create_info_struct(state.png);
-    if (state.row != nullptr && state.info != nullptr) state.file = fopen(path, "wb");
-    bool ok = state.file != nullptr && writeRows(&state, rgba, static_cast<png_uint_32>(width),
-                                                 static_cast<png_uint_32>(height));
-    if (state.file != nullptr) {
-        if (fflush(state.file) != 0 || ferror(state.file)) ok = false;
-        if (fclose(state.file) != 0) ok = false;
-    }
-    if (state.png != nullptr)
-        png_destroy_write_struct(&state.png, state.info != nullptr ? &state.info : nullptr);
-    free(state.row);
+    if (path == nullptr) return false;
+    PngSink sink;
+    sink.file = fopen(path, "wb");
+    if (sink.file == nullptr) return false;
+    bool ok = writePng(&sink, rgba, width, height, true);
+    if (ferror(sink.file)) ok = false;
+    if (fclose(sink.file) != 0) ok = false;
     return ok;
+}
+
+extern "C" unsigned char* VCPicture_encodePng(const VCImage* image, size_t* length) {
+    if (image == nullptr || length == nullptr || image->format != VC_FORMAT_RGBA ||
+        image->data == nullptr)
+        return nullptr;
+    uint32_t required = VCImage_requiredSize(image->width, image->height, VC_FORMAT_RGBA);
+    if (required == 0 || VCImage_size(image) < required) return nullptr;
+    PngSink sink;
+    if (!writePng(&sink, image->data, image->width, image->height, false) || sink.length == 0) {
+        free(sink.bytes);
+        return nullptr;
+    }
+    *length = sink.length;
+    return sink.bytes;
 }

@@ -9,6 +9,8 @@
 #include <turbojpeg.h>
 // jpeglib.h needs stdio.h (FILE) before it.
 #include <jpeglib.h>
+// The message codes, to tell the kinds of failure apart.
+#include <jerror.h>
 
 #include <vector>
 
@@ -44,10 +46,10 @@ public:
         mInfo.progress = &mProgress;
         jpeg_mem_src(&mInfo, mBytes, static_cast<unsigned long>(mLength));
         jpeg_read_header(&mInfo, TRUE);
-        if (mInfo.image_width < 1 || mInfo.image_height < 1 ||
-            mInfo.image_width > static_cast<JDIMENSION>(INT32_MAX / 4) ||
+        if (mInfo.image_width < 1 || mInfo.image_height < 1) return fail(VC_DECODE_CORRUPT);
+        if (mInfo.image_width > static_cast<JDIMENSION>(INT32_MAX / 4) ||
             mInfo.image_height > static_cast<JDIMENSION>(INT32_MAX))
-            return false;
+            return fail(VC_DECODE_TOO_LARGE);
         *width = static_cast<int>(mInfo.image_width);
         *height = static_cast<int>(mInfo.image_height);
         mHeaderRead = true;
@@ -69,6 +71,8 @@ public:
                finish();
     }
 
+    VCDecodeFailure failure() const override { return mError.failure; }
+
     JpegReader(const JpegReader&) = delete;
     JpegReader& operator=(const JpegReader&) = delete;
 
@@ -81,10 +85,16 @@ private:
     struct ErrorManager {
         jpeg_error_mgr base;
         jmp_buf jump;
+        VCDecodeFailure failure;
     };
 
+    [[noreturn]] static void stop(j_common_ptr info, VCDecodeFailure failure) {
+        ErrorManager* manager = reinterpret_cast<ErrorManager*>(info->err);
+        manager->failure = failure;
+        longjmp(manager->jump, 1);
+    }
     [[noreturn]] static void onError(j_common_ptr info) {
-        longjmp(reinterpret_cast<ErrorManager*>(info->err)->jump, 1);
+        stop(info, failureOf(info->err->msg_code));
     }
     // A warning (a corrupt or truncated stream that would decode as grey)
     // stops the picture; trace messages (level > 0) are ignored.
@@ -94,17 +104,67 @@ private:
     static void onProgress(j_common_ptr info) {
         if (info->is_decompressor &&
             reinterpret_cast<j_decompress_ptr>(info)->input_scan_number > kMaxScans)
-            onError(info);
+            stop(info, VC_DECODE_CORRUPT);
+    }
+
+    // What a libjpeg error or warning means to someone holding the file.
+    static VCDecodeFailure failureOf(int code) {
+        switch (code) {
+            case JWRN_JPEG_EOF:
+            case JERR_INPUT_EOF:
+            case JERR_INPUT_EMPTY:
+                return VC_DECODE_TRUNCATED;
+            case JERR_CONVERSION_NOTIMPL:
+            case JERR_BAD_J_COLORSPACE:
+            case JERR_COMPONENT_COUNT:
+                return VC_DECODE_UNSUPPORTED_COLOR;
+            case JERR_BAD_PRECISION:
+            case JERR_SOF_UNSUPPORTED:
+            case JERR_ARITH_NOTIMPL:
+            case JERR_NOT_COMPILED:
+                return VC_DECODE_UNSUPPORTED_CODING;
+            case JERR_IMAGE_TOO_BIG:
+            case JERR_WIDTH_OVERFLOW:
+                return VC_DECODE_TOO_LARGE;
+            case JERR_OUT_OF_MEMORY:
+                return VC_DECODE_NO_MEMORY;
+            default:
+                return VC_DECODE_CORRUPT;
+        }
+    }
+
+    bool fail(VCDecodeFailure failure) {
+        mError.failure = failure;
+        return false;
     }
 
     // Each call into libjpeg sits in a function of its own with its own
     // setjmp, so that nothing a longjmp skips is still in use.
     bool start() {
         if (setjmp(mError.jump)) return false;
-        mInfo.out_color_space = JCS_EXT_RGBA;
+        // libjpeg turns CMYK and YCCK into CMYK only; readRows makes RGBA of it.
+        mCmyk = mInfo.jpeg_color_space == JCS_CMYK || mInfo.jpeg_color_space == JCS_YCCK;
+        mInfo.out_color_space = mCmyk ? JCS_CMYK : JCS_EXT_RGBA;
         jpeg_start_decompress(&mInfo);
-        return mInfo.output_width == mInfo.image_width &&
-               mInfo.output_height == mInfo.image_height && mInfo.output_components == 4;
+        if (mInfo.output_width != mInfo.image_width || mInfo.output_height != mInfo.image_height ||
+            mInfo.output_components != 4)
+            return fail(VC_DECODE_UNSUPPORTED_COLOR);
+        return true;
+    }
+
+    // Adobe's CMYK JPEGs (the ones with its marker, which is nearly all of
+    // them) store inverted inks: 255 is no ink. Either way a channel is the
+    // product of its ink's and black's light.
+    void cmykToRgba(unsigned char* row) const {
+        const bool inverted = mInfo.saw_Adobe_marker != 0;
+        for (JDIMENSION x = 0; x < mInfo.output_width; ++x, row += 4) {
+            unsigned k = inverted ? row[3] : 255u - row[3];
+            for (int c = 0; c < 3; ++c) {
+                unsigned ink = inverted ? row[c] : 255u - row[c];
+                row[c] = static_cast<unsigned char>((ink * k + 127) / 255);
+            }
+            row[3] = 255;
+        }
     }
 
     // The next `count` rows, at the start of `rgba`.
@@ -116,7 +176,9 @@ private:
             int want = count - done < kMaxRowsPerRead ? count - done : kMaxRowsPerRead;
             for (int i = 0; i < want; ++i) pointers[i] = rgba + (done + i) * stride;
             JDIMENSION got = jpeg_read_scanlines(&mInfo, pointers, static_cast<JDIMENSION>(want));
-            if (got == 0) return false;  // the source ran dry
+            if (got == 0) return fail(VC_DECODE_TRUNCATED);  // the source ran dry
+            if (mCmyk)
+                for (JDIMENSION i = 0; i < got; ++i) cmykToRgba(pointers[i]);
             done += static_cast<int>(got);
         }
         return true;
@@ -135,6 +197,7 @@ private:
     jpeg_progress_mgr mProgress{};
     bool mCreated = false;
     bool mHeaderRead = false;
+    bool mCmyk = false;
 };
 
 // TurboJPEG pixel format of an RGB-family or grey image, -1 otherwise.

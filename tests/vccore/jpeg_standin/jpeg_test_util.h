@@ -1,5 +1,5 @@
-// Fixtures shared by the JPEG, PNG and file suites: test pictures, PNG
-// streams written straight through libpng, temporary directories.
+// Fixtures shared by the JPEG, PNG and file suites: test pictures, PNG and
+// JPEG streams written straight through libpng and libjpeg.
 #ifndef KIV_TESTS_JPEG_TEST_UTIL_H
 #define KIV_TESTS_JPEG_TEST_UTIL_H
 
@@ -9,20 +9,24 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <unistd.h>
+// jpeglib.h needs stdio.h (FILE) before it.
+#include <jpeglib.h>
 
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <string>
 #include <vector>
 
 #include "support/log_capture.h"
+#include "support/temp_dir.h"
 #include "../vc_error_lines.h"
 #include "vccore/vc_image.h"
 
 namespace jpegtest {
 
-using Bytes = std::vector<unsigned char>;
+using kivtest::Bytes;
+using kivtest::fileExists;
+using kivtest::readFile;
+using kivtest::TempDir;
+using kivtest::writeFile;
 
 // Whether the platform's fast JPEG codec can be opened in this process.
 inline bool fastCodecInstalled() {
@@ -53,39 +57,6 @@ inline Bytes bytesOf(const VCImage* image) {
 }
 inline std::string shapeOf(const VCImage* image) {
     return std::to_string(image->width) + "x" + std::to_string(image->height);
-}
-
-// A fresh directory under /tmp, removed with its content at the end of the scope.
-class TempDir {
-public:
-    TempDir() {
-        char pattern[] = "/tmp/kiv_jpeg_XXXXXX";
-        mPath = mkdtemp(pattern);
-    }
-    ~TempDir() {
-        std::error_code ignored;  // a destructor must not throw
-        std::filesystem::remove_all(mPath, ignored);
-    }
-    std::string file(const std::string& name) const { return mPath + "/" + name; }
-    const std::string& path() const { return mPath; }
-
-private:
-    std::string mPath;
-};
-
-inline Bytes readFile(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-}
-
-inline void writeFile(const std::string& path, const Bytes& bytes) {
-    std::ofstream(path, std::ios::binary)
-        .write(reinterpret_cast<const char*>(bytes.data()),
-               static_cast<std::streamsize>(bytes.size()));
-}
-
-inline bool fileExists(const std::string& path) {
-    return access(path.c_str(), F_OK) == 0;
 }
 
 // A PNG stream written directly with libpng. `rows` holds the samples as the
@@ -127,6 +98,40 @@ inline Bytes makePng(const PngPicture& picture) {
     png_write_image(png, rows.data());
     png_write_end(png, nullptr);
     png_destroy_write_struct(&png, &info);
+    return out;
+}
+
+// A JPEG stream written directly with libjpeg at quality 100: `samples`
+// holds `components` interleaved bytes a pixel in `input` colours, stored as
+// `stored` (libjpeg converts where they differ). Adobe's marker (which says
+// how CMYK inks are stored) is written as libjpeg does by default, or not.
+inline Bytes makeJpeg(int width, int height, J_COLOR_SPACE input, int components,
+                      J_COLOR_SPACE stored, const Bytes& samples, bool adobeMarker = true) {
+    jpeg_compress_struct info;
+    jpeg_error_mgr error;
+    info.err = jpeg_std_error(&error);
+    jpeg_create_compress(&info);
+    unsigned char* stream = nullptr;
+    unsigned long length = 0;
+    jpeg_mem_dest(&info, &stream, &length);
+    info.image_width = static_cast<JDIMENSION>(width);
+    info.image_height = static_cast<JDIMENSION>(height);
+    info.input_components = components;
+    info.in_color_space = input;
+    jpeg_set_defaults(&info);
+    jpeg_set_colorspace(&info, stored);
+    if (!adobeMarker) info.write_Adobe_marker = FALSE;
+    jpeg_set_quality(&info, 100, TRUE);
+    jpeg_start_compress(&info, TRUE);
+    while (info.next_scanline < info.image_height) {
+        JSAMPROW row = const_cast<JSAMPROW>(samples.data()) +
+                       static_cast<size_t>(info.next_scanline) * width * components;
+        jpeg_write_scanlines(&info, &row, 1);
+    }
+    jpeg_finish_compress(&info);
+    jpeg_destroy_compress(&info);
+    Bytes out(stream, stream + length);
+    free(stream);
     return out;
 }
 
