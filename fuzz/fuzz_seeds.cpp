@@ -42,6 +42,46 @@ bool writeTurbo(const std::string& path, const VCImage* rgba, int subsampling, i
     return ok;
 }
 
+// PNG chunk checksum (CRC-32, reflected polynomial 0xEDB88320).
+uint32_t crc32Of(const unsigned char* p, size_t n) {
+    uint32_t crc = 0xFFFFFFFFu;
+    for (size_t i = 0; i < n; ++i) {
+        crc ^= p[i];
+        for (int k = 0; k < 8; ++k) crc = (crc >> 1) ^ (0xEDB88320u & (0u - (crc & 1u)));
+    }
+    return crc ^ 0xFFFFFFFFu;
+}
+
+// A valid stream whose header is rewritten to promise width×height, so that
+// the fuzzer starts inside that size class.
+bool writeHuge(const std::string& path, const std::string& from, int width, int height) {
+    FILE* f = fopen(from.c_str(), "rb");
+    if (f == nullptr) return false;
+    std::vector<unsigned char> bytes(1 << 16);
+    bytes.resize(fread(bytes.data(), 1, bytes.size(), f));
+    fclose(f);
+    auto put16 = [&](size_t at, int v) {
+        bytes[at] = static_cast<unsigned char>(v >> 8);
+        bytes[at + 1] = static_cast<unsigned char>(v);
+    };
+    bool png = bytes.size() > 24 && bytes[1] == 'P';
+    if (png) {
+        put16(18, width);
+        put16(22, height);
+        uint32_t crc = crc32Of(&bytes[12], 17);  // the header chunk's type and fields
+        put16(29, static_cast<int>(crc >> 16));
+        put16(31, static_cast<int>(crc & 0xFFFF));
+        return writeBytes(path, bytes.data(), bytes.size());
+    }
+    for (size_t i = 2; i + 8 < bytes.size(); ++i) {
+        if (bytes[i] != 0xFF || bytes[i + 1] != 0xC0) continue;
+        put16(i + 5, height);
+        put16(i + 7, width);
+        return writeBytes(path, bytes.data(), bytes.size());
+    }
+    return false;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -72,6 +112,8 @@ int main(int argc, char** argv) {
     if (!writeTurbo(dir + "/progressive.jpg", rgba, TJSAMP_420, TJFLAG_PROGRESSIVE)) ++failures;
     if (!writeTurbo(dir + "/full-chroma.jpg", rgba, TJSAMP_444, 0)) ++failures;
     VCImage_destroy(rgba);
+    if (!writeHuge(dir + "/huge.jpg", dir + "/rgba.jpg", 30000, 30000)) ++failures;
+    if (!writeHuge(dir + "/huge.png", dir + "/rgba.png", 20000, 20000)) ++failures;
     if (failures != 0) fprintf(stderr, "fuzz_seeds: %d seeds could not be written\n", failures);
     return failures == 0 ? 0 : 1;
 }
