@@ -258,13 +258,7 @@ TEST(VcFile, LoadFromFile) {
         VCImage* oddRgba = VCImage_createNew(63, 48, VC_FORMAT_RGBA);
         memset(oddRgba->data, 0x40, oddRgba->size);
         ASSERT_EQ(VCImage_saveToFile(oddRgba, dir.file("odd.jpg").c_str(), 90), 0);
-        Bytes bomb = readFile(dir.file("odd.jpg"));
-        for (size_t i = 2; i + 8 < bomb.size(); ++i)
-            if (bomb[i] == 0xFF && bomb[i + 1] == 0xC0) {
-                bomb[i + 5] = bomb[i + 7] = 30000 >> 8;  // 30000x30000
-                bomb[i + 6] = bomb[i + 8] = 30000 & 0xFF;
-                break;
-            }
+        Bytes bomb = jpegDeclaring(readFile(dir.file("odd.jpg")), 30000, 30000);
         writeFile(dir.file("bomb.jpg"), bomb);
         struct Case {
             const char* file;

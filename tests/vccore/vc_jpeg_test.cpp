@@ -91,37 +91,6 @@ VCImage* decodeInto(uint32_t format, const Bytes& data, int* rc) {
     return image;
 }
 
-// Offset of the first byte after a marker's two bytes, or 0.
-size_t findMarker(const Bytes& jpeg, unsigned char marker) {
-    for (size_t i = 2; i + 1 < jpeg.size(); ++i)
-        if (jpeg[i] == 0xFF && jpeg[i + 1] == marker) return i + 2;
-    return 0;
-}
-
-// PNG chunk checksum (CRC-32, reflected polynomial 0xEDB88320).
-uint32_t crc32Of(const unsigned char* p, size_t n) {
-    uint32_t crc = 0xFFFFFFFFu;
-    for (size_t i = 0; i < n; ++i) {
-        crc ^= p[i];
-        for (int k = 0; k < 8; ++k) crc = (crc >> 1) ^ (0xEDB88320u & (0u - (crc & 1u)));
-    }
-    return crc ^ 0xFFFFFFFFu;
-}
-
-// A well-formed 1×1 PNG whose header is rewritten to declare width×height.
-Bytes pngDeclaring(uint32_t width, uint32_t height) {
-    PngPicture tiny;
-    tiny.samples = {1, 2, 3, 4};
-    Bytes png = makePng(tiny);
-    auto put = [&](size_t at, uint32_t v) {
-        for (int k = 0; k < 4; ++k) png[at + k] = static_cast<unsigned char>(v >> (24 - 8 * k));
-    };
-    put(16, width);
-    put(20, height);
-    put(29, crc32Of(&png[12], 17));  // over the chunk type and header fields
-    return png;
-}
-
 }  // namespace
 
 TEST(VcJpeg, EncodeMakesJpegRecordWithClampedQuality) {
@@ -394,17 +363,6 @@ std::string recordOf(const VCImage* image) {
              reinterpret_cast<const char*>(&image->format), image->wrapped, image->size,
              image->uvOffset);
     return text;
-}
-
-// A JPEG stream whose frame header is rewritten to declare width×height.
-Bytes jpegDeclaring(Bytes jpeg, int width, int height) {
-    size_t sof = findMarker(jpeg, 0xC0);
-    EXPECT_NE(sof, 0u);
-    jpeg[sof + 3] = static_cast<unsigned char>(height >> 8);
-    jpeg[sof + 4] = static_cast<unsigned char>(height);
-    jpeg[sof + 5] = static_cast<unsigned char>(width >> 8);
-    jpeg[sof + 6] = static_cast<unsigned char>(width);
-    return jpeg;
 }
 
 }  // namespace
