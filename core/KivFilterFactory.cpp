@@ -3,6 +3,7 @@
 #include "core/KivFilter.h"
 
 // Effect headers: one include per effect family.
+#include "core/filters/sce/colorEffects.h"
 #include "core/filters/sce/fixedLooks.h"
 
 namespace {
@@ -24,6 +25,19 @@ const KivFilterFactory::Entry kEffects[] = {
     {440, 440, KivFilterFactory::make<BW>},
     {442, 442, KivFilterFactory::make<Posterize>},
     {443, 443, KivFilterFactory::make<ThermalVision>},
+    // Adjustable colour effects and their presets.
+    {425, 425, KivFilterFactory::make<CustomColor>},
+    {426, 426, KivFilterFactory::make<Breezy>},
+    {427, 427, KivFilterFactory::make<Vivid>},
+    {428, 428, KivFilterFactory::make<Nostalgic>},
+    {429, 429, KivFilterFactory::make<Soft>},
+    {430, 430, KivFilterFactory::make<Serene>},
+    {431, 431, KivFilterFactory::make<Brightness>},
+    {432, 432, KivFilterFactory::make<Temperature>},
+    {433, 433, KivFilterFactory::make<Contrast>},
+    {434, 434, KivFilterFactory::make<Saturate>},
+    {435, 435, KivFilterFactory::make<TintControl>},
+    {436, 436, KivFilterFactory::make<HighlightShadow>},
 };
 
 }  // namespace

@@ -177,6 +177,10 @@ int VFilterBufferedProcessorImpl::unbindGLEnvironment() {
                mMaxTextureSize);
     }
     if (mProgram != nullptr) {
+        // Effects with GL objects of their own hand them over now, while this
+        // call's context is current; nothing of theirs outlives the call.
+        mProgram->setFilter(nullptr);
+        mProgram->getRecycler()->recycle();
         mProgram->release();
         mProgram.clear();
     }

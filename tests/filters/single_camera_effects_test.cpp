@@ -13,6 +13,7 @@
 #include "core/egl/EglRecycler.h"
 #include "core/filters/sce/fixedLooks.h"
 #include "core/filters/sce/singleCameraEffects.h"
+#include "support/effect_renderer.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
@@ -37,37 +38,9 @@ struct Rendered {
     int drawResult = -100;
 };
 
-// Draws `effect` over `picture` into a picture-sized target with the identity
-// texture mapping and reads it back (row 0 = picture row 0).
 Rendered renderWithProgram(KivFilter* effect, const lookref::Picture& picture) {
     Rendered out;
-    const int w = picture.width(), h = picture.height();
-    GlExternalTexture texture;
-    if (!GlTest_makeExternalTexture(w, h, picture.rgba().data(), &texture)) return out;
-    glActiveTexture(GL_TEXTURE0);
-    glBindTexture(GL_TEXTURE_EXTERNAL_OES, texture.external);
-    // Filtering as the library's external images use it.
-    glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-    glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-    GlTarget target;
-    if (GlTest_makeTarget(w, h, &target)) {
-        android::sp<EglProgram> program = new EglProgram();
-        program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
-        program->setFilter(effect);
-        if (program->initialize(10, false) == 0) {
-            program->setCameraGeometry(w, h, 0, 0);
-            program->setPreviewGeometry(w, h, false);
-            glClearColor(0, 0, 0, 1);
-            glClear(GL_COLOR_BUFFER_BIT);
-            out.drawResult = program->onDrawFrame();
-            out.pixels = GlTest_readPixels(w, h);
-        }
-        program->release();
-        effect->releaseGL(*program->getRecycler());
-        GlTest_deleteTarget(&target);
-    }
-    glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
-    GlTest_deleteExternalTexture(&texture);
+    out.pixels = EffectRenderer_renderOnce(effect, picture, &out.drawResult);
     return out;
 }
 

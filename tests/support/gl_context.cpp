@@ -122,6 +122,15 @@ std::vector<uint8_t> GlTest_readPixels(int width, int height) {
     return pixels;
 }
 
+int GlTest_liveObjects(int range) {
+    int n = 0;
+    for (GLuint name = 1; name <= GLuint(range); ++name) {
+        n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name) +
+             glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
+    }
+    return n;
+}
+
 void GlContextTest::SetUp() {
     mGl = new GlContext();
     ASSERT_TRUE(mGl->ok()) << "no EGL context (Mesa llvmpipe, EGL_PLATFORM=surfaceless)";

@@ -65,6 +65,10 @@ void GlTest_fillHalves(int width, int height);
 // Reads the bound framebuffer; row 0 is the bottom row (GL order).
 std::vector<uint8_t> GlTest_readPixels(int width, int height);
 
+// Live GL objects (textures, framebuffers, renderbuffers, programs, shaders,
+// buffers) among the first `range` names of each kind, in the current context.
+int GlTest_liveObjects(int range);
+
 // Fixture: a context per test; fails the test at once when it cannot be made.
 class GlContextTest : public ::testing::Test {
 protected:

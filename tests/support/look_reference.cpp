@@ -7,6 +7,9 @@
 
 #include <gtest/gtest.h>
 
+#include "vccore/vc_convert.h"
+#include "vccore/vc_image.h"
+
 namespace lookref {
 
 namespace {
@@ -239,32 +242,101 @@ int tolerance(int look) {
     return look == 410 ? 4 : 2;
 }
 
+void expectPixels(const std::vector<uint8_t>& expected, const std::vector<bool>* skip,
+                  const uint8_t* actual, int width, int height, int tolerance,
+                  const std::string& label, int rows) {
+    const size_t n = size_t(width) * (rows < 0 ? height : rows);
+    size_t bad = 0;
+    std::string first;
+    for (size_t i = 0; i < n; ++i) {
+        if (skip != nullptr && (*skip)[i]) continue;
+        for (int ch = 0; ch < 4; ++ch) {
+            int want = expected[i * 4 + ch], got = actual[i * 4 + ch];
+            if (std::abs(want - got) <= tolerance) continue;
+            if (bad++ == 0)
+                first = std::to_string(i % width) + "," + std::to_string(i / width) + " ch" +
+                        std::to_string(ch) + " want " + std::to_string(want) + " got " +
+                        std::to_string(got);
+            break;
+        }
+    }
+    EXPECT_EQ(0u, bad) << label << ": first bad pixel " << first;
+}
+
 void expectLook(int look, const Picture& picture, const uint8_t* actual, const std::string& label,
                 int rows) {
     std::vector<bool> nearThreshold;
     std::vector<uint8_t> expected = render(look, picture, &nearThreshold);
-    const size_t n = size_t(picture.width()) * (rows < 0 ? picture.height() : rows);
-    size_t bad = 0, skipped = 0;
-    std::string first;
-    for (size_t i = 0; i < n; ++i) {
-        if (nearThreshold[i]) {
-            ++skipped;
-            continue;
-        }
-        for (int ch = 0; ch < 4; ++ch) {
-            int want = expected[i * 4 + ch], got = actual[i * 4 + ch];
-            if (std::abs(want - got) <= tolerance(look)) continue;
-            if (bad++ == 0)
-                first = std::to_string(i % picture.width()) + "," +
-                        std::to_string(i / picture.width()) + " ch" + std::to_string(ch) +
-                        " want " + std::to_string(want) + " got " + std::to_string(got);
-            break;
-        }
-    }
-    EXPECT_EQ(0u, bad) << label << " look " << look << ": first bad pixel " << first;
+    expectPixels(expected, &nearThreshold, actual, picture.width(), picture.height(),
+                 tolerance(look), label + " look " + std::to_string(look), rows);
     if (rows < 0) {
+        size_t n = size_t(picture.width()) * picture.height(), skipped = 0;
+        for (bool b : nearThreshold) skipped += b;
         EXPECT_LT(skipped * 8, n) << label << " look " << look << ": too many skipped";
     }
+}
+
+std::vector<uint8_t> renderColour(const std::vector<ColourStep>& steps, const ColourUniforms& u,
+                                  const Picture& p) {
+    const size_t n = static_cast<size_t>(p.width()) * p.height();
+    std::vector<uint8_t> out(n * 4);
+    for (size_t i = 0; i < n; ++i) {
+        float c[4];
+        p.sample((i % p.width() + 0.5f) / p.width(), (i / p.width() + 0.5f) / p.height(), c);
+        for (ColourStep step : steps) {
+            switch (step) {
+                case BRIGHTNESS:
+                    for (int k = 0; k < 3; ++k) c[k] *= 1.0f + u.brightness;
+                    break;
+                case TINT:  // pulls each channel towards 1 by the tint's share
+                    for (int k = 0; k < 3; ++k) c[k] = u.tint[k] * (1.0f - c[k]) + c[k];
+                    break;
+                case SATURATE: {  // away from the (approximate) mean by u_saturate
+                    float mean = (c[0] + c[1] + c[2]) * 0.333f;
+                    for (int k = 0; k < 3; ++k) c[k] = c[k] + (mean - c[k]) * -u.saturate;
+                    break;
+                }
+                case TEMPERATURE: {
+                    float r = c[0] + c[0] * (1.0f - c[0]) * u.temperature;
+                    float g = c[1] + c[1] * (1.0f - c[1]) * u.temperaturePositive;
+                    float b = c[2] - c[2] * (1.0f - c[2]) * u.temperature;
+                    float top = std::max(std::max(r, 1.0f), std::max(g, b));
+                    c[0] = r / top;
+                    c[1] = g / top;
+                    c[2] = b / top;
+                    break;
+                }
+                case CONTRAST:
+                    for (int k = 0; k < 3; ++k) c[k] = (c[k] - 0.5f) * u.contrast + 0.5f;
+                    break;
+                case LEVELS:
+                    for (int k = 0; k < 3; ++k)
+                        c[k] = clamp01((c[k] - u.inputShadow) / u.inputLevel * u.outputLevel +
+                                       u.outputShadow);
+                    break;
+            }
+        }
+        c[3] = 1.0f;
+        for (int ch = 0; ch < 4; ++ch)
+            out[i * 4 + ch] = static_cast<uint8_t>(std::lround(clamp01(c[ch]) * 255.0f));
+    }
+    return out;
+}
+
+Nv21Picture makeNv21Picture(int width, int height) {
+    Nv21Picture p{width, height, {}, {}};
+    std::vector<uint8_t> rgba = makeTestPicture(width, height, true);
+    VCImage* src = VCImage_createWrap(rgba.data(), width, height, VC_FORMAT_RGBA, 0, 0);
+    VCImage* yuv = VCImage_createNew(width, height, VC_FORMAT_NV21);
+    VCImage* back = VCImage_createNew(width, height, VC_FORMAT_RGBA);
+    EXPECT_EQ(0, VCImage_convert(src, yuv));
+    EXPECT_EQ(0, VCImage_convert(yuv, back));
+    p.nv21.assign(yuv->data, yuv->data + VCImage_size(yuv));
+    p.rgba.assign(back->data, back->data + VCImage_size(back));
+    VCImage_destroy(src);
+    VCImage_destroy(yuv);
+    VCImage_destroy(back);
+    return p;
 }
 
 std::vector<uint8_t> makeTestPicture(int width, int height, bool opaque) {

@@ -47,6 +47,42 @@ int tolerance(int look);
 void expectLook(int look, const Picture& picture, const uint8_t* actual, const std::string& label,
                 int rows = -1);
 
+// Compares an RGBA8 result with an expected one over the first `rows` rows
+// (all when negative), channel by channel within `tolerance` (in 1/255),
+// skipping pixels flagged in `skip` (may be null).
+void expectPixels(const std::vector<uint8_t>& expected, const std::vector<bool>* skip,
+                  const uint8_t* actual, int width, int height, int tolerance,
+                  const std::string& label, int rows = -1);
+
+// The adjustable colour effects: the uniforms of their shaders (neutral by
+// default) and the colour steps, in the order a shader applies them.
+struct ColourUniforms {
+    float brightness = 0.0f;
+    float tint[3] = {0.0f, 0.0f, 0.0f};
+    float saturate = 0.0f;
+    float temperature = 0.0f;
+    float temperaturePositive = 0.0f;
+    float contrast = 1.0f;
+    float inputShadow = 0.0f;
+    float outputShadow = 0.0f;
+    float inputLevel = 0.5f;
+    float outputLevel = 0.5f;
+};
+enum ColourStep { BRIGHTNESS, TINT, SATURATE, TEMPERATURE, CONTRAST, LEVELS };
+
+// Expected RGBA8 target content (alpha 1) of those steps over the picture.
+std::vector<uint8_t> renderColour(const std::vector<ColourStep>& steps, const ColourUniforms& u,
+                                  const Picture& picture);
+
+// An NV21 picture of the test content, and the RGBA the image core makes of
+// it: what an effect's shader samples when the NV21 path is used.
+struct Nv21Picture {
+    int width, height;
+    std::vector<uint8_t> nv21;
+    std::vector<uint8_t> rgba;
+};
+Nv21Picture makeNv21Picture(int width, int height);
+
 // Deterministic test picture: smooth gradients with sharp-edged blocks and a
 // few flat patches, alpha varying unless opaque.
 std::vector<uint8_t> makeTestPicture(int width, int height, bool opaque);

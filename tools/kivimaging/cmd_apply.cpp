@@ -28,6 +28,7 @@ const char kHelp[] =
     "                           or a filter-library name (\"package,libname.so\");\n"
     "                           'kivimaging effects' lists them\n"
     "  -p, --parameter TEXT     option string for adjustable effects, e.g. \"intensity=50\"\n"
+    "                           or \"TE=40,SA=-60\"; 'kivimaging effects' lists the names\n"
     "  -o, --output PATH        the output file for one input; a folder for several\n"
     "                           inputs (created when missing), where each result keeps\n"
     "                           its input's file name\n"

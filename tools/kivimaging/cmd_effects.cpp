@@ -14,7 +14,9 @@ const char kHelp[] =
     "Lists every effect the library's factory serves: its id, its class name, the\n"
     "type id the effect reports (it differs from the id on purpose for a few\n"
     "effects) and the names of its options ('-' for none). Use the id or the class\n"
-    "name with 'apply -e'; effects with the option 'parameter' take -p \"name=value,...\".\n";
+    "name with 'apply -e'; effects with the option 'parameter' take -p \"name=value,...\"\n"
+    "with the names shown beside it (whole numbers, -200 to 200 for the colour\n"
+    "controls; a name missing from the text takes its neutral value).\n";
 
 const OptionSpec kOptions[] = {
     {'h', "help", false},
@@ -44,7 +46,14 @@ int cmdEffects(int argc, char** argv) {
     printf("%5s  %-22s %11s  %s\n", "ID", "CLASS", "TYPE", "OPTIONS");
     for (const EffectInfo& e : list) {
         std::string options;
-        for (const std::string& o : e.options) options += (options.empty() ? "" : ", ") + o;
+        for (const std::string& o : e.options) {
+            options += (options.empty() ? "" : ", ") + o;
+            if (o != "parameter" || e.parameterKeys.empty()) continue;
+            std::string keys;
+            for (const std::string& k : e.parameterKeys)
+                keys += (keys.empty() ? "" : ",") + k + "=N";
+            options += " (" + keys + ")";
+        }
         printf("%5d  %-22s %11d  %s\n", e.id, e.className.c_str(), e.filterType,
                options.empty() ? "-" : options.c_str());
     }

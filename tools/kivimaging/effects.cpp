@@ -9,6 +9,7 @@
 #include "args.h"
 #include "core/KivBuiltInFilterCatalog.h"
 #include "core/KivImaging.h"
+#include "core/KivParameterOption.h"
 
 namespace kivcli {
 namespace {
@@ -25,6 +26,10 @@ bool describe(int id, EffectInfo* info) {
     info->options.clear();
     const char* const* names = KivImaging_listOptionNames(filter);
     for (int i = 0; names != nullptr && names[i] != nullptr; i++) info->options.push_back(names[i]);
+    info->parameterKeys.clear();
+    const char* const* keys = KivFilter_parameterKeys(filter);
+    for (int i = 0; keys != nullptr && keys[i] != nullptr; i++)
+        info->parameterKeys.push_back(keys[i]);
     KivImaging_destroy(filter);
     return true;
 }

@@ -15,6 +15,7 @@ struct EffectInfo {
     std::string className;
     int filterType;  // what the effect reports; may differ from id on purpose
     std::vector<std::string> options;
+    std::vector<std::string> parameterKeys;  // what its "parameter" text reads, when it says
 };
 
 // Asks the factory for every id of the built-in ranges (200-213, 400-447,
