@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "core/VFilterBufferedProcessorImpl.h"
+#include "file_bench.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 
@@ -31,67 +32,12 @@ constexpr int kHeight = 3000;
 constexpr int kQuality = 98;
 constexpr int kRuns = 5;
 
+using namespace filebench;
+
 std::string gDir;
 std::vector<double> gOurs, gVips, gVipsStartup;
 // Where our time goes: decoding, the GPU pass, encoding and writing.
 std::vector<double> gDecode, gProcess, gEncode;
-
-void quietLog(int, const char*, ...) {}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
-}
-
-long fileSize(const std::string& path) {
-    struct stat st;
-    return stat(path.c_str(), &st) == 0 ? static_cast<long>(st.st_size) : -1;
-}
-
-// Mean absolute difference per channel between two picture files, or -1.
-// Both sides must have done the same work for the ratio to mean anything.
-double meanDifference(const std::string& a, const std::string& b) {
-    VCImage* x = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
-    VCImage* y = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
-    double mean = -1;
-    if (VCImage_loadFromFile(x, a.c_str()) == VC_OK &&
-        VCImage_loadFromFile(y, b.c_str()) == VC_OK && x->width == y->width &&
-        x->height == y->height) {
-        size_t pixels = static_cast<size_t>(x->width) * x->height;
-        double sum = 0;
-        for (size_t i = 0; i < pixels; i++) {
-            for (int c = 0; c < 3; c++) sum += std::abs(x->data[i * 4 + c] - y->data[i * 4 + c]);
-        }
-        mean = sum / (pixels * 3.0);
-    }
-    VCImage_destroy(x);
-    VCImage_destroy(y);
-    return mean;
-}
-
-// A photo-like picture: smooth colour fields, soft circles and a little grain,
-// so the codecs see realistic detail rather than flat areas or pure noise.
-bool writeInput(const std::string& path, int width, int height) {
-    VCImage* image = VCImage_createNew(width, height, VC_FORMAT_RGBA);
-    if (image == nullptr) return false;
-    uint32_t seed = 12345;
-    for (int y = 0; y < height; y++) {
-        for (int x = 0; x < width; x++) {
-            double fx = static_cast<double>(x) / width, fy = static_cast<double>(y) / height;
-            double ring = 0.5 + 0.5 * std::sin(std::hypot(fx - 0.4, fy - 0.6) * 40.0);
-            seed = seed * 1664525u + 1013904223u;
-            int grain = static_cast<int>((seed >> 24) % 17) - 8;
-            uint8_t* p = image->data + (static_cast<size_t>(y) * width + x) * 4;
-            p[0] = static_cast<uint8_t>(std::clamp(40 + 180 * fx + 30 * ring + grain, 0.0, 255.0));
-            p[1] = static_cast<uint8_t>(std::clamp(60 + 120 * fy + 40 * ring + grain, 0.0, 255.0));
-            p[2] = static_cast<uint8_t>(std::clamp(200 - 150 * fx * fy + grain, 0.0, 255.0));
-            p[3] = 255;
-        }
-    }
-    int rc = VCImage_saveToFile(image, path.c_str(), 90);
-    VCImage_destroy(image);
-    return rc == VC_OK && fileSize(path) > 0;
-}
 
 // The Sepia effect's matrix, rows for R, G and B.
 bool writeMatrix(const std::string& path) {
@@ -103,10 +49,6 @@ bool writeMatrix(const std::string& path) {
             "0.349 0.686 0.168\n"
             "0.272 0.536 0.131\n");
     return fclose(f) == 0;
-}
-
-double seconds(std::chrono::steady_clock::duration d) {
-    return std::chrono::duration<double>(d).count();
 }
 
 // Runs `vips recomb` from `in` to `out`; seconds, or -1 on failure.
@@ -178,11 +120,7 @@ void BM_SepiaFile_OurSteps(benchmark::State& state) {
 double runVips(const std::string& in, const std::string& out) {
     const std::string cmd = "vips recomb '" + in + "' '" + out + "[Q=" + std::to_string(kQuality) +
                             "]' '" + gDir + "/sepia.mat'";
-    unlink(out.c_str());
-    auto start = std::chrono::steady_clock::now();
-    int rc = system(cmd.c_str());
-    auto stop = std::chrono::steady_clock::now();
-    return rc == 0 && fileSize(out) > 0 ? seconds(stop - start) : -1;
+    return timeCommand(cmd, out);
 }
 
 // The process start-up and library set-up share of a vips run.
@@ -214,9 +152,8 @@ int main(int argc, char** argv) {
     // Per-call debug lines would be timed too; errors still show.
     VF_LogMsg = quietLog;
     __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
-    char tmpl[] = "/tmp/bench_sepia_file_XXXXXX";
-    if (mkdtemp(tmpl) == nullptr) return 1;
-    gDir = tmpl;
+    gDir = makeTempDir("bench_sepia_file");
+    if (gDir.empty()) return 1;
     if (!writeInput(gDir + "/input.jpg", kWidth, kHeight) ||
         !writeInput(gDir + "/tiny.jpg", 16, 16) || !writeMatrix(gDir + "/sepia.mat")) {
         fprintf(stderr, "bench_sepia_file: cannot write the input files in %s\n", gDir.c_str());
@@ -226,9 +163,7 @@ int main(int argc, char** argv) {
     benchmark::RunSpecifiedBenchmarks();
     benchmark::Shutdown();
     double difference = meanDifference(gDir + "/ours.jpg", gDir + "/vips.jpg");
-    std::string cleanup = "rm -rf '" + gDir + "'";
-    int rc = system(cleanup.c_str());
-    (void)rc;
+    removeDir(gDir);
 
     if (gOurs.empty() || gVips.empty()) {
         fprintf(stderr, "bench_sepia_file: a side did not run; no ratio\n");
