@@ -16,6 +16,23 @@ namespace {
 std::atomic<int> gErrors{0};
 bool gVerbose = false;
 
+// Lines the library logs at error level on purpose during normal work (a
+// trace of every buffer lock, the 8K texture toggle): shown as the debug
+// traces they are, so that an error label means an error.
+const char* const kRoutineErrorLines[] = {
+    "EGL: lockGraphicBuffer format : ",
+    "EGL: Enable GL_ENABLE_8K_TEXTURES_AND_RENDERING_QCOM",
+    "EGL: Disable GL_ENABLE_8K_TEXTURES_AND_RENDERING_QCOM",
+};
+
+int shownLevel(int level, const char* line) {
+    if (level < VF_LOG_ERROR) return level;
+    for (const char* routine : kRoutineErrorLines) {
+        if (strncmp(line, routine, strlen(routine)) == 0) return VF_LOG_DEBUG;
+    }
+    return level;
+}
+
 void coreLog(int level, const char* format, ...) __attribute__((format(printf, 2, 3)));
 
 void coreLog(int level, const char* format, ...) {
@@ -26,7 +43,7 @@ void coreLog(int level, const char* format, ...) {
     vsnprintf(line, sizeof(line), format, args);
     va_end(args);
     if (level >= VF_LOG_ERROR && cliLogIsErrorReport(line)) gErrors++;
-    if (gVerbose) fprintf(stderr, "%s %s\n", VF_LogLabel(level), line);
+    if (gVerbose) fprintf(stderr, "%s %s\n", VF_LogLabel(shownLevel(level, line)), line);
 }
 
 void androidLog(const struct __android_logger_data* data, const char* message) {

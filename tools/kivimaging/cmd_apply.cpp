@@ -1,5 +1,4 @@
 #include <errno.h>
-#include <limits.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
@@ -12,6 +11,7 @@
 #include "cli.h"
 #include "cli_log.h"
 #include "effects.h"
+#include "file_io.h"
 #include "image_io.h"
 #include "progress.h"
 #include "runner.h"
@@ -35,8 +35,10 @@ const char kHelp[] =
     "  -q, --quality N          JPEG quality 1-100 (default 98)\n"
     "  -v, --verbose            show the library's log on standard error\n"
     "\n"
-    "The output format follows the extension: .png, .jpg or .jpeg. A progress bar\n"
-    "is shown when standard output is a terminal.\n"
+    "The output format follows the name's last extension: .png, .jpg or .jpeg\n"
+    "(x.jpg.png is a PNG). JPEG inputs are turned upright as their EXIF\n"
+    "orientation says. An existing output is replaced only once the new file is\n"
+    "complete. A progress bar is shown when standard output is a terminal.\n"
     "Exit status: 0 all written, 1 a picture could not be read, processed or\n"
     "written (the others are still done), 2 bad arguments.\n";
 
@@ -58,11 +60,6 @@ std::string baseName(const std::string& path) {
 std::string joinPath(const std::string& dir, const std::string& name) {
     if (!dir.empty() && dir.back() == '/') return dir + name;
     return dir + "/" + name;
-}
-
-std::string canonical(const std::string& path) {
-    char buf[PATH_MAX];
-    return realpath(path.c_str(), buf) != nullptr ? std::string(buf) : path;
 }
 
 // One job per input: where its result goes.
@@ -128,7 +125,7 @@ int cmdApply(int argc, char** argv) {
     int rc = planJobs(args.positionals, output, &jobs);
     if (rc != kExitOk) return rc;
     for (const Job& job : jobs) {
-        if (canonical(job.input) == canonical(job.output)) {
+        if (fileSame(job.input, job.output)) {
             return usageError("apply", "'" + job.input + "' would be overwritten by its result");
         }
     }
@@ -146,12 +143,15 @@ int cmdApply(int argc, char** argv) {
                 effect.label.c_str());
     }
 
+    // Pictures the GPU cannot take are refused from their header, before a
+    // long decoding that could only end in a failed draw.
+    const int maxSide = runner.maxPictureSide();
     int written = 0;
     ProgressBar bar(stdout, static_cast<int>(jobs.size()), jobs.size() > 1 && isatty(1));
     for (size_t i = 0; i < jobs.size(); i++) {
         const Job& job = jobs[i];
         bar.update(static_cast<int>(i), baseName(job.input).c_str());
-        ImageHolder input(imageLoadRgba(job.input, &error));
+        ImageHolder input(imageLoadRgba(job.input, &error, maxSide));
         ImageHolder result(input.get() != nullptr ? runner.run(input.get(), &error) : nullptr);
         if (result.get() == nullptr || !imageSave(result.get(), job.output, quality, &error)) {
             bar.finish();

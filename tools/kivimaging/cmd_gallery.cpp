@@ -6,6 +6,7 @@
 #include "cli_log.h"
 #include "contact_sheet.h"
 #include "effects.h"
+#include "file_io.h"
 #include "image_io.h"
 #include "progress.h"
 #include "runner.h"
@@ -29,7 +30,8 @@ const char kHelp[] =
     "      --thumb WIDTH     thumbnail width, 16 to 1024 (default 200); the height\n"
     "                        follows the picture's aspect ratio\n"
     "      --columns N       thumbnails per row, 1 to 32 (default 6)\n"
-    "  -p, --parameter TEXT  option string handed to every effect\n"
+    "  -p, --parameter TEXT  option string handed to every effect that takes\n"
+    "                        parameters (the others are counted in a warning)\n"
     "  -v, --verbose         show the library's log on standard error\n"
     "\n"
     "Exit status: 0 the sheet was written (effects that failed to render are\n"
@@ -70,6 +72,10 @@ int cmdGallery(int argc, char** argv) {
     if (args.has("columns") && !parseInt(args.get("columns"), 1, 32, &columns)) {
         return usageError("gallery", "--columns must be a number from 1 to 32");
     }
+    if (!args.positionals.empty() && fileSame(args.positionals[0], output)) {
+        return usageError(
+            "gallery", "'" + args.positionals[0] + "' would be overwritten by the contact sheet");
+    }
     cliLogSetup(args.has("verbose"));
 
     ImageHolder picture(args.positionals.empty()
@@ -100,6 +106,7 @@ int cmdGallery(int argc, char** argv) {
     if (!runner.open(&error)) return failure(error);
     std::string parameter = args.get("parameter");
     std::vector<std::string> failed;
+    int withoutParameters = 0;
     ProgressBar bar(stdout, layout.count, isatty(1));
     for (int i = 0; i < layout.count; i++) {
         const EffectInfo& e = effects[i];
@@ -108,8 +115,9 @@ int cmdGallery(int argc, char** argv) {
         EffectChoice choice;
         choice.id = e.id;
         choice.label = label;
-        ImageHolder rendered(
-            runner.select(choice, parameter, &error) ? runner.run(thumb.get(), &error) : nullptr);
+        bool selected = runner.select(choice, parameter, &error);
+        if (selected && !parameter.empty() && !runner.acceptsParameter()) withoutParameters++;
+        ImageHolder rendered(selected ? runner.run(thumb.get(), &error) : nullptr);
         if (rendered.get() == nullptr) {
             failed.push_back(label + ": " + error);
             // The cell keeps the background; the label says what happened.
@@ -124,6 +132,12 @@ int cmdGallery(int argc, char** argv) {
     bar.update(layout.count, "");
     bar.finish();
 
+    if (withoutParameters > 0) {
+        fprintf(stderr,
+                "kivimaging: warning: %d of %d effects take no parameters; -p is ignored "
+                "by them\n",
+                withoutParameters, layout.count);
+    }
     if (!imageSave(sheet.get(), output, kDefaultJpegQuality, &error)) return failure(error);
     for (const std::string& f : failed) fprintf(stderr, "kivimaging: effect %s\n", f.c_str());
     printf("gallery: %d effects (%d failed), %dx%d, written to %s\n", layout.count,

@@ -1,13 +1,13 @@
 #include "image_io.h"
 
-#include <errno.h>
-#include <stdio.h>
+#include <stdlib.h>
 #include <string.h>
 #include <strings.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
+#include "file_io.h"
+#include "orientation.h"
 #include "vccore/vc_file.h"
+#include "vccore/vc_picture.h"
 
 namespace kivcli {
 namespace {
@@ -19,59 +19,70 @@ bool endsWith(const std::string& s, const char* suffix) {
 
 }  // namespace
 
-bool imageWritableFormat(const std::string& path) {
-    return endsWith(path, ".png") || endsWith(path, ".jpg") || endsWith(path, ".jpeg");
+ImageFileFormat imageFileFormat(const std::string& path) {
+    if (endsWith(path, ".png")) return ImageFileFormat::kPng;
+    if (endsWith(path, ".jpg") || endsWith(path, ".jpeg")) return ImageFileFormat::kJpeg;
+    return ImageFileFormat::kNone;
 }
 
-VCImage* imageLoadRgba(const std::string& path, std::string* error) {
-    struct stat st;
-    if (stat(path.c_str(), &st) != 0) {
-        *error = "cannot read '" + path + "': " + strerror(errno);
+VCImage* imageLoadRgba(const std::string& path, std::string* error, int maxSide) {
+    FileBytes bytes;
+    if (!fileReadPicture(path, &bytes, error)) return nullptr;
+    const int length = static_cast<int>(bytes.size());
+    int width = 0, height = 0;
+    if (maxSide > 0 && VCPicture_readHeader(bytes.data(), length, &width, &height) == VC_OK &&
+        (width > maxSide || height > maxSide)) {
+        *error = "cannot process '" + path + "': " + std::to_string(width) + "x" +
+                 std::to_string(height) + " is larger than this GPU's " + std::to_string(maxSide) +
+                 " limit";
         return nullptr;
     }
-    if (S_ISDIR(st.st_mode)) {
-        *error = "cannot read '" + path + "': it is a directory";
+    ImageHolder image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
+    if (image.get() == nullptr ||
+        VCImage_decodeFromJpeg(image.get(), bytes.data(), length) != VC_OK) {
+        *error = "cannot decode '" + path + "': " + VCPicture_failureText(VCPicture_lastFailure());
         return nullptr;
     }
-    if (access(path.c_str(), R_OK) != 0) {
-        *error = "cannot read '" + path + "': " + strerror(errno);
-        return nullptr;
+    int orientation = orientationOfJpeg(bytes.data(), bytes.size());
+    if (orientation != 1) {
+        image.reset(orientationApply(image.get(), orientation));
+        if (image.get() == nullptr) {
+            *error = "cannot turn '" + path + "' upright: out of memory";
+            return nullptr;
+        }
     }
-    if (st.st_size == 0) {
-        *error = "cannot read '" + path + "': the file is empty";
-        return nullptr;
-    }
-    // Width and height stay 0 so that an undecodable file is not taken as raw pixels.
-    VCImage* image = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
-    int rc = VCImage_loadFromFile(image, path.c_str());
-    if (rc != VC_OK || image->data == nullptr || image->width < 1 || image->height < 1) {
-        *error = "cannot decode '" + path + "' as a JPEG or PNG picture (" +
-                 (rc != VC_OK ? VCError_name(rc) : "no pixels") + ")";
-        VCImage_destroy(image);
-        return nullptr;
-    }
-    return image;
+    return image.release();
 }
 
 bool imageSave(const VCImage* image, const std::string& path, int quality, std::string* error) {
-    if (!imageWritableFormat(path)) {
+    ImageFileFormat format = imageFileFormat(path);
+    unsigned char* stream = nullptr;
+    size_t length = 0;
+    VCImage* jpeg = nullptr;
+    if (format == ImageFileFormat::kPng) {
+        stream = VCPicture_encodePng(image, &length);
+    } else if (format == ImageFileFormat::kJpeg) {
+        jpeg = VCImage_encodeToJpeg(image, quality);
+        if (jpeg != nullptr) {
+            stream = jpeg->data;
+            length = jpeg->size;
+        }
+    } else {
         *error = "cannot write '" + path + "': the name must end in .png, .jpg or .jpeg";
         return false;
     }
-    // The library writes JPEG streams over an existing file without truncating it.
-    if (unlink(path.c_str()) != 0 && errno != ENOENT) {
-        *error = "cannot replace '" + path + "': " + strerror(errno);
-        return false;
+    bool ok = stream != nullptr && length > 0;
+    if (!ok) {
+        *error = "cannot write '" + path + "': the picture could not be encoded";
+    } else {
+        ok = fileWriteAtomic(path, stream, length, error);
     }
-    int rc = VCImage_saveToFile(image, path.c_str(), quality);
-    struct stat st;
-    if (rc != VC_OK || stat(path.c_str(), &st) != 0 || st.st_size == 0) {
-        *error = "cannot write '" + path + "'" +
-                 (rc != VC_OK ? std::string(" (") + VCError_name(rc) + ")"
-                              : std::string(" (nothing was written; is the folder writable?)"));
-        return false;
+    if (jpeg != nullptr) {
+        VCImage_destroy(jpeg);
+    } else {
+        free(stream);
     }
-    return true;
+    return ok;
 }
 
 }  // namespace kivcli

@@ -20,6 +20,12 @@ public:
         VCImage_destroy(mImage);
         mImage = image;
     }
+    // Hands the image over to the caller.
+    VCImage* release() {
+        VCImage* image = mImage;
+        mImage = nullptr;
+        return image;
+    }
     ImageHolder(const ImageHolder&) = delete;
     ImageHolder& operator=(const ImageHolder&) = delete;
 
@@ -27,16 +33,22 @@ private:
     VCImage* mImage;
 };
 
-// True when the path names a format the tool writes: .png, .jpg, .jpeg (any case).
-bool imageWritableFormat(const std::string& path);
+// The formats the tool writes, told by the name's last extension (any case).
+enum class ImageFileFormat { kNone, kPng, kJpeg };
+ImageFileFormat imageFileFormat(const std::string& path);
+inline bool imageWritableFormat(const std::string& path) {
+    return imageFileFormat(path) != ImageFileFormat::kNone;
+}
 
-// Decodes a JPEG or PNG file into a new "RGBA" image; null with a message for
-// a missing, unreadable, empty or undecodable file.
-VCImage* imageLoadRgba(const std::string& path, std::string* error);
+// Decodes a JPEG or PNG file into a new "RGBA" image, turned upright as its
+// EXIF orientation says. With `maxSide` > 0 a picture wider or taller than
+// that is refused from its header, before anything is decoded. Null with a
+// message naming the path and the reason otherwise.
+VCImage* imageLoadRgba(const std::string& path, std::string* error, int maxSide = 0);
 
-// Writes an image as PNG or JPEG by the path's extension, replacing any file
-// there; false with a message when the format is not one of ours or nothing
-// usable was written.
+// Writes an "RGBA" image (straight alpha, as decoded and rendered) as PNG or
+// JPEG by the path's extension, replacing any file there only once the new
+// one is complete. False with a message naming the path and the reason.
 bool imageSave(const VCImage* image, const std::string& path, int quality, std::string* error);
 
 }  // namespace kivcli

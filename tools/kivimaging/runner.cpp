@@ -5,6 +5,7 @@
 #include "cli_log.h"
 #include "core/KivFilter.h"
 #include "core/VFilterBufferedProcessorImpl.h"
+#include "core/egl/Platform.h"
 
 namespace kivcli {
 
@@ -67,6 +68,14 @@ bool EffectRunner::acceptsParameter() const {
         if (strcmp(names[i], "parameter") == 0) return true;
     }
     return false;
+}
+
+int EffectRunner::maxPictureSide() {
+    if (mProcessor == nullptr) return 0;
+    // The size is a GL query: it needs the processor's context current.
+    int size = mProcessor->bindGLEnvironment() == 0 ? Platform::getMaximumTextureSize() : 0;
+    mProcessor->unbindGLEnvironment();
+    return size;
 }
 
 VCImage* EffectRunner::run(const VCImage* input, std::string* error) {

@@ -25,6 +25,9 @@ public:
     // Whether the selected effect has an option named "parameter" (the one
     // the parameter string goes to).
     bool acceptsParameter() const;
+    // The longest picture side the GPU takes (its maximum texture size, as
+    // the library's platform detection reads it); 0 when it cannot be asked.
+    int maxPictureSide();
     // Renders `input` ("RGBA") into a new "RGBA" image of the same size.
     VCImage* run(const VCImage* input, std::string* error);
 

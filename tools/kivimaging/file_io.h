@@ -1,0 +1,34 @@
+// Reading whole files and replacing them safely, with the system's reason
+// on failure.
+#ifndef TOOLS_KIVIMAGING_FILE_IO_H
+#define TOOLS_KIVIMAGING_FILE_IO_H
+
+#include <stddef.h>
+
+#include <string>
+#include <vector>
+
+namespace kivcli {
+
+using FileBytes = std::vector<unsigned char>;
+
+// Reads a whole file, or anything that streams like one (a FIFO, a process
+// substitution). Stops early on a stream that cannot be a picture: it must
+// start like a JPEG or a PNG. False with "cannot read '<path>': <reason>".
+bool fileReadPicture(const std::string& path, FileBytes* bytes, std::string* error);
+
+// Replaces `path` with `length` bytes through a temporary file beside it:
+// every write, the flush to disk and the close are checked before it is
+// renamed over the target (mode 0644 less the umask). On failure the target
+// is as it was, the temporary is gone, and `error` names the path and the
+// system's reason.
+bool fileWriteAtomic(const std::string& path, const unsigned char* bytes, size_t length,
+                     std::string* error);
+
+// Whether two paths name the same existing file (hard links and symbolic
+// links included).
+bool fileSame(const std::string& a, const std::string& b);
+
+}  // namespace kivcli
+
+#endif
