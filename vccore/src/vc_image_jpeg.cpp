@@ -320,7 +320,7 @@ extern "C" const char* VCPicture_failureText(VCDecodeFailure failure) {
         case VC_DECODE_UNSUPPORTED_COLOR:
             return "its colour space is not supported";
         case VC_DECODE_UNSUPPORTED_CODING:
-            return "its coding is not supported (such as 12-bit, lossless or arithmetic JPEG)";
+            return "its coding is not supported (such as 12-bit or lossless JPEG)";
         case VC_DECODE_TOO_LARGE:
             return "the picture is too large";
         case VC_DECODE_NO_MEMORY:
