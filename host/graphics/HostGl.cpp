@@ -1,15 +1,9 @@
-#include "HostGl.h"
+#include "host/graphics/HostGl.h"
 
-#include <dlfcn.h>
-#include <link.h>
 #include <stdlib.h>
-#include <string.h>
-#include <unistd.h>
 
-#include <map>
-
-#include "SharedPixels.h"
 #include "core/egl/EglExtensions.h"
+#include "host/graphics/EglDisplayReferences.h"
 #include "vccore/vc_log.h"
 
 namespace android {
@@ -33,23 +27,6 @@ const EGLint kContextAttribs[] = {EGL_CONTEXT_CLIENT_VERSION, 2, EGL_NONE};
 const EGLint kPbufferAttribs[] = {EGL_WIDTH, 1, EGL_HEIGHT, 1, EGL_NONE};
 
 std::atomic<void (*)()> gDisplayIdleHook{nullptr};
-
-// Whether textures can take shared memory as storage: unknown until the
-// first import tries, then settled for the process (one driver per process).
-enum ImportState { IMPORT_UNKNOWN, IMPORT_WORKS, IMPORT_FAILS };
-std::atomic<int> gImportState{IMPORT_UNKNOWN};
-std::atomic<bool> gImportAllowed{true};
-
-// With a context current: whether it can take imported memory as texture storage.
-bool memoryObjectsPresent() {
-    static const bool present = [] {
-        const EglExtensions& ext = EglExtensions::get();
-        return EglExtensions::hasGl("GL_EXT_memory_object_fd") &&
-               ext.glCreateMemoryObjectsEXT != nullptr && ext.glDeleteMemoryObjectsEXT != nullptr &&
-               ext.glImportMemoryFdEXT != nullptr && ext.glTexStorageMem2DEXT != nullptr;
-    }();
-    return present;
-}
 
 }  // namespace
 
@@ -231,111 +208,6 @@ GLuint HostGl::framebuffer_l() {
     return mFramebuffer;
 }
 
-bool HostGl::mayImport() {
-    return gImportAllowed.load() && gImportState.load() != IMPORT_FAILS;
-}
-
-void HostGl::allowImports(bool allowed) {
-    gImportAllowed = allowed;
-}
-
-GLuint HostGl::importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
-                               GLuint* memoryObject) {
-    *memoryObject = 0;
-    if (gImportState.load() == IMPORT_UNKNOWN) {
-        bool works = probeImport_l();
-        gImportState = works ? IMPORT_WORKS : IMPORT_FAILS;
-        if (!works) VF_LogMsg(VF_LOG_INFO, "HostGl: no shared texture memory; buffers are copied");
-    }
-    if (gImportState.load() != IMPORT_WORKS || !gImportAllowed.load()) return 0;
-    return import_l(pixels, width, height, memoryObject);
-}
-
-GLuint HostGl::import_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
-                        GLuint* memoryObject) {
-    const EglExtensions& ext = EglExtensions::get();
-    if (!memoryObjectsPresent() || pixels.empty()) return 0;
-    while (glGetError() != GL_NO_ERROR) {
-    }
-    int fd = pixels.duplicateFd();
-    if (fd < 0) return 0;
-    GLuint memory = 0;
-    ext.glCreateMemoryObjectsEXT(1, &memory);
-    ext.glImportMemoryFdEXT(memory, pixels.fileSize(), GL_HANDLE_TYPE_OPAQUE_FD_EXT, fd);
-    if (glGetError() != GL_NO_ERROR) {
-        // A refused import leaves the descriptor with us.
-        close(fd);
-        ext.glDeleteMemoryObjectsEXT(1, &memory);
-        return 0;
-    }
-    GLuint texture = 0;
-    glGenTextures(1, &texture);
-    glBindTexture(GL_TEXTURE_2D, texture);
-    ext.glTexStorageMem2DEXT(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)width, (GLsizei)height,
-                             memory, 0);
-    setMirrorSampling_l(texture);
-    if (glGetError() != GL_NO_ERROR) {
-        deleteImported_l(texture, memory);
-        return 0;
-    }
-    *memoryObject = memory;
-    return texture;
-}
-
-void HostGl::setMirrorSampling_l(GLuint texture) {
-    glBindTexture(GL_TEXTURE_2D, texture);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
-    glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
-    glBindTexture(GL_TEXTURE_2D, 0);
-}
-
-void HostGl::deleteImported_l(GLuint texture, GLuint memoryObject) {
-    if (texture != 0) glDeleteTextures(1, &texture);
-    if (memoryObject != 0 && memoryObjectsPresent()) {
-        EglExtensions::get().glDeleteMemoryObjectsEXT(1, &memoryObject);
-    }
-}
-
-bool HostGl::probeImport_l() {
-    // A 5x3 texture: its rows are padded, so a wrong row pitch or row order
-    // puts the one cleared texel somewhere else.
-    const uint32_t w = 5, h = 3, x = 3, y = 2;
-    SharedPixels pixels;
-    if (!memoryObjectsPresent() || !pixels.allocate(w, h)) return false;
-    GLuint memory = 0;
-    GLuint texture = import_l(pixels, w, h, &memory);
-    if (texture == 0) return false;
-    GLuint framebuffer = framebuffer_l();
-    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer);
-    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, texture, 0);
-    bool ok = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
-    if (ok) {
-        glEnable(GL_SCISSOR_TEST);
-        glScissor((GLint)x, (GLint)y, 1, 1);
-        glClearColor(10 / 255.0f, 20 / 255.0f, 30 / 255.0f, 40 / 255.0f);
-        glClear(GL_COLOR_BUFFER_BIT);
-        glDisable(GL_SCISSOR_TEST);
-        glFinish();
-    }
-    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, 0, 0);
-    glBindFramebuffer(GL_FRAMEBUFFER, 0);
-    const size_t pitch = SharedPixels::rowPitch(w);
-    const unsigned char expected[4] = {10, 20, 30, 40};
-    for (uint32_t row = 0; ok && row < h; ++row) {
-        for (uint32_t col = 0; ok && col < w; ++col) {
-            const unsigned char* p = pixels.pixels() + row * pitch + col * 4;
-            bool lit = row == y && col == x;
-            for (int c = 0; c < 4; ++c) ok = ok && p[c] == (lit ? expected[c] : 0);
-        }
-    }
-    deleteImported_l(texture, memory);
-    while (glGetError() != GL_NO_ERROR) {
-    }
-    return ok;
-}
-
 void HostGl::setDisplayIdleHook(void (*hook)()) {
     gDisplayIdleHook = hook;
 }
@@ -347,78 +219,9 @@ void HostGl::onOneDisplayReferenceLeft(EGLDisplay display) {
     if (hook != nullptr) hook();
 }
 
-}  // namespace android
-
-// Display references, as Android's EGL keeps them: every successful
-// eglInitialize() counts, and eglTerminate() ends the display only with the
-// last one. Mesa terminates at once, which would destroy the host context
-// (and every other pipeline's context) when one pipeline releases its
-// environment. These definitions take the place of libEGL's in the program
-// and forward to it.
-namespace {
-
-std::mutex& referencesLock() {
-    static std::mutex* lock = new std::mutex();
-    return *lock;
-}
-
-std::map<EGLDisplay, int>& references() {
-    static std::map<EGLDisplay, int>* map = new std::map<EGLDisplay, int>();
-    return *map;
-}
-
-// Mesa loads its DRI driver at the first eglInitialize and unloads it at the
-// last eglTerminate. Unloading throws away the driver's once-only state (each
-// new display pays to rebuild it) and leaves its static allocations pointing
-// from code that is gone, which leak checkers report as ours. Keep it resident.
-int pinDriver(struct dl_phdr_info* info, size_t, void*) {
-    if (info->dlpi_name != nullptr && strstr(info->dlpi_name, "_dri.so") != nullptr) {
-        dlopen(info->dlpi_name, RTLD_NOW | RTLD_NOLOAD | RTLD_NODELETE);
-    }
-    return 0;
-}
-
-template <typename T>
-T nextSymbol(const char* name) {
-    return reinterpret_cast<T>(dlsym(RTLD_NEXT, name));
-}
-
-}  // namespace
-
-namespace android {
-
 bool HostGl::displayHasOtherUsers() const {
     EGLDisplay display = mHeldDisplay.load();
-    if (display == EGL_NO_DISPLAY) return false;
-    std::lock_guard<std::mutex> guard(referencesLock());
-    auto found = references().find(display);
-    return found != references().end() && found->second > 1;
+    return display != EGL_NO_DISPLAY && EglDisplayReferences_count(display) > 1;
 }
 
 }  // namespace android
-
-extern "C" EGLBoolean eglInitialize(EGLDisplay display, EGLint* major, EGLint* minor) {
-    static const auto next =
-        nextSymbol<EGLBoolean (*)(EGLDisplay, EGLint*, EGLint*)>("eglInitialize");
-    std::lock_guard<std::mutex> guard(referencesLock());
-    EGLBoolean result = next(display, major, minor);
-    if (result == EGL_TRUE && references()[display]++ == 0) dl_iterate_phdr(pinDriver, nullptr);
-    return result;
-}
-
-extern "C" EGLBoolean eglTerminate(EGLDisplay display) {
-    static const auto next = nextSymbol<EGLBoolean (*)(EGLDisplay)>("eglTerminate");
-    int left = 0;
-    {
-        std::lock_guard<std::mutex> guard(referencesLock());
-        auto found = references().find(display);
-        if (found == references().end() || found->second <= 1) {
-            if (found != references().end()) references().erase(found);
-            return next(display);
-        }
-        left = --found->second;
-    }
-    // Outside the lock: letting the host context go terminates again.
-    if (left == 1) android::HostGl::get().onOneDisplayReferenceLeft(display);
-    return EGL_TRUE;
-}

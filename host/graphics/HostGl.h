@@ -1,24 +1,18 @@
-// The host graphics context: one OpenGL ES 2 context of the host layer,
-// on the default EGL display, that owns the GPU mirrors of every
-// GraphicBuffer. Any thread may borrow it for a moment (run()), so buffers
-// can be synchronised from threads that have no context of their own.
+// The host graphics context: one OpenGL ES 2 context of the host layer, on
+// the default EGL display, that owns the GPU mirrors of every GraphicBuffer.
+// Any thread may borrow it for a moment (run()), so buffers can be
+// synchronised from threads that have no context of their own.
 #ifndef KIV_HOST_GRAPHICS_HOSTGL_H
 #define KIV_HOST_GRAPHICS_HOSTGL_H
-
-#include <stdint.h>
 
 #include <atomic>
 #include <functional>
 #include <mutex>
 
 #include <EGL/egl.h>
-#include <EGL/eglext.h>
 #include <GLES2/gl2.h>
-#include <GLES2/gl2ext.h>
 
 namespace android {
-
-class SharedPixels;
 
 class HostGl {
 public:
@@ -49,26 +43,9 @@ public:
     EGLDisplay display() const { return mDisplay; }
     EGLContext context() const { return mContext; }
 
-    // Framebuffer of the context, for readbacks (made on first use, in run()).
+    // Framebuffer of the context, for read-backs and clears (made on first
+    // use, in run()).
     GLuint framebuffer_l();
-
-    // In run(): an RGBA texture whose storage is `pixels` itself, so the CPU
-    // and the GPU see one copy; 0 when the driver cannot take it (tried once
-    // on a small texture first, whose rows must land where the CPU expects
-    // them). `memoryObject` gets the GL object that holds the import: it
-    // must outlive every user of the texture's storage.
-    GLuint importTexture_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
-                           GLuint* memoryObject);
-    // In run(): a mirror texture's sampling (linear, clamped), bound
-    // texture left unbound.
-    static void setMirrorSampling_l(GLuint texture);
-    // In run(): deletes an imported texture, then what holds its storage.
-    static void deleteImported_l(GLuint texture, GLuint memoryObject);
-    // False once an import has proven impossible, so callers can keep plain
-    // memory instead.
-    static bool mayImport();
-    // Whether imports may be tried at all (see GraphicBuffer::allowSharedStorage).
-    static void allowImports(bool allowed);
 
     // Called (on the terminating thread, no lock held) when every other user
     // of the display this context lives on has terminated it, so that what
@@ -88,9 +65,6 @@ private:
     void fenceCurrent(EGLDisplay display);
     // With the context current: keeps the shader compiler loaded (see .cpp).
     void holdCompiler_l();
-    GLuint import_l(const SharedPixels& pixels, uint32_t width, uint32_t height,
-                    GLuint* memoryObject);
-    bool probeImport_l();
 
     std::mutex mLock;
     int mUsers;

@@ -1,9 +1,14 @@
-#include "SharedPixels.h"
+#include "host/graphics/SharedPixels.h"
 
 #include <fcntl.h>
 #include <string.h>
 #include <sys/mman.h>
 #include <unistd.h>
+
+#include <atomic>
+
+#include "core/egl/EglExtensions.h"
+#include "vccore/vc_log.h"
 
 namespace android {
 
@@ -25,7 +30,62 @@ size_t alignUp(size_t value, size_t alignment) {
     return (value + alignment - 1) / alignment * alignment;
 }
 
+// Whether textures can take shared memory as storage: unknown until the
+// first import tries, then settled for the process (one driver per process).
+enum ImportState { IMPORT_UNKNOWN, IMPORT_WORKS, IMPORT_FAILS };
+std::atomic<int> gImportState{IMPORT_UNKNOWN};
+std::atomic<bool> gImportAllowed{true};
+
+// With a context current: whether it can take imported memory as texture storage.
+bool memoryObjectsPresent() {
+    static const bool present = [] {
+        const EglExtensions& ext = EglExtensions::get();
+        return EglExtensions::hasGl("GL_EXT_memory_object_fd") &&
+               ext.glCreateMemoryObjectsEXT != nullptr && ext.glDeleteMemoryObjectsEXT != nullptr &&
+               ext.glImportMemoryFdEXT != nullptr && ext.glTexStorageMem2DEXT != nullptr;
+    }();
+    return present;
+}
+
 }  // namespace
+
+// A 5x3 texture: its rows are padded, so a wrong row pitch or row order puts
+// the one cleared texel somewhere else.
+bool SharedPixels::probe() {
+    const uint32_t w = 5, h = 3, x = 3, y = 2;
+    SharedPixels pixels;
+    GLuint memory = 0;
+    GLuint texture = pixels.allocate(w, h) ? pixels.import(&memory) : 0;
+    if (texture == 0) return false;
+    GLuint framebuffer = 0;
+    glGenFramebuffers(1, &framebuffer);
+    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer);
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, texture, 0);
+    bool ok = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+    if (ok) {
+        glEnable(GL_SCISSOR_TEST);
+        glScissor((GLint)x, (GLint)y, 1, 1);
+        glClearColor(10 / 255.0f, 20 / 255.0f, 30 / 255.0f, 40 / 255.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+        glDisable(GL_SCISSOR_TEST);
+        glFinish();
+    }
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    glDeleteFramebuffers(1, &framebuffer);
+    const size_t pitch = SharedPixels::rowPitch(w);
+    const unsigned char expected[4] = {10, 20, 30, 40};
+    for (uint32_t row = 0; ok && row < h; ++row) {
+        for (uint32_t col = 0; ok && col < w; ++col) {
+            const unsigned char* p = pixels.pixels() + row * pitch + col * 4;
+            bool lit = row == y && col == x;
+            for (int c = 0; c < 4; ++c) ok = ok && p[c] == (lit ? expected[c] : 0);
+        }
+    }
+    SharedPixels::deleteImported(texture, memory);
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    return ok;
+}
 
 size_t SharedPixels::rowPitch(uint32_t width) {
     return alignUp(alignUp(width, 4) * 4, 64);
@@ -60,6 +120,8 @@ bool SharedPixels::allocate(uint32_t width, uint32_t height) {
     mMapping = mapping;
     mFileSize = size;
     mPixels = pixels;
+    mWidth = width;
+    mHeight = height;
     return true;
 }
 
@@ -70,29 +132,62 @@ void SharedPixels::free() {
     mMapping = nullptr;
     mFileSize = 0;
     mPixels = nullptr;
+    mWidth = mHeight = 0;
 }
 
-int SharedPixels::duplicateFd() const {
-    return mFd >= 0 ? fcntl(mFd, F_DUPFD_CLOEXEC, 0) : -1;
+bool SharedPixels::mayImport() {
+    return gImportAllowed.load() && gImportState.load() != IMPORT_FAILS;
 }
 
-SharedPixels::SharedPixels(SharedPixels&& other) noexcept {
-    *this = static_cast<SharedPixels&&>(other);
+void SharedPixels::allowImports(bool allowed) {
+    gImportAllowed = allowed;
 }
 
-SharedPixels& SharedPixels::operator=(SharedPixels&& other) noexcept {
-    if (this != &other) {
-        free();
-        mFd = other.mFd;
-        mMapping = other.mMapping;
-        mFileSize = other.mFileSize;
-        mPixels = other.mPixels;
-        other.mFd = -1;
-        other.mMapping = nullptr;
-        other.mFileSize = 0;
-        other.mPixels = nullptr;
+GLuint SharedPixels::importTexture(GLuint* memoryObject) const {
+    *memoryObject = 0;
+    if (gImportState.load() == IMPORT_UNKNOWN) {
+        bool works = probe();
+        gImportState = works ? IMPORT_WORKS : IMPORT_FAILS;
+        if (!works) VF_LogMsg(VF_LOG_INFO, "HostGl: no shared texture memory; buffers are copied");
     }
-    return *this;
+    if (!mayImport()) return 0;
+    return import(memoryObject);
+}
+
+GLuint SharedPixels::import(GLuint* memoryObject) const {
+    const EglExtensions& ext = EglExtensions::get();
+    if (empty() || !memoryObjectsPresent()) return 0;
+    while (glGetError() != GL_NO_ERROR) {
+    }
+    int fd = fcntl(mFd, F_DUPFD_CLOEXEC, 0);
+    if (fd < 0) return 0;
+    GLuint memory = 0;
+    ext.glCreateMemoryObjectsEXT(1, &memory);
+    ext.glImportMemoryFdEXT(memory, mFileSize, GL_HANDLE_TYPE_OPAQUE_FD_EXT, fd);
+    if (glGetError() != GL_NO_ERROR) {
+        // A refused import leaves the descriptor with us.
+        close(fd);
+        ext.glDeleteMemoryObjectsEXT(1, &memory);
+        return 0;
+    }
+    GLuint texture = 0;
+    glGenTextures(1, &texture);
+    glBindTexture(GL_TEXTURE_2D, texture);
+    ext.glTexStorageMem2DEXT(GL_TEXTURE_2D, 1, GL_RGBA8_OES, (GLsizei)mWidth, (GLsizei)mHeight,
+                             memory, 0);
+    if (glGetError() != GL_NO_ERROR) {
+        deleteImported(texture, memory);
+        return 0;
+    }
+    *memoryObject = memory;
+    return texture;
+}
+
+void SharedPixels::deleteImported(GLuint texture, GLuint memoryObject) {
+    if (texture != 0) glDeleteTextures(1, &texture);
+    if (memoryObject != 0 && memoryObjectsPresent()) {
+        EglExtensions::get().glDeleteMemoryObjectsEXT(1, &memoryObject);
+    }
 }
 
 }  // namespace android

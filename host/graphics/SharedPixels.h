@@ -1,7 +1,7 @@
 // Pixel memory that the CPU and Mesa's software rasterizer use as one: a
 // memfd laid out as llvmpipe lays out the memory it exports (a small header,
-// then page-aligned pixels), so that GL_EXT_memory_object_fd can import it as
-// the storage of an RGBA texture. A device's gralloc gives the same thing (one
+// then page-aligned pixels), which GL_EXT_memory_object_fd imports as the
+// storage of an RGBA texture. A device's gralloc gives the same thing (one
 // allocation both sides map); without it every CPU write and every GPU
 // rendering would cost the host a full copy on its way across.
 #ifndef KIV_HOST_GRAPHICS_SHAREDPIXELS_H
@@ -9,6 +9,8 @@
 
 #include <stddef.h>
 #include <stdint.h>
+
+#include <GLES2/gl2.h>
 
 namespace android {
 
@@ -26,22 +28,38 @@ public:
     unsigned char* pixels() const { return mPixels; }
     // What the importer maps: the whole file, header included.
     size_t fileSize() const { return mFileSize; }
-    // A new descriptor for an import (GL takes ownership of it); -1 on failure.
-    int duplicateFd() const;
+    uint32_t width() const { return mWidth; }
+    uint32_t height() const { return mHeight; }
     bool empty() const { return mPixels == nullptr; }
+
+    // With a context current: an RGBA texture whose storage is this memory,
+    // left bound; 0 when the driver does not take it
+    // (tried once per process on a small texture first, whose rows must land
+    // where the CPU expects them). `memoryObject` gets the GL object that
+    // holds the import: it must outlive every user of the texture's storage.
+    GLuint importTexture(GLuint* memoryObject) const;
+    // With a context current: deletes an imported texture, then its import.
+    static void deleteImported(GLuint texture, GLuint memoryObject);
+    // False once an import has failed, or while imports are not allowed.
+    static bool mayImport();
+    // For tests of GL transfers: whether imports may be tried at all.
+    static void allowImports(bool allowed);
 
     SharedPixels() = default;
     ~SharedPixels() { free(); }
-    SharedPixels(SharedPixels&& other) noexcept;
-    SharedPixels& operator=(SharedPixels&& other) noexcept;
     SharedPixels(const SharedPixels&) = delete;
     SharedPixels& operator=(const SharedPixels&) = delete;
 
 private:
+    GLuint import(GLuint* memoryObject) const;
+    static bool probe();
+
     int mFd = -1;
     void* mMapping = nullptr;
     size_t mFileSize = 0;
     unsigned char* mPixels = nullptr;
+    uint32_t mWidth = 0;
+    uint32_t mHeight = 0;
 };
 
 }  // namespace android

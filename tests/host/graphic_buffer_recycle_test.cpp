@@ -14,11 +14,13 @@
 #include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "graphic_buffer_usage.h"
+#include "host/ui/GraphicBufferTestSeam.h"
 #include "support/gl_context.h"
 #include "support/open_files.h"
 
 using android::GraphicBuffer;
 using android::sp;
+using Seam = android::GraphicBufferTestSeam;
 
 namespace {
 
@@ -101,7 +103,7 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
     const uint8_t* p = static_cast<const uint8_t*>(pixels);
     EXPECT_EQ(std::vector<uint8_t>(p, p + w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
-    EXPECT_EQ(target->getReadbackCount(), 1u);
+    EXPECT_EQ(Seam::readbacks(target), 1u);
     ASSERT_EQ(target->unlock(), android::NO_ERROR);
 
     // The texture-only memory goes to a texture-only buffer, mirror and all.
@@ -112,7 +114,7 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     ASSERT_EQ(source->unlock(), android::NO_ERROR);
     EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
     EXPECT_EQ(gpuPixels(display(), source), cpu);
-    EXPECT_EQ(source->getUploadCount(), 0u);
+    EXPECT_EQ(Seam::uploads(source), 0u);
 
     // Written before its first GPU use, a recycled texture shows the new bytes.
     source.clear();
@@ -131,7 +133,7 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
     const void* old = useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(bytes, 0));
-    EXPECT_TRUE(target->sharesGpuStorage());
+    EXPECT_TRUE(Seam::sharesGpuStorage(target));
     void* pixels = nullptr;
     ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
     EXPECT_EQ(pixels, old);
@@ -146,7 +148,7 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
     memset(pixels, 0x33, bytes);
     ASSERT_EQ(source->unlock(), android::NO_ERROR);
     EXPECT_EQ(gpuPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
-    EXPECT_EQ(source->getUploadCount() + target->getReadbackCount(), 0u);
+    EXPECT_EQ(Seam::uploads(source) + Seam::readbacks(target), 0u);
 }
 
 TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {

@@ -14,12 +14,14 @@
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 #include "graphic_buffer_usage.h"
+#include "host/ui/GraphicBufferTestSeam.h"
 #include "support/gl_context.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_image.h"
 
 using android::GraphicBuffer;
 using android::sp;
+using Seam = android::GraphicBufferTestSeam;
 
 namespace {
 
@@ -112,7 +114,7 @@ TEST(GraphicBufferLayout, AllocationLocksAndPlanes) {
         EXPECT_EQ(ycbcr.chroma_step, (size_t)p[4]) << p[0];
         EXPECT_EQ(yuv->unlock(), android::NO_ERROR);
         // A plain CPU buffer never touches GL.
-        EXPECT_EQ(yuv->getUploadCount() + yuv->getReadbackCount(), 0u);
+        EXPECT_EQ(Seam::uploads(yuv) + Seam::readbacks(yuv), 0u);
     }
 }
 
@@ -138,17 +140,17 @@ TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
             if (x < w) expected.insert(expected.end(), px, px + 4);
         }
     }
-    EXPECT_EQ(buffer->getUploadCount(), 0u);
+    EXPECT_EQ(Seam::uploads(buffer), 0u);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getUploadCount(), 1u);
+    EXPECT_EQ(Seam::uploads(buffer), 1u);
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), expected);
 
     // A read-only lock sends nothing back up; texture-only buffers are never read back.
     lock(buffer, kRead);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getUploadCount(), 1u);
-    EXPECT_EQ(buffer->getReadbackCount(), 0u);
+    EXPECT_EQ(Seam::uploads(buffer), 1u);
+    EXPECT_EQ(Seam::readbacks(buffer), 0u);
 }
 
 // NV21 crosses as the image core's full-range conversion, both ways: through
@@ -168,7 +170,7 @@ TEST_F(GraphicBufferSyncTest, Nv21CrossesAsFullRangeRgbaBothWays) {
     for (bool shared : {true, false}) {
         for (int w : {8, 16}) {
             SCOPED_TRACE(::testing::Message() << w << " wide, shared " << shared);
-            GraphicBuffer::allowSharedStorage(shared);
+            Seam::allowSharedStorage(shared);
             sp<GraphicBuffer> buffer =
                 new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
             BufferView view(display(), buffer);
@@ -185,8 +187,8 @@ TEST_F(GraphicBufferSyncTest, Nv21CrossesAsFullRangeRgbaBothWays) {
             // The CPU copy is the original, not the (lossy) RGBA mirror.
             EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
             EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-            EXPECT_EQ(buffer->getUploadCount(), 1u);
-            EXPECT_EQ(buffer->getReadbackCount(), 0u);
+            EXPECT_EQ(Seam::uploads(buffer), 1u);
+            EXPECT_EQ(Seam::readbacks(buffer), 0u);
 
             // Rendered RGBA comes back converted to NV21.
             sp<GraphicBuffer> target =
@@ -201,11 +203,11 @@ TEST_F(GraphicBufferSyncTest, Nv21CrossesAsFullRangeRgbaBothWays) {
             EXPECT_EQ(std::vector<uint8_t>(back, back + w * h * 3 / 2),
                       converted(rendered.data(), w, h, VC_FORMAT_RGBA, VC_FORMAT_NV21));
             EXPECT_EQ(target->unlock(), android::NO_ERROR);
-            EXPECT_EQ(target->getReadbackCount(), 1u);
-            EXPECT_FALSE(target->sharesGpuStorage());
+            EXPECT_EQ(Seam::readbacks(target), 1u);
+            EXPECT_FALSE(Seam::sharesGpuStorage(target));
         }
     }
-    GraphicBuffer::allowSharedStorage(true);
+    Seam::allowSharedStorage(true);
 }
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
@@ -221,7 +223,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     ASSERT_NE(pixels, nullptr);
     expectHalves(pixels, w, h, 12 * 4);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getReadbackCount(), 1u);
+    EXPECT_EQ(Seam::readbacks(buffer), 1u);
     // The caller's context and framebuffer binding are as they were.
     EXPECT_EQ(eglGetCurrentContext(), mGl->env()->getEGLContext());
     glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
@@ -234,10 +236,10 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     // A read-write lock that changes nothing sends nothing back up; a change does.
     lock(buffer, kRead | kWrite);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getUploadCount(), 0u);
+    EXPECT_EQ(Seam::uploads(buffer), 0u);
     lock(buffer, kRead | kWrite)[0] = 99;
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getUploadCount(), 1u);
+    EXPECT_EQ(Seam::uploads(buffer), 1u);
     view.bind();
     EXPECT_EQ(GlTest_readPixels(1, 1)[0], 99);
 }
@@ -268,7 +270,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
         EXPECT_EQ(threadContext, EGL_NO_CONTEXT);  // the borrowed context was given back
     }
     // Rendered before the image went away: still read back on the next lock.
-    EXPECT_EQ(buffer->getReadbackCount(), 1u);
+    EXPECT_EQ(Seam::readbacks(buffer), 1u);
 }
 
 // 16 RGBA pixels make a row exactly as long as Mesa's texture rows: such a
@@ -285,7 +287,7 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
 
     BufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
-    EXPECT_TRUE(buffer->sharesGpuStorage());
+    EXPECT_TRUE(Seam::sharesGpuStorage(buffer));
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), pattern);  // written before the image existed
 
@@ -304,13 +306,13 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
     ASSERT_NE(pixels, nullptr);
     expectHalves(pixels, w, h, w * 4);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_EQ(buffer->getUploadCount() + buffer->getReadbackCount(), 0u);
+    EXPECT_EQ(Seam::uploads(buffer) + Seam::readbacks(buffer), 0u);
 
     // Rows padded differently (10 pixels) keep a copy on each side.
     sp<GraphicBuffer> narrow = new GraphicBuffer(10, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     BufferView narrowView(display(), narrow);
     ASSERT_TRUE(narrowView.ok());
-    EXPECT_FALSE(narrow->sharesGpuStorage());
+    EXPECT_FALSE(Seam::sharesGpuStorage(narrow));
 }
 
 // Work flushed by one thread is complete for a lock on another, even when the
@@ -320,7 +322,7 @@ TEST_F(GraphicBufferSyncTest, SharedStorageIsCompleteForALockOnAnotherThread) {
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     BufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
-    ASSERT_TRUE(buffer->sharesGpuStorage());
+    ASSERT_TRUE(Seam::sharesGpuStorage(buffer));
     view.bind();
     GlTest_fillHalves(w, h);
     glFlush();
@@ -360,7 +362,7 @@ TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDispl
     ASSERT_TRUE(view.ok());
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), std::vector<uint8_t>(w * h * 4, 77));
-    EXPECT_EQ(buffer->getUploadCount(), 0u);  // the first write predates the mirror
+    EXPECT_EQ(Seam::uploads(buffer), 0u);  // the first write predates the mirror
 }
 
 TEST(HostEglDisplayTest, TerminationEndsTheDisplayOnlyWithItsLastUser) {

@@ -5,7 +5,8 @@
 #include <atomic>
 
 #include <GLES2/gl2.h>
-#include <ui/GraphicBuffer.h>
+
+#include "host/ui/GraphicBufferTestSeam.h"
 
 namespace {
 
@@ -36,7 +37,7 @@ void GlFault_failPictureReads(int count) {
     gReadFaults = count;
     // Host buffers that share their storage with the GPU have no read-back
     // to fail: while armed, new ones copy through GL.
-    android::GraphicBuffer::allowSharedStorage(count == 0);
+    android::GraphicBufferTestSeam::allowSharedStorage(count == 0);
 }
 
 extern "C" GLuint glCreateProgram() {

@@ -1,41 +1,32 @@
 // android::GraphicBuffer on a Linux host: the subset the library uses.
 //
-// The pixels live in CPU memory (what lock()/lockYCbCr() return) in the
-// buffer's own layout. Once the GPU needs the buffer (an EGL image is made
-// over it) they are mirrored in an RGBA GL texture of the host graphics
-// context, and the two copies are kept in step at these points:
-//  - unlock() after a lock with a software-write usage sends the CPU pixels
-//    to the texture (YUV converted to RGBA with the image core's full-range
-//    equations), so CPU writes reach the GPU before its next use;
-//  - lock()/lockYCbCr() of a buffer allocated with USAGE_HW_RENDER, while an
-//    EGL image over it exists (or after the last one went away), first reads
-//    the texture back (RGBA converted to the buffer's format), so GPU
-//    rendering reaches the CPU. A lock on a thread with a current context
-//    fences that context first; any other thread relies on the renderer
-//    having flushed (glFlush, glFinish or a swap), as on a device. If the
-//    CPU leaves the read-back pixels unchanged, its unlock sends nothing up.
-// Texture-only buffers never read back: their CPU copy is the original and
-// a YUV->RGBA->YUV round trip would lose precision.
+// As on a device, the buffer is a thin record over three parts (host/ui/):
+//  - GraphicBufferAllocator: the memory (plain, or a memory file the GPU can
+//    take as is), and a pool that recycles the memory and GPU mirror of a few
+//    buffers that went away after GPU use;
+//  - GraphicBufferMapper: CPU locks, their rules and plane layout, and the
+//    two points where the CPU pixels and the GPU mirror meet;
+//  - GpuMirror: the GPU side, an RGBA texture of the host graphics context
+//    that EGL images are made from, in step with the CPU pixels by one of
+//    three strategies chosen once per buffer.
+// CPU writes reach the GPU before its next use (YUV converted to RGBA with
+// the image core's full-range equations); GPU rendering into a buffer
+// allocated with USAGE_HW_RENDER reaches the CPU at its next lock, from any
+// thread. Texture-only buffers never read back: their CPU copy is the
+// original, and a YUV->RGBA->YUV round trip would lose precision.
 //
-// Like a device allocator, the host keeps the memory and mirror of a few
-// buffers that went away after GPU use and hands them to new buffers of the
-// same layout and kind, which skip fresh pages and a new texture. A recycled
-// render target (USAGE_HW_RENDER) reads as zeros on both sides, as a new
-// buffer does; a recycled texture-only buffer holds the bytes it came with
-// (its mirror matching them) until the CPU writes it, as contents of a new
-// buffer are undefined on a device. What is kept is let go when the last
-// other user of the display terminates it.
+// A recycled render target reads as zeros on both sides, as a new buffer
+// does; a recycled texture-only buffer holds the bytes it came with (its
+// mirror matching them) until the CPU writes it, as contents of a new buffer
+// are undefined on a device. What is kept is let go when the last other user
+// of the display terminates it.
 #ifndef KIV_HOST_UI_GRAPHICBUFFER_H
 #define KIV_HOST_UI_GRAPHICBUFFER_H
 
 #include <stdint.h>
 
-#include <atomic>
-#include <functional>
 #include <memory>
-#include <mutex>
 #include <string>
-#include <vector>
 
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
@@ -47,7 +38,7 @@
 
 namespace android {
 
-class SharedPixels;
+struct BufferStorage;
 
 class GraphicBuffer : public ANativeWindowBuffer, public RefBase {
 public:
@@ -109,30 +100,19 @@ public:
     void incStrong(const void* id) const { RefBase::incStrong(id); }
     void decStrong(const void* id) const { RefBase::decStrong(id); }
 
-    // --- Host graphics (used by the host EGL seam and windows) ---
-
-    // An EGL image over the GPU mirror (created on first use), for `display`,
-    // which must be the display of the host graphics context. EGL_NO_IMAGE_KHR
-    // on failure. The image must not outlive the buffer (the EGL seam's
-    // images hold a reference on theirs): its storage may be the buffer's.
+    // For the host EGL seam: an EGL image over the GPU mirror (made on first
+    // use) for `display`, which must be the host graphics context's display;
+    // EGL_NO_IMAGE_KHR on failure. The image must not outlive the buffer (the
+    // seam's images hold a reference on theirs): its storage may be the
+    // buffer's. onEglImageDestroyed() follows the image's destruction.
     EGLImageKHR createEglImage(EGLDisplay display);
-    // Called after an image from createEglImage() was destroyed.
     void onEglImageDestroyed();
-    // Stores a width x height RGBA frame (rows bottom-up when `bottomUp`)
-    // into the buffer, converted to its format; parts outside the buffer are
-    // cut, parts the frame does not cover are left as they were. Goes through
-    // lock/unlock, so the GPU mirror follows.
+    // For the host EGL seam: stores a width x height RGBA frame (rows
+    // bottom-up when `bottomUp`) into the buffer, converted to its format;
+    // parts outside the buffer are cut, parts the frame does not cover are
+    // left as they were. Goes through lock/unlock, so the mirror follows.
     status_t writeRgbaFrame(const unsigned char* rgba, uint32_t frameWidth, uint32_t frameHeight,
                             bool bottomUp);
-    // Counters for tests: transfers between the CPU copy and the mirror.
-    uint32_t getUploadCount() const { return mUploadCount; }
-    uint32_t getReadbackCount() const { return mReadbackCount; }
-    // For tests: the CPU pixels are the GPU's storage itself (no transfers).
-    bool sharesGpuStorage();
-    // For tests of GL transfer failures: while false, buffers made (or
-    // recycled) from then on keep their GPU storage to the driver and move
-    // pixels with GL calls, as when the driver cannot share memory.
-    static void allowSharedStorage(bool allowed);
 
     GraphicBuffer(const GraphicBuffer&) = delete;
     GraphicBuffer& operator=(const GraphicBuffer&) = delete;
@@ -141,76 +121,15 @@ protected:
     ~GraphicBuffer() override;
 
 private:
-    void init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage, uint32_t inStride);
-    status_t lockCommon_l(uint32_t inUsage);
-    // Makes the mirror if there is none yet, then runs `then` in the host
-    // context (the same visit). False when either fails.
-    bool ensureMirror_l(const std::function<bool()>& then);
-    bool fillMirror_l(unsigned int texture, const unsigned char* rgba, bool fresh);
-    bool zeroMirror_l(unsigned int texture, bool fresh);
-    bool upload_l();
-    bool readback_l();
-    bool toRgba_l(unsigned char* rgba) const;
-    bool isCompactRgba_l() const;
-    // width x height RGBA staging memory (kept), or null.
-    unsigned char* rgbaScratch_l();
-    // The pixels to upload: the CPU copy itself, or RGBA converted into the
-    // staging memory; null on failure.
-    const unsigned char* rgbaForUpload_l();
-    bool fromRgba_l(const unsigned char* rgba);
-    // Clears the mirror to what an all-zero CPU copy converts to.
-    bool clearMirror_l(unsigned int texture);
-    // Whether the mirror (or the spare) is the CPU copy's own memory...
-    bool shared_l() const { return mShared != nullptr && mMemoryObject != 0; }
-    // ...or has storage of its own that the CPU can reach, so that transfers
-    // are CPU copies and conversions instead of GL calls.
-    bool mapped_l() const { return mMirrorPixels != nullptr && mMemoryObject != 0; }
-    // Copies or converts the CPU copy into the mirror's mapped storage
-    // (toMirror) or back.
-    bool transferMapped_l(bool toMirror);
+    friend class GraphicBufferTestSeam;
 
+    void init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage, uint32_t inStride);
     static void incRef(android_native_base_t* base);
     static void decRef(android_native_base_t* base);
 
     std::string mRequestorName;
     status_t mInitCheck;
-    uint32_t mFourcc;  // layout of the CPU copy (VC_FORMAT_*)
-    unsigned char* mData;
-    size_t mDataSize;
-
-    std::mutex mLock;
-    uint32_t mLockUsage;          // 0 when not locked
-    unsigned int mMirrorTexture;  // GL name in the host graphics context, 0 when none
-    // A recycled mirror that becomes mMirrorTexture on first GPU use; like
-    // the mirror, it holds a user of the host graphics context.
-    unsigned int mSpareTexture;
-    // The CPU copy reads as zeros as far as anyone can tell (nothing was
-    // written or read back since the allocation)...
-    bool mZeroContent;
-    // ...though for recycled memory the zeros are still to be written, at the
-    // first lock that does not fill the copy itself.
-    bool mZeroPending;
-    // mSpareTexture already holds the CPU copy (a recycled texture-only buffer).
-    bool mSpareMatches;
-    // Memory the driver can take as a texture's storage (RGBA buffers whose
-    // rows fall where the driver's texture rows do): mData points into it.
-    std::unique_ptr<SharedPixels> mShared;
-    // The mirror's own storage, when the driver took it but the CPU copy's
-    // layout differs (YUV, BGRA, rows padded otherwise).
-    std::unique_ptr<SharedPixels> mMirrorPixels;
-    // Holds the import of mShared or mMirrorPixels by the mirror (or the
-    // spare); 0 when the mirror's storage is the driver's own, reached by GL
-    // transfers only.
-    unsigned int mMemoryObject;
-    int mImageCount;
-    bool mGpuDirty;
-    // The CPU copy as the last readback left it, while that lock is held: an
-    // unlock that finds it unchanged has nothing to send back up.
-    std::vector<unsigned char> mReadbackCopy;
-    // RGBA staging between a CPU copy of another layout and the mirror.
-    std::unique_ptr<unsigned char[]> mRgbaScratch;
-    std::atomic<uint32_t> mUploadCount;
-    std::atomic<uint32_t> mReadbackCount;
+    std::unique_ptr<BufferStorage> mStorage;  // null unless initCheck() is NO_ERROR
 };
 
 }  // namespace android
