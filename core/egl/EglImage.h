@@ -47,9 +47,9 @@ public:
     // Uploads (2D types) or writes (GraphicBuffer types) an image, converting
     // or resizing YUV as needed.
     int setImageData(const VCImage& image, int sampleType);
-    // The pixels of a render target (type 1: a new image the caller destroys;
-    // types 2 and 3: an image over the buffer's memory, valid until the next
-    // write), or null.
+    // The pixels of a render target, or null; the caller destroys the record.
+    // Type 1: a copy read from GL. Types 2 and 3: the buffer's own memory,
+    // which stays locked for reading until the record is destroyed.
     VCImage* getImageData();
     // Makes pending GPU work on a render target land (and, for a
     // GraphicBuffer, in the CPU's view of it).
@@ -72,11 +72,16 @@ protected:
     int initialize_l() override;
 
 private:
-    int initialize2D_l();
-    int initializeGraphicBuffer_l();
-    void dropGraphicBuffer_l();
-    int writeGraphicBuffer(const VCImage& image);
-    int writeLocked(const VCImage& image, VCImage* target);
+    // What differs between the two kinds of storage: GL's own texture (types
+    // 0 and 1) or a GraphicBuffer (types 2 and 3). Stateless, one of each.
+    class Kind;
+    class TextureKind;
+    class BufferKind;
+    const Kind& kind() const;
+    // Binds the 2D texture with linear filters and the given wrap mode.
+    bool bindForUpload(int sampleType);
+    // Binds `name` (mTexture or 0) to the kind's texture target.
+    int bindTextureName(GLuint name, const char* notInitialized);
 
     IMAGE_TYPE mType;
     uint32_t mFormat;

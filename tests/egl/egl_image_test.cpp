@@ -172,9 +172,17 @@ TEST_F(EglImageTest, GraphicBufferFramebufferRendersIntoCpuVisibleMemory) {
     target->unbindFrameBuffer();
     VCImage* read = target->getImageData();
     ASSERT_NE(read, nullptr);
-    EXPECT_EQ(read->wrapped, 1);  // the buffer's own memory
+    EXPECT_EQ(read->wrapped, 1);  // the buffer's own memory...
     EXPECT_EQ(read->format, VC_FORMAT_RGBA);
+    // ...handed out under a lock that lasts as long as the record.
+    const sp<android::GraphicBuffer>& buffer = target->getGraphicBuffer();
+    void* pixels = nullptr;
+    EXPECT_EQ(buffer->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels),
+              android::INVALID_OPERATION);
     EXPECT_EQ(take(read, w * h * 4), expectedQuadrants(w, h));
+    ASSERT_EQ(buffer->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels),
+              android::NO_ERROR);
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
 
     // Rendered again: the next read sees the new frame.
     ASSERT_EQ(target->bindFrameBuffer(), 0);
