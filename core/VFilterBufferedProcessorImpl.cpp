@@ -4,6 +4,7 @@
 #include <GLES2/gl2ext.h>
 #include <string.h>
 
+#include <memory>
 #include <new>
 
 #include "core/KivBuiltInFilterCatalog.h"
@@ -37,16 +38,6 @@ const int kNoEffectId = 400;
 // Qualcomm msm8974 needs its 8K texture switch around each draw.
 bool isMsm8974() {
     return Platform::getCurrentPlatform() == Platform::PLATFORM_MSM8974;
-}
-
-void destroyImage(VCImage*& image) {
-    if (image != nullptr) VCImage_destroy(image);
-    image = nullptr;
-}
-
-// Formats whose textures are sampled as YUV (grey counts as YUV).
-bool isYuvFormat(uint32_t format) {
-    return VCImage_isYUV(format) != 0;
 }
 
 }  // namespace
@@ -191,39 +182,33 @@ int VFilterBufferedProcessorImpl::unbindGLEnvironment() {
 
 namespace {
 
-// Draws the bound program into `target` from `source` at width x height and
-// returns the target's pixels (owned by the caller, wrapping the target's
-// buffer), or null after logging.
-VCImage* drawAndReadBack(EglProgram& program, EglImage& target, EglImage& source, int width,
-                         int height) {
-    program.setCameraGeometry(width, height, 0, 0);
-    program.setPreviewGeometry(width, height, false);
-    // The target is new and nothing was drawn into it: flushCache() would only
-    // read back the zeros it was made with (a full copy on the host), so it
-    // is left out.
-    if (target.bindFrameBuffer() != 0) return nullptr;
-    program.onDrawFrame();
-    glFinish();
-    // One texel read forces the draw to complete before the buffer is read.
-    uint32_t texel = 0;
-    glReadPixels(0, 0, 1, 1, GL_RGBA, GL_UNSIGNED_BYTE, &texel);
-    EglLog(VF_LOG_DEBUG, "EGL: Synchronously waiting for rendering...");
-    target.unbindFrameBuffer();
-    source.unbindTexture();
-    VCImage* pixels = target.getImageData();
-    if (pixels == nullptr) {
-        EglLog(VF_LOG_ERROR, "EGL: Can't access this FBO's pixels");
-        VC_REPORT(VC_ERROR_UNKNOWN);
-    }
-    return pixels;
+using ImageHandle = std::unique_ptr<VCImage, void (*)(VCImage*)>;
+
+ImageHandle owned(VCImage* image) {
+    return ImageHandle(image, VCImage_destroy);
 }
 
-void releaseImage(android::sp<EglImage>& image) {
-    if (image != nullptr) {
-        image->release();
-        image.clear();
-    }
+// The caller's pixels as a record, not copied.
+ImageHandle wrapInput(const unsigned char* input, int width, int height, uint32_t format) {
+    return owned(VCImage_createWrap(const_cast<unsigned char*>(input), width, height, format,
+                                    (int)VCImage_requiredSize(width, height, format), 0));
 }
+
+// A GPU image of one call, released on the GL thread when the call ends.
+class CallImage {
+public:
+    CallImage(EglImage* image) : mImage(image) {}
+    CallImage(const CallImage&) = delete;
+    CallImage& operator=(const CallImage&) = delete;
+    ~CallImage() {
+        if (mImage != nullptr) mImage->release();
+    }
+    EglImage* operator->() const { return mImage.get(); }
+    bool operator==(std::nullptr_t) const { return mImage == nullptr; }
+
+private:
+    android::sp<EglImage> mImage;
+};
 
 }  // namespace
 
@@ -233,89 +218,11 @@ int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char* input, int 
            "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char*, int, int, "
            "unsigned char*, int)");
     if (output == nullptr || input == nullptr) return VC_ERROR_INVALID_PARAM;
-    const bool bgra = static_cast<uint32_t>(format) == VC_FORMAT_BGRA;
-
-    VCImage* wrapped = nullptr;  // the caller's pixels, never freed here
-    VCImage* rgba = nullptr;     // what is uploaded
-    VCImage* readBack = nullptr;
-    VCImage* converted = nullptr;
-    android::sp<EglImage> target;
-    android::sp<EglImage> source;
-
-    // The input is wrapped, not copied; BGRA needs one conversion to RGBA.
-    unsigned char* pixels = const_cast<unsigned char*>(input);
-    wrapped = VCImage_createEmpty(width, height, bgra ? VC_FORMAT_BGRA : VC_FORMAT_RGBA);
-    if (wrapped != nullptr) {
-        wrapped->data = pixels;
-        wrapped->wrapped = 1;
-        wrapped->size = VCImage_requiredSize(width, height, wrapped->format);
-    }
-    if (wrapped == nullptr) {
-        VC_REPORT(VC_ERROR_UNKNOWN);
-    } else if (bgra) {
-        rgba = VCImage_createNew(width, height, VC_FORMAT_RGBA);
-        if (rgba == nullptr || VCImage_convert(wrapped, rgba) != 0) {
-            destroyImage(rgba);
-            VC_REPORT(VC_ERROR_UNKNOWN);
-        }
-    } else {
-        rgba = wrapped;
-        wrapped = nullptr;
-    }
-    if (rgba == nullptr) {
-        destroyImage(wrapped);
-        unbindGLEnvironment();
-        return 0;
-    }
-
-    if (bindGLEnvironment() != 0) {
-        destroyImage(wrapped);
-        destroyImage(rgba);
-        return VC_REPORT(VC_ERROR_INVALID_STATE);
-    }
-    glClearColor(0, 0, 0, 1);
-    glClear(GL_COLOR_BUFFER_BIT);
-
-    target = new (std::nothrow)
-        EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, width, height, VC_FORMAT_RGBA);
-    if (target == nullptr) {
-        destroyImage(wrapped);
-        destroyImage(rgba);
-        unbindGLEnvironment();
-        return VC_REPORT(VC_ERROR_INVALID_STATE);
-    }
-    target->initialize();
-    source = new (std::nothrow)
-        EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL, width, height, VC_FORMAT_RGBA);
-
-    glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
-        source->setImageData(*rgba, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
-        readBack = drawAndReadBack(*mProgram, *target, *source, width, height);
-    }
-    if (readBack != nullptr) {
-        if (bgra) {
-            converted = VCImage_createNew(readBack->width, readBack->height, VC_FORMAT_BGRA);
-            if (converted == nullptr || VCImage_convert(readBack, converted) != 0) {
-                VC_REPORT(VC_ERROR_UNKNOWN);
-            } else {
-                memcpy(output, converted->data,
-                       VCImage_requiredSize(readBack->width, readBack->height, VC_FORMAT_BGRA));
-            }
-        } else {
-            memcpy(output, readBack->data,
-                   VCImage_requiredSize(readBack->width, readBack->height, VC_FORMAT_RGBA));
-        }
-    }
-
-    destroyImage(wrapped);
-    destroyImage(rgba);
-    destroyImage(readBack);
-    destroyImage(converted);
-    releaseImage(target);
-    releaseImage(source);
-    unbindGLEnvironment();
-    return 0;
+    // BGRA goes straight into the RGBA source buffer and back out of the
+    // RGBA target: one conversion each way, no copy of the picture between.
+    const uint32_t pixels =
+        static_cast<uint32_t>(format) == VC_FORMAT_BGRA ? VC_FORMAT_BGRA : VC_FORMAT_RGBA;
+    return drawThrough(*wrapInput(input, width, height, pixels), output, pixels);
 }
 
 int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int width, int height,
@@ -328,9 +235,11 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
     // YUV 4:2:0 needs even sizes: odd ones are padded by one row or column.
     const int w = width + (width & 1);
     const int h = height + (height & 1);
-    VCImage* nv21 = nullptr;
-    if (w != width || h != height) {
-        nv21 = (width > 0 && height > 0) ? VCImage_createNew(w, h, VC_FORMAT_NV21) : nullptr;
+    ImageHandle nv21 = owned(nullptr);
+    if (w == width && h == height) {
+        nv21 = wrapInput(input, width, height, VC_FORMAT_NV21);
+    } else if (width > 0 && height > 0) {
+        nv21 = owned(VCImage_createNew(w, h, VC_FORMAT_NV21));
         if (nv21 != nullptr) {
             for (int row = 0; row < height; ++row)
                 memcpy(nv21->data + static_cast<size_t>(row) * w,
@@ -340,59 +249,68 @@ int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char* input, int 
             memcpy(nv21->data + static_cast<size_t>(w) * h,
                    input + static_cast<size_t>(width) * height, static_cast<size_t>(w) * h / 2);
         }
-    } else {
-        nv21 = VCImage_createEmpty(width, height, VC_FORMAT_NV21);
-        if (nv21 != nullptr) {
-            nv21->data = const_cast<unsigned char*>(input);
-            nv21->wrapped = 1;
-            nv21->size = VCImage_requiredSize(width, height, VC_FORMAT_NV21);
-        }
     }
     if (nv21 == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    return drawThrough(*nv21, output, VC_FORMAT_RGBA);
+}
 
-    if (bindGLEnvironment() != 0) {
-        destroyImage(nv21);
-        return VC_REPORT(VC_ERROR_INVALID_STATE);
-    }
-    glClearColor(0, 0, 0, 1);
-    glClear(GL_COLOR_BUFFER_BIT);
+int VFilterBufferedProcessorImpl::drawThrough(const VCImage& input, unsigned char* output,
+                                              uint32_t outputFormat) {
+    if (bindGLEnvironment() != 0) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    // Declared first, so undone last: after the images are released.
+    struct Unbind {
+        VFilterBufferedProcessorImpl* self;
+        ~Unbind() { self->unbindGLEnvironment(); }
+    } unbind{this};
 
-    android::sp<EglImage> target = new (std::nothrow)
+    const int w = input.width, h = input.height;
+    CallImage target = new (std::nothrow)
         EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, w, h, VC_FORMAT_RGBA);
-    if (target == nullptr) {
-        unbindGLEnvironment();
-        destroyImage(nv21);
-        return VC_REPORT(VC_ERROR_INVALID_STATE);
-    }
+    if (target == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
     target->initialize();
-
-    uint32_t textureFormat = VC_FORMAT_NV21;
-    if (!Platform::isNativeInputFormat(VC_FORMAT_NV21)) {
-        textureFormat = Platform::getPreferredInputFormat(isYuvFormat(VC_FORMAT_NV21));
-        uint32_t from = VC_FORMAT_NV21;
+    // The source takes RGBA as it is, BGRA converted on its way in, and YUV
+    // in the platform's own format.
+    uint32_t textureFormat = input.format == VC_FORMAT_BGRA ? VC_FORMAT_RGBA : input.format;
+    if (VCImage_isYUV(input.format) && !Platform::isNativeInputFormat(input.format)) {
+        textureFormat = Platform::getPreferredInputFormat(true);
         EglLog(VF_LOG_ERROR,
                "Input format '%4.4s' is not a native format for EglImage: Conversion required to "
                "%4.4s",
-               reinterpret_cast<const char*>(&from), reinterpret_cast<const char*>(&textureFormat));
+               reinterpret_cast<const char*>(&input.format),
+               reinterpret_cast<const char*>(&textureFormat));
     }
-    android::sp<EglImage> source = new (std::nothrow)
+    CallImage source = new (std::nothrow)
         EglImage(mEglEnv, EglImage::IMAGE_EXTERNAL, w, h, static_cast<int>(textureFormat));
-
-    VCImage* readBack = nullptr;
     glActiveTexture(GL_TEXTURE0);
-    if (source != nullptr && source->initialize() == 0 && source->bindTexture() == 0 &&
-        source->setImageData(*nv21, GL_CLAMP_TO_EDGE) == 0 && target->bindFrameBuffer() == 0) {
-        readBack = drawAndReadBack(*mProgram, *target, *source, w, h);
+    if (source == nullptr || source->initialize() != 0 || source->bindTexture() != 0 ||
+        source->setImageData(input, GL_CLAMP_TO_EDGE) != 0 || target->bindFrameBuffer() != 0) {
+        return 0;  // logged where it failed
     }
-    if (readBack != nullptr) {
-        memcpy(output, readBack->data, VCImage_requiredSize(w, h, VC_FORMAT_RGBA));
-    }
+    // What the effect leaves undrawn is opaque black, in the target itself.
+    glClearColor(0, 0, 0, 1);
+    glClear(GL_COLOR_BUFFER_BIT);
+    mProgram->setCameraGeometry(w, h, 0, 0);
+    mProgram->setPreviewGeometry(w, h, false);
+    mProgram->onDrawFrame();
+    glFinish();
+    // One texel read forces the draw to complete before the buffer is read.
+    uint32_t texel = 0;
+    glReadPixels(0, 0, 1, 1, GL_RGBA, GL_UNSIGNED_BYTE, &texel);
+    EglLog(VF_LOG_DEBUG, "EGL: Synchronously waiting for rendering...");
+    target->unbindFrameBuffer();
+    source->unbindTexture();
 
-    destroyImage(nv21);
-    destroyImage(readBack);
-    releaseImage(target);
-    releaseImage(source);
-    unbindGLEnvironment();
+    // Straight out of the locked target into the caller's memory.
+    ImageHandle pixels = owned(target->getImageData());
+    if (pixels == nullptr) {
+        EglLog(VF_LOG_ERROR, "EGL: Can't access this FBO's pixels");
+        VC_REPORT(VC_ERROR_UNKNOWN);
+        return 0;
+    }
+    ImageHandle out = owned(VCImage_createWrap(
+        output, pixels->width, pixels->height, outputFormat,
+        (int)VCImage_requiredSize(pixels->width, pixels->height, outputFormat), 0));
+    if (VCImage_convert(pixels.get(), out.get()) != 0) VC_REPORT(VC_ERROR_UNKNOWN);
     return 0;
 }
 

@@ -16,6 +16,8 @@
 
 #include <functional>
 
+#include "vccore/vc_image.h"
+
 #include "core/VFilterBufferedProcessor.h"
 
 class EglEnvironment;
@@ -92,6 +94,11 @@ public:
     VFilterBufferedProcessorImpl& operator=(const VFilterBufferedProcessorImpl&) = delete;
 
 private:
+    // One call: binds the environment, writes `input` into a buffer-backed
+    // source texture, draws the effect into a buffer-backed target of the
+    // input's size and converts the target into `output` in `outputFormat`.
+    // Everything is released (and the environment unbound) on the way out.
+    int drawThrough(const VCImage& input, unsigned char* output, uint32_t outputFormat);
     int initializeGL();
     int releaseFromGL();
     void deleteEffect();

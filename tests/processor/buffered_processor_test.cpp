@@ -283,6 +283,29 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     EXPECT_EQ(255 - 60, out[0]);
 }
 
+// Each path clears the target itself (the pbuffer is not what is read back)
+// and binds it once to draw (once more only to build it): a draw that covers
+// nothing leaves opaque black, not the zeros of a fresh buffer.
+TEST_F(BufferedProcessorTest, UndrawnPixelsAreTheTargetsOwnOpaqueBlack) {
+    const int w = 16, h = 8;
+    const std::vector<uint8_t> rgba(w * h * 4, 200), nv21(w * h * 3 / 2, 200);
+    std::vector<uint8_t> black;
+    for (int i = 0; i < w * h; ++i) black.insert(black.end(), {0, 0, 0, 255});
+    ASSERT_EQ(0, mProcessor->setEffect(400));
+    for (int path = 0; path < 3; ++path) {
+        std::vector<uint8_t> out(w * h * 4, 0x5A);
+        GlFault_resetBinds();
+        GlFault_skipDraws(1);
+        int result = path == 2 ? mProcessor->doProcessNV21(nv21.data(), w, h, out.data())
+                               : mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(),
+                                                           path ? VC_FORMAT_BGRA : VC_FORMAT_RGBA);
+        GlFault_skipDraws(0);
+        ASSERT_EQ(0, result) << path;
+        EXPECT_EQ(black, out) << path;
+        EXPECT_EQ(2, GlFault_bindsOfDrawingContext()) << path;
+    }
+}
+
 TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     const int w = 16, h = 12;
     std::vector<uint8_t> rgba = lookref::makeTestPicture(w, h, false);

@@ -49,5 +49,20 @@ TEST(BufferedProcessorMsm8974, EightKTexturesAroundEachDraw) {
     EXPECT_LT(wait, disable);
     EXPECT_LT(disable, lines.size());
     EXPECT_EQ(215, out[0]);  // the negative look still ran
+
+    // The switch is let go only where it was switched on: also by a call that
+    // fails after binding (a picture no buffer can hold), never by one that
+    // is refused before it (odd NV21 that cannot be padded).
+    auto switches = [&](const char* prefix) {
+        return log.countPrefix(std::string("EGL: ") + prefix + " GL_ENABLE_8K_TEXTURES");
+    };
+    for (int call = 0; call < 2; ++call) {
+        log.clear();
+        int result = call == 0 ? p.doProcessRGBA(in.data(), 0, 0, out.data(), VC_FORMAT_BGRA)
+                               : p.doProcessNV21(in.data(), -3, 5, out.data());
+        EXPECT_EQ(call == 0 ? 0 : -7, result);
+        EXPECT_EQ(switches("Enable"), switches("Disable")) << call;
+        EXPECT_EQ(call == 0 ? 1u : 0u, switches("Disable")) << call;
+    }
     p.release();
 }

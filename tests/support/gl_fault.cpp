@@ -3,7 +3,11 @@
 #include <dlfcn.h>
 
 #include <atomic>
+#include <mutex>
+#include <utility>
+#include <vector>
 
+#include <EGL/egl.h>
 #include <GLES2/gl2.h>
 
 #include "host/ui/GraphicBufferTestSeam.h"
@@ -12,6 +16,11 @@ namespace {
 
 std::atomic<int> gProgramFaults{0};
 std::atomic<int> gReadFaults{0};
+std::atomic<int> gDrawFaults{0};
+
+std::mutex gBindsLock;
+std::vector<std::pair<EGLContext, GLuint>> gBinds;
+EGLContext gDrawingContext = EGL_NO_CONTEXT;
 
 // Takes one armed fault, if any is left.
 bool takeFault(std::atomic<int>& faults) {
@@ -40,6 +49,23 @@ void GlFault_failPictureReads(int count) {
     android::GraphicBufferTestSeam::allowSharedStorage(count == 0);
 }
 
+void GlFault_skipDraws(int count) {
+    gDrawFaults = count;
+}
+
+void GlFault_resetBinds() {
+    std::lock_guard<std::mutex> guard(gBindsLock);
+    gBinds.clear();
+    gDrawingContext = EGL_NO_CONTEXT;
+}
+
+int GlFault_bindsOfDrawingContext() {
+    std::lock_guard<std::mutex> guard(gBindsLock);
+    int n = 0;
+    for (const auto& bind : gBinds) n += bind.first == gDrawingContext && bind.second != 0;
+    return n;
+}
+
 extern "C" GLuint glCreateProgram() {
     static const auto next = driver<GLuint (*)()>("glCreateProgram");
     if (takeFault(gProgramFaults)) return 0;
@@ -52,4 +78,22 @@ extern "C" void glReadPixels(GLint x, GLint y, GLsizei width, GLsizei height, GL
         driver<void (*)(GLint, GLint, GLsizei, GLsizei, GLenum, GLenum, void*)>("glReadPixels");
     if ((long)width * height > 1 && takeFault(gReadFaults)) width = -1;
     next(x, y, width, height, format, type, pixels);
+}
+
+extern "C" void glDrawArrays(GLenum mode, GLint first, GLsizei count) {
+    static const auto next = driver<void (*)(GLenum, GLint, GLsizei)>("glDrawArrays");
+    {
+        std::lock_guard<std::mutex> guard(gBindsLock);
+        gDrawingContext = eglGetCurrentContext();
+    }
+    if (!takeFault(gDrawFaults)) next(mode, first, count);
+}
+
+extern "C" void glBindFramebuffer(GLenum target, GLuint framebuffer) {
+    static const auto next = driver<void (*)(GLenum, GLuint)>("glBindFramebuffer");
+    {
+        std::lock_guard<std::mutex> guard(gBindsLock);
+        gBinds.emplace_back(eglGetCurrentContext(), framebuffer);
+    }
+    next(target, framebuffer);
 }
