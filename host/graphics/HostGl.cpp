@@ -94,18 +94,10 @@ void HostGl::destroy_l() {
     // Our own eglTerminate below must not look like another user leaving.
     mHeldDisplay = EGL_NO_DISPLAY;
     if (mFramebuffer != 0 && mContext != EGL_NO_CONTEXT) {
-        EGLDisplay display = eglGetCurrentDisplay();
-        EGLContext context = eglGetCurrentContext();
-        EGLSurface draw = eglGetCurrentSurface(EGL_DRAW);
-        EGLSurface read = eglGetCurrentSurface(EGL_READ);
-        if (eglMakeCurrent(mDisplay, mSurface, mSurface, mContext)) {
+        visit_l([this] {
             glDeleteFramebuffers(1, &mFramebuffer);
-            if (context != EGL_NO_CONTEXT) {
-                eglMakeCurrent(display, draw, read, context);
-            } else {
-                eglMakeCurrent(mDisplay, EGL_NO_SURFACE, EGL_NO_SURFACE, EGL_NO_CONTEXT);
-            }
-        }
+            return true;
+        });
     }
     mFramebuffer = 0;
     mCompilerResident = false;
@@ -135,7 +127,13 @@ void HostGl::fenceCurrent(EGLDisplay display) {
 bool HostGl::run(const std::function<bool()>& work) {
     std::lock_guard<std::mutex> guard(mLock);
     if (mUsers == 0) return false;
+    return visit_l([&] {
+        if (!mCompilerResident) holdCompiler_l();
+        return work();
+    });
+}
 
+bool HostGl::visit_l(const std::function<bool()>& work) {
     EGLDisplay display = eglGetCurrentDisplay();
     EGLContext context = eglGetCurrentContext();
     EGLSurface draw = eglGetCurrentSurface(EGL_DRAW);
@@ -152,7 +150,6 @@ bool HostGl::run(const std::function<bool()>& work) {
     }
     while (glGetError() != GL_NO_ERROR) {
     }
-    if (!mCompilerResident) holdCompiler_l();
     bool ok = work();
     // Uploads must land before the caller's context samples them.
     fenceCurrent(mDisplay);

@@ -63,6 +63,8 @@ private:
     bool create_l();
     void destroy_l();
     void fenceCurrent(EGLDisplay display);
+    // run() without the lock or the user check.
+    bool visit_l(const std::function<bool()>& work);
     // With the context current: keeps the shader compiler loaded (see .cpp).
     void holdCompiler_l();
 

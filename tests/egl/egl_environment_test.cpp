@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
+#include "core/egl/EglExtensions.h"
 #include "core/egl/EglWindowSurface.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
@@ -135,6 +136,23 @@ TEST_F(GlContextTest, PbufferIsOneByOneBindsSwapsAndReleases) {
     EXPECT_FALSE(eglQuerySurface(display, egl, EGL_WIDTH, &w));
     EXPECT_EQ(eglGetError(), EGL_BAD_SURFACE);
     EXPECT_NE(second->bindSurface(), 0);  // the environment reference is gone
+}
+
+// Extension names are whole words of the driver's lists; entry points are
+// looked up once, for the library and the host layer alike.
+TEST_F(GlContextTest, ExtensionsAreFoundByWholeName) {
+    EGLDisplay display = mGl->env()->getEGLDisplay();
+    EXPECT_TRUE(EglExtensions::hasEgl(display, "EGL_KHR_fence_sync"));
+    EXPECT_TRUE(EglExtensions::hasGl("GL_OES_EGL_image_external"));
+    for (const char* part : {"EGL_KHR_fence", "KHR_fence_sync", "EGL_KHR_fence_syn"}) {
+        EXPECT_FALSE(EglExtensions::hasEgl(display, part)) << part;
+    }
+    EXPECT_FALSE(EglExtensions::hasGl("GL_OES_EGL_image_ext"));
+    const EglExtensions& ext = EglExtensions::get();
+    EXPECT_EQ(&ext, &EglExtensions::get());
+    EXPECT_NE(ext.eglCreateImageKHR, nullptr);
+    EXPECT_NE(ext.glEGLImageTargetTexture2DOES, nullptr);
+    EXPECT_NE(ext.eglClientWaitSyncKHR, nullptr);
 }
 
 TEST(EglSurfaceTest, FailedDestroyIsLoggedAndTheSurfaceForgotten) {

@@ -11,8 +11,6 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/HalPixelFormat.h"
-#include "core/egl/EglExtensions.h"
-#include "core/egl/EglNativeSeam.h"
 #include "graphic_buffer_usage.h"
 #include "host/ui/GraphicBufferTestSeam.h"
 #include "support/gl_context.h"
@@ -23,29 +21,6 @@ using android::sp;
 using Seam = android::GraphicBufferTestSeam;
 
 namespace {
-
-// The buffer as the GPU sees it through an EGL image (row 0 first), or empty.
-std::vector<uint8_t> gpuPixels(EGLDisplay display, const sp<GraphicBuffer>& buffer) {
-    std::vector<uint8_t> pixels;
-    EGLImageKHR image = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
-    if (image == EGL_NO_IMAGE_KHR) return pixels;
-    auto target = EglExtensions::get().glEGLImageTargetRenderbufferStorageOES;
-    GLuint renderbuffer = 0, framebuffer = 0;
-    glGenRenderbuffers(1, &renderbuffer);
-    glBindRenderbuffer(GL_RENDERBUFFER, renderbuffer);
-    target(GL_RENDERBUFFER, static_cast<GLeglImageOES>(image));
-    glGenFramebuffers(1, &framebuffer);
-    glBindFramebuffer(GL_FRAMEBUFFER, framebuffer);
-    glFramebufferRenderbuffer(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER, renderbuffer);
-    if (glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE) {
-        pixels = GlTest_readPixels(buffer->getWidth(), buffer->getHeight());
-    }
-    glBindFramebuffer(GL_FRAMEBUFFER, 0);
-    glDeleteFramebuffers(1, &framebuffer);
-    glDeleteRenderbuffers(1, &renderbuffer);
-    EglNativeSeam::get().destroyImage(display, image);
-    return pixels;
-}
 
 size_t bytesOf(int w, int h, int format) {
     return format == HAL_PIXEL_FORMAT_RGBA_8888 ? size_t(w) * h * 4 : size_t(w) * h * 3 / 2;
@@ -60,7 +35,7 @@ const void* useAndDrop(EGLDisplay display, int w, int h, int format,
     EXPECT_EQ(buffer->lock(kWrite, &pixels), android::NO_ERROR);
     memset(pixels, 0x5A, bytesOf(w, h, format));
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-    EXPECT_FALSE(gpuPixels(display, buffer).empty());
+    EXPECT_FALSE(GlTest_bufferPixels(display, buffer).empty());
     return pixels;
 }
 
@@ -91,14 +66,14 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
         ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
         std::vector<uint8_t> expected;
         for (int i = 0; i < w * h; ++i) expected.insert(expected.end(), c.zero, c.zero + 4);
-        EXPECT_EQ(gpuPixels(display(), buffer), expected) << c.format;  // ...and its mirror
+        EXPECT_EQ(GlTest_bufferPixels(display(), buffer), expected) << c.format;  // ...and its mirror
     }
     // GPU side first: a render target's first lock reads the zeroed mirror
     // back; a texture-only buffer's memory is not handed to it.
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
-    EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
+    EXPECT_EQ(GlTest_bufferPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
     void* pixels = nullptr;
     ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
     const uint8_t* p = static_cast<const uint8_t*>(pixels);
@@ -113,7 +88,7 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     std::vector<uint8_t> cpu(p, p + w * h * 4);
     ASSERT_EQ(source->unlock(), android::NO_ERROR);
     EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
-    EXPECT_EQ(gpuPixels(display(), source), cpu);
+    EXPECT_EQ(GlTest_bufferPixels(display(), source), cpu);
     EXPECT_EQ(Seam::uploads(source), 0u);
 
     // Written before its first GPU use, a recycled texture shows the new bytes.
@@ -122,7 +97,7 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     ASSERT_EQ(written->lock(kWrite, &pixels), android::NO_ERROR);
     memset(pixels, 0x33, w * h * 4);
     ASSERT_EQ(written->unlock(), android::NO_ERROR);
-    EXPECT_EQ(gpuPixels(display(), written), std::vector<uint8_t>(w * h * 4, 0x33));
+    EXPECT_EQ(GlTest_bufferPixels(display(), written), std::vector<uint8_t>(w * h * 4, 0x33));
 }
 
 // Shared storage (rows as long as the driver's) is recycled with its texture:
@@ -132,7 +107,7 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
     const size_t bytes = w * h * 4;
     const void* old = useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888);
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
-    EXPECT_EQ(gpuPixels(display(), target), std::vector<uint8_t>(bytes, 0));
+    EXPECT_EQ(GlTest_bufferPixels(display(), target), std::vector<uint8_t>(bytes, 0));
     EXPECT_TRUE(Seam::sharesGpuStorage(target));
     void* pixels = nullptr;
     ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
@@ -143,11 +118,11 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
 
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
-    EXPECT_EQ(gpuPixels(display(), source), std::vector<uint8_t>(bytes, 0x5A));
+    EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x5A));
     ASSERT_EQ(source->lock(kWrite, &pixels), android::NO_ERROR);
     memset(pixels, 0x33, bytes);
     ASSERT_EQ(source->unlock(), android::NO_ERROR);
-    EXPECT_EQ(gpuPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
+    EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
     EXPECT_EQ(Seam::uploads(source) + Seam::readbacks(target), 0u);
 }
 
@@ -171,7 +146,7 @@ TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser)
     ASSERT_TRUE(again.ok());
     display = again.env()->getEGLDisplay();
     sp<GraphicBuffer> late = new GraphicBuffer(4, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
-    EXPECT_FALSE(gpuPixels(display, late).empty());
+    EXPECT_FALSE(GlTest_bufferPixels(display, late).empty());
     again.release();
     EXPECT_NE(eglQueryString(display, EGL_VENDOR), nullptr);  // the live buffer's mirror
     late.clear();

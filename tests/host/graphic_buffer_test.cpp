@@ -10,8 +10,6 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/HalPixelFormat.h"
-#include "core/egl/EglExtensions.h"
-#include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 #include "graphic_buffer_usage.h"
 #include "host/ui/GraphicBufferTestSeam.h"
@@ -31,39 +29,6 @@ uint8_t* lock(const sp<GraphicBuffer>& buffer, uint32_t usage) {
     EXPECT_EQ(buffer->lock(usage, &address), android::NO_ERROR);
     return static_cast<uint8_t*>(address);
 }
-
-// The buffer's GPU storage as this context sees it: its EGL image bound to a
-// renderbuffer of a framebuffer, read with glReadPixels (row 0 first).
-class BufferView {
-public:
-    BufferView(EGLDisplay display, const sp<GraphicBuffer>& buffer) : mDisplay(display) {
-        mImage = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
-        if (mImage == EGL_NO_IMAGE_KHR) return;
-        auto target = EglExtensions::get().glEGLImageTargetRenderbufferStorageOES;
-        glGenRenderbuffers(1, &mRenderbuffer);
-        glBindRenderbuffer(GL_RENDERBUFFER, mRenderbuffer);
-        target(GL_RENDERBUFFER, static_cast<GLeglImageOES>(mImage));
-        glGenFramebuffers(1, &mFramebuffer);
-        bind();
-        glFramebufferRenderbuffer(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER,
-                                  mRenderbuffer);
-        mOk = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
-    }
-    ~BufferView() {
-        glBindFramebuffer(GL_FRAMEBUFFER, 0);
-        glDeleteFramebuffers(1, &mFramebuffer);
-        glDeleteRenderbuffers(1, &mRenderbuffer);
-        if (mImage != EGL_NO_IMAGE_KHR) EglNativeSeam::get().destroyImage(mDisplay, mImage);
-    }
-    bool ok() const { return mOk; }
-    void bind() { glBindFramebuffer(GL_FRAMEBUFFER, mFramebuffer); }
-
-private:
-    EGLDisplay mDisplay;
-    EGLImageKHR mImage = EGL_NO_IMAGE_KHR;
-    GLuint mRenderbuffer = 0, mFramebuffer = 0;
-    bool mOk = false;
-};
 
 // After GlTest_fillHalves: memory rows 0..h/2-1 red, the rest blue.
 void expectHalves(const uint8_t* pixels, int w, int h, size_t pitch) {
@@ -123,11 +88,22 @@ protected:
     EGLDisplay display() { return mGl->env()->getEGLDisplay(); }
 };
 
+// The image core's conversion of a compact picture.
+std::vector<uint8_t> converted(const uint8_t* pixels, int w, int h, uint32_t from, uint32_t to) {
+    VCImage* source = VCImage_createWrap(const_cast<uint8_t*>(pixels), w, h, from, 0, 0);
+    VCImage* target = VCImage_createNew(w, h, to);
+    EXPECT_EQ(VCImage_convert(source, target), 0);
+    std::vector<uint8_t> out(target->data, target->data + VCImage_size(target));
+    VCImage_destroy(target);
+    VCImage_destroy(source);
+    return out;
+}
+
 TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
     const int w = 6, h = 4;
     sp<GraphicBuffer> buffer =
         new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage, 8u, "t");
-    BufferView view(display(), buffer);
+    GlBufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
 
     uint8_t* rows = lock(buffer, kWrite);
@@ -153,68 +129,131 @@ TEST_F(GraphicBufferSyncTest, CpuWritesReachTheGpuWithRowsAndStrideKept) {
     EXPECT_EQ(Seam::readbacks(buffer), 0u);
 }
 
-// NV21 crosses as the image core's full-range conversion, both ways: through
-// GPU storage the CPU reaches (rows packed at 16 pixels, padded at 8) and
-// through GL transfers (when the driver cannot share memory).
-TEST_F(GraphicBufferSyncTest, Nv21CrossesAsFullRangeRgbaBothWays) {
-    auto converted = [](const uint8_t* pixels, int w, int h, uint32_t from, uint32_t to) {
-        VCImage* source = VCImage_createWrap(const_cast<uint8_t*>(pixels), w, h, from, 0, 0);
-        VCImage* target = VCImage_createNew(w, h, to);
-        EXPECT_EQ(VCImage_convert(source, target), 0);
-        std::vector<uint8_t> out(target->data, target->data + VCImage_size(target));
-        VCImage_destroy(target);
-        VCImage_destroy(source);
-        return out;
-    };
-    const int h = 4;
-    for (bool shared : {true, false}) {
-        for (int w : {8, 16}) {
-            SCOPED_TRACE(::testing::Message() << w << " wide, shared " << shared);
-            Seam::allowSharedStorage(shared);
-            sp<GraphicBuffer> buffer =
-                new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kTextureUsage);
-            BufferView view(display(), buffer);
-            ASSERT_TRUE(view.ok());
-            uint8_t* nv21 = lock(buffer, kWrite);
-            ASSERT_NE(nv21, nullptr);
-            for (int i = 0; i < w * h; ++i) nv21[i] = (uint8_t)(16 + i * 7);
-            for (int i = 0; i < w * h / 2; ++i)
-                nv21[w * h + i] = (uint8_t)(i % 2 ? 40 + i * 9 : 230 - i * 11);
-            ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
-            view.bind();
-            EXPECT_EQ(GlTest_readPixels(w, h),
-                      converted(nv21, w, h, VC_FORMAT_NV21, VC_FORMAT_RGBA));
-            // The CPU copy is the original, not the (lossy) RGBA mirror.
-            EXPECT_EQ(lock(buffer, kRead)[5], 16 + 5 * 7);
-            EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
-            EXPECT_EQ(Seam::uploads(buffer), 1u);
-            EXPECT_EQ(Seam::readbacks(buffer), 0u);
+// Every 4:2:0 layout crosses as the image core's full-range conversion, both
+// ways and whatever its row padding: through GPU storage the CPU reaches
+// (rows packed at 16 pixels, padded at 8) and through GL transfers (when the
+// driver cannot share memory). Planes are written and read through
+// lockYCbCr; the compact reference is laid out here.
+struct YuvCase {
+    int format;
+    uint32_t fourcc;
+    int width;
+    int stride;
+    bool shared;
+};
 
-            // Rendered RGBA comes back converted to NV21.
-            sp<GraphicBuffer> target =
-                new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_YCrCb_420_SP, kRenderUsage);
-            BufferView targetView(display(), target);
-            ASSERT_TRUE(targetView.ok());
-            targetView.bind();
-            GlTest_fillHalves(w, h);
-            std::vector<uint8_t> rendered = GlTest_readPixels(w, h);
-            const uint8_t* back = lock(target, kRead);
-            ASSERT_NE(back, nullptr);
-            EXPECT_EQ(std::vector<uint8_t>(back, back + w * h * 3 / 2),
-                      converted(rendered.data(), w, h, VC_FORMAT_RGBA, VC_FORMAT_NV21));
-            EXPECT_EQ(target->unlock(), android::NO_ERROR);
-            EXPECT_EQ(Seam::readbacks(target), 1u);
-            EXPECT_FALSE(Seam::sharesGpuStorage(target));
+std::ostream& operator<<(std::ostream& out, const YuvCase& c) {
+    return out << std::string((const char*)&c.fourcc, 4) << " " << c.width << " stride " << c.stride
+               << (c.shared ? " shared" : " GL transfers");
+}
+
+class GraphicBufferYuvTest : public GraphicBufferSyncTest,
+                             public ::testing::WithParamInterface<YuvCase> {
+protected:
+    void TearDown() override {
+        Seam::allowSharedStorage(true);
+        GraphicBufferSyncTest::TearDown();
+    }
+};
+
+// Visits every sample of the planes: luma (x, y), then chroma (cx, cy) with
+// its U and V addresses in the locked buffer and offsets in a compact picture.
+template <typename Luma, typename Chroma>
+void forPlanes(const YuvCase& c, int h, const android_ycbcr& planes, Luma luma, Chroma chroma) {
+    const int w = c.width, cw = w / 2, ch = h / 2;
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x)
+            luma(x, y, static_cast<uint8_t*>(planes.y) + y * planes.ystride + x, y * w + x);
+    for (int y = 0; y < ch; ++y) {
+        for (int x = 0; x < cw; ++x) {
+            size_t at = y * planes.cstride + x * planes.chroma_step;
+            // Compact: NV21 V,U pairs, NV12 U,V pairs, YV12 a V plane then a U plane.
+            size_t pair = w * h + (y * cw + x) * 2;
+            size_t u = c.fourcc == VC_FORMAT_NV21   ? pair + 1
+                       : c.fourcc == VC_FORMAT_NV12 ? pair
+                                                    : w * h + cw * ch + y * cw + x;
+            size_t v = c.fourcc == VC_FORMAT_NV21   ? pair
+                       : c.fourcc == VC_FORMAT_NV12 ? pair + 1
+                                                    : w * h + y * cw + x;
+            chroma(x, y, static_cast<uint8_t*>(planes.cb) + at,
+                   static_cast<uint8_t*>(planes.cr) + at, u, v);
         }
     }
-    Seam::allowSharedStorage(true);
 }
+
+TEST_P(GraphicBufferYuvTest, CrossesAsFullRangeRgbaBothWays) {
+    const YuvCase c = GetParam();
+    const int w = c.width, h = 4;
+    Seam::allowSharedStorage(c.shared);
+    sp<GraphicBuffer> buffer =
+        new GraphicBuffer(w, h, c.format, kTextureUsage, (uint32_t)c.stride, "t");
+    GlBufferView view(display(), buffer);
+    ASSERT_TRUE(view.ok());
+    android_ycbcr planes;
+    ASSERT_EQ(buffer->lockYCbCr(kWrite, &planes), android::NO_ERROR);
+    std::vector<uint8_t> compact(w * h * 3 / 2);
+    forPlanes(
+        c, h, planes,
+        [&](int x, int y, uint8_t* p, size_t at) {
+            *p = compact[at] = (uint8_t)(16 + x * 7 + y * 29);
+        },
+        [&](int x, int y, uint8_t* u, uint8_t* v, size_t uAt, size_t vAt) {
+            *u = compact[uAt] = (uint8_t)(40 + x * 50 + y * 9);
+            *v = compact[vAt] = (uint8_t)(230 - x * 45 - y * 11);
+        });
+    ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(view.pixels(), converted(compact.data(), w, h, c.fourcc, VC_FORMAT_RGBA));
+    // The CPU copy is the original, not the (lossy) RGBA mirror.
+    ASSERT_EQ(buffer->lockYCbCr(kRead, &planes), android::NO_ERROR);
+    EXPECT_EQ(*(static_cast<uint8_t*>(planes.y) + planes.ystride + 1), 16 + 7 + 29);
+    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(Seam::uploads(buffer), 1u);
+    EXPECT_EQ(Seam::readbacks(buffer), 0u);
+
+    // Rendered RGBA comes back converted, into the padded rows.
+    sp<GraphicBuffer> target =
+        new GraphicBuffer(w, h, c.format, kRenderUsage, (uint32_t)c.stride, "t");
+    GlBufferView targetView(display(), target);
+    ASSERT_TRUE(targetView.ok());
+    targetView.bind();
+    GlTest_fillHalves(w, h);
+    std::vector<uint8_t> expected =
+        converted(GlTest_readPixels(w, h).data(), w, h, VC_FORMAT_RGBA, c.fourcc);
+    ASSERT_EQ(target->lockYCbCr(kRead, &planes), android::NO_ERROR);
+    std::vector<uint8_t> back(expected.size());
+    forPlanes(
+        c, h, planes, [&](int, int, uint8_t* p, size_t at) { back[at] = *p; },
+        [&](int, int, uint8_t* u, uint8_t* v, size_t uAt, size_t vAt) {
+            back[uAt] = *u;
+            back[vAt] = *v;
+        });
+    EXPECT_EQ(target->unlock(), android::NO_ERROR);
+    EXPECT_EQ(back, expected);
+    EXPECT_EQ(Seam::readbacks(target), 1u);
+    EXPECT_FALSE(Seam::sharesGpuStorage(target));
+}
+
+std::vector<YuvCase> yuvCases() {
+    std::vector<YuvCase> cases;
+    const std::pair<int, uint32_t> formats[] = {
+        {HAL_PIXEL_FORMAT_YCrCb_420_SP, VC_FORMAT_NV21},
+        {HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP, VC_FORMAT_NV12},
+        {HAL_PIXEL_FORMAT_YV12, VC_FORMAT_YV12}};
+    for (const auto& f : formats)
+        for (int w : {8, 16})
+            for (int pad : {0, 2})
+                for (bool shared : {true, false})
+                    cases.push_back({f.first, f.second, w, w + pad, shared});
+    return cases;
+}
+
+INSTANTIATE_TEST_SUITE_P(Layouts, GraphicBufferYuvTest, ::testing::ValuesIn(yuvCases()));
 
 TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     const int w = 8, h = 6;
     sp<GraphicBuffer> buffer =
         new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage, 12u, "t");
-    BufferView view(display(), buffer);
+    GlBufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
     view.bind();
     GlTest_fillHalves(w, h);
@@ -248,7 +287,7 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesALockOnAThreadWithoutContext) {
     const int w = 10, h = 8;
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     {
-        BufferView view(display(), buffer);
+        GlBufferView view(display(), buffer);
         ASSERT_TRUE(view.ok());
         view.bind();
         GlTest_fillHalves(w, h);
@@ -285,7 +324,7 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
     memcpy(pixels, pattern.data(), pattern.size());
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
 
-    BufferView view(display(), buffer);
+    GlBufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
     EXPECT_TRUE(Seam::sharesGpuStorage(buffer));
     view.bind();
@@ -310,7 +349,7 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
 
     // Rows padded differently (10 pixels) keep a copy on each side.
     sp<GraphicBuffer> narrow = new GraphicBuffer(10, 4, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
-    BufferView narrowView(display(), narrow);
+    GlBufferView narrowView(display(), narrow);
     ASSERT_TRUE(narrowView.ok());
     EXPECT_FALSE(Seam::sharesGpuStorage(narrow));
 }
@@ -320,7 +359,7 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
 TEST_F(GraphicBufferSyncTest, SharedStorageIsCompleteForALockOnAnotherThread) {
     const int w = 2048, h = 2048;
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
-    BufferView view(display(), buffer);
+    GlBufferView view(display(), buffer);
     ASSERT_TRUE(view.ok());
     ASSERT_TRUE(Seam::sharesGpuStorage(buffer));
     view.bind();
@@ -348,7 +387,7 @@ TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDispl
     memset(lock(buffer, kWrite), 77, w * h * 4);
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
     {
-        BufferView view(display(), buffer);  // makes the mirror
+        GlBufferView view(display(), buffer);  // makes the mirror
         ASSERT_TRUE(view.ok());
     }
     // The fixture's environment ends (eglTerminate); the host context holds
@@ -358,7 +397,7 @@ TEST_F(GraphicBufferSyncTest, BufferOutlivesTheEnvironmentThatTerminatedTheDispl
     EXPECT_NE(eglQueryString(first, EGL_VENDOR), nullptr);  // still initialised
     GlContext again;
     ASSERT_TRUE(again.ok());
-    BufferView view(again.env()->getEGLDisplay(), buffer);
+    GlBufferView view(again.env()->getEGLDisplay(), buffer);
     ASSERT_TRUE(view.ok());
     view.bind();
     EXPECT_EQ(GlTest_readPixels(w, h), std::vector<uint8_t>(w * h * 4, 77));

@@ -202,6 +202,28 @@ TEST_F(PlatformTest, LockCompactsPaddedRowsWrapsOrLeavesEmpty) {
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "lockGraphicBuffer: Unsupported pixel format 0x5"));
 }
 
+// Each format the library allocates a buffer in locks back as that format;
+// the host-only layouts are never asked for.
+TEST_F(PlatformTest, LibraryFormatsLockBackAsThemselves) {
+    const uint32_t formats[] = {VC_FORMAT_RGBA, VC_FORMAT_NV21, VC_FORMAT_NV12, VC_FORMAT_YV12};
+    const int codes[] = {HAL_PIXEL_FORMAT_RGBA_8888, HAL_PIXEL_FORMAT_YCrCb_420_SP,
+                         HAL_PIXEL_FORMAT_VENDOR_YCbCr_420_SP, HAL_PIXEL_FORMAT_YV12};
+    for (int i = 0; i < 4; ++i) {
+        ASSERT_EQ(HalPixelFormat::codeOf(formats[i]), codes[i]) << i;
+        sp<GraphicBuffer> buffer = new GraphicBuffer(8, 4, codes[i], kUsage);
+        VCImage* image = Platform::lockGraphicBuffer(buffer, Platform::LOCK_WRAP, 0);
+        ASSERT_NE(image, nullptr) << i;
+        EXPECT_EQ(image->format, formats[i]) << i;
+        VCImage_destroy(image);
+        EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    }
+    EXPECT_EQ(HalPixelFormat::fourccOf(HAL_PIXEL_FORMAT_VENDOR_YCrCb_420_SP, true), VC_FORMAT_NV21);
+    for (uint32_t other : {VC_FORMAT_BGRA, VC_FORMAT_GREY})
+        EXPECT_EQ(HalPixelFormat::codeOf(other), 0);
+    EXPECT_EQ(HalPixelFormat::fourccOf(HAL_PIXEL_FORMAT_BGRA_8888, true), 0u);
+    EXPECT_EQ(HalPixelFormat::fourccOf(HAL_PIXEL_FORMAT_BGRA_8888, false), VC_FORMAT_BGRA);
+}
+
 TEST_F(PlatformTest, LockOfYuvBuffers) {
     // Implementation-defined buffers take the format argument.
     sp<GraphicBuffer> opaque =

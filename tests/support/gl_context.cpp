@@ -2,9 +2,11 @@
 
 #include <stdlib.h>
 #include <string.h>
+#include <ui/GraphicBuffer.h>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglExtensions.h"
+#include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 
 GlContext::GlContext() {
@@ -129,6 +131,42 @@ int GlTest_liveObjects(int range) {
              glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
     }
     return n;
+}
+
+GlBufferView::GlBufferView(EGLDisplay display, const android::sp<android::GraphicBuffer>& buffer)
+    : mDisplay(display), mWidth((int)buffer->getWidth()), mHeight((int)buffer->getHeight()) {
+    mImage = EglNativeSeam::get().createNativeBufferImage(display, buffer.get());
+    if (mImage == EGL_NO_IMAGE_KHR) return;
+    glGenRenderbuffers(1, &mRenderbuffer);
+    glBindRenderbuffer(GL_RENDERBUFFER, mRenderbuffer);
+    EglExtensions::get().glEGLImageTargetRenderbufferStorageOES(GL_RENDERBUFFER,
+                                                                static_cast<GLeglImageOES>(mImage));
+    glGenFramebuffers(1, &mFramebuffer);
+    bind();
+    glFramebufferRenderbuffer(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER, mRenderbuffer);
+    mOk = glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+}
+
+GlBufferView::~GlBufferView() {
+    glBindFramebuffer(GL_FRAMEBUFFER, 0);
+    glDeleteFramebuffers(1, &mFramebuffer);
+    glDeleteRenderbuffers(1, &mRenderbuffer);
+    if (mImage != EGL_NO_IMAGE_KHR) EglNativeSeam::get().destroyImage(mDisplay, mImage);
+}
+
+void GlBufferView::bind() {
+    glBindFramebuffer(GL_FRAMEBUFFER, mFramebuffer);
+}
+
+std::vector<uint8_t> GlBufferView::pixels() {
+    if (!mOk) return {};
+    bind();
+    return GlTest_readPixels(mWidth, mHeight);
+}
+
+std::vector<uint8_t> GlTest_bufferPixels(EGLDisplay display,
+                                         const android::sp<android::GraphicBuffer>& buffer) {
+    return GlBufferView(display, buffer).pixels();
 }
 
 void GlContextTest::SetUp() {

@@ -16,6 +16,9 @@
 
 class EglEnvironment;
 class EglWindowSurface;
+namespace android {
+class GraphicBuffer;
+}
 
 // Current on the constructing thread from construction until release().
 class GlContext {
@@ -68,6 +71,30 @@ std::vector<uint8_t> GlTest_readPixels(int width, int height);
 // Live GL objects (textures, framebuffers, renderbuffers, programs, shaders,
 // buffers) among the first `range` names of each kind, in the current context.
 int GlTest_liveObjects(int range);
+
+// A GraphicBuffer as the current context sees it: its EGL image (made through
+// the EGL seam) as the renderbuffer of a framebuffer, bound by bind().
+class GlBufferView {
+public:
+    GlBufferView(EGLDisplay display, const android::sp<android::GraphicBuffer>& buffer);
+    ~GlBufferView();
+    bool ok() const { return mOk; }
+    void bind();
+    // The whole buffer, row 0 first; empty when the view could not be made.
+    std::vector<uint8_t> pixels();
+    GlBufferView(const GlBufferView&) = delete;
+    GlBufferView& operator=(const GlBufferView&) = delete;
+
+private:
+    EGLDisplay mDisplay;
+    EGLImageKHR mImage = EGL_NO_IMAGE_KHR;
+    GLuint mRenderbuffer = 0, mFramebuffer = 0;
+    int mWidth = 0, mHeight = 0;
+    bool mOk = false;
+};
+// The buffer as the GPU sees it right now (through a view made and dropped).
+std::vector<uint8_t> GlTest_bufferPixels(EGLDisplay display,
+                                         const android::sp<android::GraphicBuffer>& buffer);
 
 // Fixture: a context per test; fails the test at once when it cannot be made.
 class GlContextTest : public ::testing::Test {
