@@ -244,6 +244,11 @@ VCImage* Platform::lockGraphicBuffer(const android::sp<android::GraphicBuffer>& 
     return image;
 }
 
+void Platform::setMaximumTextureSizeForTesting(int size) {
+    sMaxTexture = size;
+    sMaxTextureComputed = true;
+}
+
 void Platform::resetForTesting() {
     sPlatformComputed = false;
     sVendorComputed = false;

@@ -69,6 +69,9 @@ public:
 
     // Forgets every cached answer, so tests can change the properties.
     static void resetForTesting();
+    // Answers size for the largest texture until the next reset, so tests
+    // can play a small GPU.
+    static void setMaximumTextureSizeForTesting(int size);
 };
 
 #endif

@@ -1,0 +1,532 @@
+// kiv-test-labels: threads
+// Snapshots on llvmpipe with real fences: pictures drawn through Sepia (or a
+// two-camera mix) and posted in the listener's format, against the CPU
+// statement of the look (tests/support/look_reference) within its tolerance.
+#include "core/egl/EglSnapShot.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "core/egl/AsyncImageConverter.h"
+#include "core/egl/EglSnapShotLite.h"
+#include "core/egl/Platform.h"
+#include "core/filters/sce/fixedLooks.h"
+#include "core/filters/sce/singleCameraEffects.h"
+#include "support/frame_collector.h"
+#include "support/gl_context.h"
+#include "support/gl_fault.h"
+#include "support/log_capture.h"
+#include "support/look_reference.h"
+#include "support/open_files.h"
+#include "support/vc_image_handle.h"
+#include "vccore/vc_convert.h"
+#include "vccore/vc_log.h"
+
+using android::sp;
+
+namespace {
+
+const int kSepia = 401;
+// Far beyond what a small capture needs, even on a loaded machine.
+const EGLTimeKHR kPatient = 20000000000ULL;
+
+// Half of each camera's picture: the two-camera look of these tests.
+class MixEffect : public SingleCameraEffects {
+public:
+    int getFilterType() const override { return 391; }
+    const char* getFragmentShader() const override {
+        return "vec4 doEffect2() { return mix(texture2D(texSampler, v_texcoord), "
+               "texture2D(texSampler2, v_texcoord), 0.5); }";
+    }
+};
+
+// The program, an effect and a converter, on the test's context.
+struct Rig {
+    Rig(int cameraMode, bool asyncConverter) {
+        program = new EglProgram();
+        program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+        program->setFilter(cameraMode == 20 ? static_cast<KivFilter*>(&mix) : &sepia);
+        ok = program->initialize(cameraMode, false) == 0;
+        converter = asyncConverter ? sp<ImageConverter>(new AsyncImageConverter(1))
+                                   : sp<ImageConverter>(new SyncImageConverter);
+    }
+    ~Rig() {
+        program->release();
+        converter.clear();  // delivers what it accepted
+    }
+    Sepia sepia;
+    MixEffect mix;
+    sp<EglProgram> program;
+    sp<ImageConverter> converter;
+    bool ok;
+};
+
+// What the look makes of pictures, in format, and the largest difference
+// allowed per byte: the look's tolerance, and one more for chroma, whose
+// equations scale a difference of two RGB channels.
+std::vector<uint8_t> expected(const std::vector<VCImage*>& pictures, uint32_t format) {
+    std::vector<lookref::Picture> rgba;
+    for (VCImage* p : pictures) {
+        VCImageHandle copy(VCImage_copyAndConvert(p, VC_FORMAT_RGBA));
+        rgba.emplace_back(p->width, p->height, VCImageTest_bytes(*copy));
+    }
+    std::vector<uint8_t> look = rgba.size() == 1 ? lookref::render(kSepia, rgba[0], nullptr)
+                                                 : std::vector<uint8_t>(rgba[0].rgba().size());
+    if (rgba.size() == 2)
+        for (size_t i = 0; i < look.size(); ++i)
+            look[i] = static_cast<uint8_t>((rgba[0].rgba()[i] + rgba[1].rgba()[i] + 1) / 2);
+    VCImageHandle lookImage(
+        VCImage_createWrap(look.data(), rgba[0].width(), rgba[0].height(), VC_FORMAT_RGBA, 0, 0));
+    VCImageHandle out(VCImage_copyAndConvert(lookImage.get(), format));
+    return VCImageTest_bytes(*out);
+}
+
+testing::AssertionResult near(const std::vector<uint8_t>& want, const std::vector<uint8_t>& got,
+                              int tolerance) {
+    if (want.size() != got.size())
+        return testing::AssertionFailure() << got.size() << " bytes, want " << want.size();
+    for (size_t i = 0; i < want.size(); ++i)
+        if (std::abs(int(want[i]) - int(got[i])) > tolerance)
+            return testing::AssertionFailure()
+                   << "byte " << i << ": " << int(got[i]) << ", want " << int(want[i]);
+    return testing::AssertionSuccess();
+}
+
+struct Case {
+    bool async, asyncConverter;
+    uint32_t input, output;
+    int width, height, pictures;
+};
+
+class SnapshotPictures : public GlContextTest, public testing::WithParamInterface<Case> {};
+
+TEST_P(SnapshotPictures, MatchTheLookOnTheCpu) {
+    const Case c = GetParam();
+    LogCapture log;
+    Rig rig(c.pictures == 2 ? 20 : 10, c.asyncConverter);
+    ASSERT_TRUE(rig.ok);
+    FrameCollector listener(c.output);
+    std::vector<VCImageHandle> owned;
+    std::vector<VCImage*> pictures;
+    for (int i = 0; i < c.pictures; ++i) {
+        owned.push_back(VCImageTest_random(c.width, c.height, c.input, 7 + i));
+        pictures.push_back(owned.back().get());
+    }
+    VCImage* pip = c.pictures == 2 ? pictures[1] : nullptr;
+    {
+        sp<EglSnapShot> snapshot = new EglSnapShot(mGl->env(), c.width, c.height, rig.converter);
+        ASSERT_EQ(0, snapshot->initialize());
+        for (int round = 0; round < 2; ++round) {  // the second reuses the images
+            const int status = c.async ? snapshot->takePictureAsync(pictures[0], pip, rig.program,
+                                                                    listener, 100 + round, kPatient)
+                                       : snapshot->takePictureSync(pictures[0], pip, rig.program,
+                                                                   listener, 100 + round);
+            ASSERT_EQ(0, status);
+        }
+        snapshot->release();
+    }
+    rig.converter.clear();
+    const std::vector<CollectedFrame> frames = listener.frames();
+    ASSERT_EQ(2u, frames.size());
+    const int tolerance = lookref::tolerance(kSepia) + (VCImage_isYUV(c.output) ? 1 : 0);
+    const std::vector<uint8_t> want = expected(pictures, c.output);
+    for (int round = 0; round < 2; ++round) {
+        EXPECT_EQ(100 + round, frames[round].timestamp);
+        EXPECT_EQ(c.output, frames[round].format);
+        EXPECT_TRUE(near(want, frames[round].bytes, tolerance)) << "round " << round;
+        // Asynchronous captures and converters post from a worker, never the caller.
+        EXPECT_EQ(c.async || c.asyncConverter,
+                  !pthread_equal(pthread_self(), frames[round].thread));
+    }
+}
+
+const Case kCases[] = {
+    {false, false, VC_FORMAT_RGBA, VC_FORMAT_RGBA, 33, 17, 1},
+    {true, false, VC_FORMAT_RGBA, VC_FORMAT_NV21, 62, 34, 1},
+    {false, true, VC_FORMAT_NV21, VC_FORMAT_NV21, 62, 34, 1},
+    {true, true, VC_FORMAT_NV21, VC_FORMAT_RGBA, 48, 20, 1},
+    {false, false, VC_FORMAT_RGBA, VC_FORMAT_RGBA, 31, 9, 2},
+    {true, false, VC_FORMAT_NV21, VC_FORMAT_NV21, 40, 24, 2},
+};
+INSTANTIATE_TEST_SUITE_P(Captures, SnapshotPictures, testing::ValuesIn(kCases));
+
+TEST(EglSnapShot, FittingAndCroppingAroundTheLargestTexture) {
+    struct Fit {
+        int max, w, h, outW, outH;
+    };
+    const Fit fits[] = {{4096, 4000, 3000, 4000, 3000}, {2048, 4000, 3000, 2048, 1536},
+                        {2048, 3000, 4000, 1536, 2048}, {2048, 5000, 100, 2000, 40},
+                        {64, 64, 64, 64, 64},           {64, 65, 64, 63, 63}};
+    GlContext gl;
+    ASSERT_TRUE(gl.ok());
+    LogCapture log;
+    sp<ImageConverter> converter = new SyncImageConverter;
+    for (const Fit& f : fits) {
+        Platform::setMaximumTextureSizeForTesting(f.max);
+        sp<EglSnapShot> snapshot = new EglSnapShot(gl.env(), 8, 8, converter);
+        int w = 0, h = 0;
+        log.clear();
+        snapshot->fixSupportedSize(f.w, f.h, w, h);
+        EXPECT_EQ(f.outW, w) << f.w << "x" << f.h << " max " << f.max;
+        EXPECT_EQ(f.outH, h) << f.w << "x" << f.h << " max " << f.max;
+        EXPECT_EQ(f.outW != f.w || f.outH != f.h,
+                  log.contains(VF_LOG_DEBUG,
+                               "EGL: The specified dimensions are above OpenGL's capabilities! "
+                               "Cropping to " +
+                                   std::to_string(w) + "x" + std::to_string(h) + " pixels."));
+    }
+    // 100x70 on a GPU of 64: fitted to 62x44, cropped at (18, 12).
+    Platform::setMaximumTextureSizeForTesting(64);
+    sp<EglSnapShot> snapshot = new EglSnapShot(gl.env(), 100, 70, converter);
+    VCImageHandle big = VCImageTest_random(100, 70, VC_FORMAT_RGBA, 3);
+    log.clear();
+    VCImageHandle cropped(snapshot->cropImageSupportedSize(big.get()));
+    ASSERT_NE(nullptr, cropped);
+    EXPECT_TRUE(log.contains(VF_LOG_DEBUG,
+                             "The input image is too big for this framebuffer! "
+                             "100x70 > 64. Cropping input image!"));
+    ASSERT_EQ(62, cropped->width);
+    ASSERT_EQ(44, cropped->height);
+    EXPECT_EQ(0, cropped->wrapped);
+    for (int y = 0; y < 44; ++y)
+        ASSERT_EQ(0,
+                  memcmp(cropped->data + y * 62 * 4, big->data + ((12 + y) * 100 + 18) * 4, 62 * 4))
+            << y;
+    // A picture that fits is wrapped, not copied.
+    VCImageHandle small = VCImageTest_random(62, 40, VC_FORMAT_NV21, 4);
+    VCImageHandle wrapped(snapshot->cropImageSupportedSize(small.get()));
+    EXPECT_EQ(small->data, wrapped->data);
+    EXPECT_EQ(1, wrapped->wrapped);
+    EXPECT_EQ(nullptr, snapshot->cropImageSupportedSize(nullptr));
+    // A picture that cannot be cropped falls back to the whole of it.
+    VCImageHandle stream(VCImage_createWrap(big->data, 100, 70, VC_FORMAT_JPEG, 1000, 0));
+    log.clear();
+    VCImageHandle whole(snapshot->cropImageSupportedSize(stream.get()));
+    EXPECT_EQ(big->data, whole->data);
+    EXPECT_EQ(100, whole->width);
+    EXPECT_EQ(1u, log.countPrefix("Failed to crop the input image (-"));
+    Platform::resetForTesting();
+}
+
+// The fence seams: a wait that never ends in time, a wait answering nonsense,
+// a platform without fences.
+EGLint neverSignals(EGLDisplay, EGLSyncKHR, EGLint, EGLTimeKHR) {
+    return EGL_TIMEOUT_EXPIRED_KHR;
+}
+EGLint answersNonsense(EGLDisplay, EGLSyncKHR, EGLint, EGLTimeKHR) {
+    return EGL_FALSE;
+}
+EGLSyncKHR noFences(EGLDisplay, EGLenum, const EGLint*) {
+    return EGL_NO_SYNC_KHR;
+}
+
+// Every log line and status of the snapshots, one scenario a row.
+TEST(EglSnapShot, LogLinesAndStatuses) {
+    GlContext gl;
+    ASSERT_TRUE(gl.ok());
+    const std::string kNull = "VC_ERROR_NULL_PARAM (-2): core/egl/EglSnapShot:";
+    struct Row {
+        const char* name;
+        char kind;  // 's'napshot, 'l'ite
+        bool async;
+        uint32_t format;  // the listener's; 0 makes its conversion fail
+        int pictures;     // 0: none given; 2 on a two-camera program
+        EglSnapShotClientWait wait;
+        bool noFence;
+        int status, frames;
+        std::vector<std::string> lines;  // in order; a line ending in ':' is a prefix
+    };
+    const EglSnapShotClientWait real = gEglSnapShotClientWait;
+    const std::vector<Row> rows = {
+        {"no picture", 's', false, VC_FORMAT_RGBA, 0, real, false, -2, 0, {kNull}},
+        {"no second picture", 's', true, VC_FORMAT_RGBA, -1, real, false, -2, 0, {kNull}},
+        {"sync",
+         's',
+         false,
+         VC_FORMAT_NV21,
+         1,
+         real,
+         false,
+         0,
+         1,
+         {"EGL: Synchronously waiting for rendering..."}},
+        {"async",
+         's',
+         true,
+         VC_FORMAT_NV21,
+         1,
+         real,
+         false,
+         0,
+         1,
+         {"EGL: Asynchronously waiting for rendering...",
+          "EGL: Asynchronous snapshot fence waiting job created.",
+          "EGL: Waiting on snapshot fence...",
+          "EGL: Waiting finished! Now converting to NV21 on CPU..."}},
+        {"timeout",
+         's',
+         true,
+         VC_FORMAT_NV21,
+         1,
+         neverSignals,
+         false,
+         0,
+         0,
+         {"EGL: Timeout expired: 5000 nanoseconds. Picture failed."}},
+        {"odd answer",
+         'l',
+         true,
+         VC_FORMAT_RGBA,
+         1,
+         answersNonsense,
+         false,
+         0,
+         1,
+         {"EGL: eglClientWaitSyncKHR returned an invalid error code: 0. Continuing anyway.",
+          "EGL: Waiting finished! Now converting to RGBA on CPU..."}},
+        {"failed post",
+         's',
+         false,
+         0,
+         1,
+         real,
+         false,
+         -1,
+         0,
+         {"EGL: Image conversion failed", "VC_ERROR_UNKNOWN (-1): core/egl/EglSnapShot:",
+          "EGL: takePicture failed [sync] in readAndPost(): -1"}},
+        {"failed dual post",
+         's',
+         false,
+         0,
+         2,
+         real,
+         false,
+         -1,
+         0,
+         {"EGL: takePicture failed [sync] in readAndPost(): -1",
+          "takePicture failed with dual picture: -1"}},
+        {"failed async post",
+         's',
+         true,
+         0,
+         1,
+         real,
+         false,
+         0,
+         0,
+         {"EGL: Image conversion failed",
+          "VC_ERROR_UNKNOWN (-1): core/egl/EglSnapShot:", "EGL: Picture failed with error -1"}},
+        {"lite failed post",
+         'l',
+         false,
+         0,
+         1,
+         real,
+         false,
+         -1,
+         0,
+         {"EGL: Image conversion failed", "VC_ERROR_UNKNOWN (-1): core/egl/EglSnapShotLite:",
+          "EGL: EglSnapShotLite::takePicture failed [sync] in readAndPost(): -1"}},
+        // Without fences the capture ends on the render thread.
+        {"no fences",
+         's',
+         true,
+         VC_FORMAT_RGBA,
+         1,
+         real,
+         true,
+         0,
+         1,
+         {"EGL: Asynchronously waiting for rendering..."}},
+        {"lite no fences", 'l', true, VC_FORMAT_RGBA, 1, real, true, 0, 1, {}},
+        {"lite read pixels", 'r', false, VC_FORMAT_RGBA, 1, real, false, 0, 1, {}},
+        // 'R': the read-back fails in the driver.
+        {"lite read pixels fails",
+         'R',
+         false,
+         VC_FORMAT_RGBA,
+         1,
+         real,
+         false,
+         -1,
+         0,
+         {"GL Error: 0x0501 'GL_INVALID_VALUE' - glReadPixels(0, 0, snapshot->width, "
+          "snapshot->height, GL_RGBA, GL_UNSIGNED_BYTE, snapshot->data) at "
+          "core/egl/EglSnapShotLite:",
+          "VC_ERROR_UNKNOWN (-1): core/egl/EglSnapShotLite:"}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.name);
+        LogCapture log;
+        Rig rig(row.pictures == 2 || row.pictures < 0 ? 20 : 10, false);
+        ASSERT_TRUE(rig.ok);
+        FrameCollector listener(row.format);
+        VCImageHandle a = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
+        VCImageHandle b = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 2);
+        gEglSnapShotClientWait = row.wait;
+        const EglSnapShotCreateSync realCreate = gEglSnapShotCreateSync;
+        if (row.noFence) gEglSnapShotCreateSync = noFences;
+        int status;
+        if (row.kind == 's') {
+            sp<EglSnapShot> snapshot = new EglSnapShot(gl.env(), 16, 8, rig.converter);
+            ASSERT_EQ(0, snapshot->initialize());
+            VCImage* base = row.pictures != 0 ? a.get() : nullptr;
+            VCImage* pip = row.pictures == 2 ? b.get() : nullptr;
+            status = row.async
+                         ? snapshot->takePictureAsync(base, pip, rig.program, listener, 1, 5000)
+                         : snapshot->takePictureSync(base, pip, rig.program, listener, 1);
+            snapshot->release();
+        } else {
+            sp<EglSnapShotLite> lite = new EglSnapShotLite(gl.env(), 16, 8, rig.converter);
+            ASSERT_EQ(0, lite->initialize());
+            if (row.kind == 'R') GlFault_failPictureReads(1);
+            status = row.kind != 'l' ? lite->takePictureReadPixels(rig.program, listener, 1)
+                     : row.async     ? lite->takePictureAsync(rig.program, listener, 1, 5000)
+                                     : lite->takePictureSync(rig.program, listener, 1);
+            lite->release();
+        }
+        gEglSnapShotClientWait = real;
+        gEglSnapShotCreateSync = realCreate;
+        EXPECT_EQ(row.status, status);
+        EXPECT_EQ(static_cast<size_t>(row.frames), listener.frames().size());
+        for (const CollectedFrame& f : listener.frames())
+            EXPECT_EQ(row.async && !row.noFence, !pthread_equal(pthread_self(), f.thread));
+        EXPECT_EQ(row.noFence ? 0u : 0u + (row.async && row.status == 0),
+                  log.count("EGL: Asynchronous snapshot fence waiting job created."));
+        size_t at = 0;
+        const std::vector<std::string> texts = log.texts();
+        for (const std::string& line : row.lines) {
+            const bool prefix = line.back() == ':';
+            while (at < texts.size() &&
+                   (prefix ? texts[at].compare(0, line.size(), line) != 0 : texts[at] != line))
+                ++at;
+            EXPECT_LT(at, texts.size()) << "missing or out of order: " << line;
+        }
+    }
+}
+
+// A listener that holds the first frame until it is let go.
+class HoldingListener : public FrameCollector {
+public:
+    HoldingListener() : FrameCollector(VC_FORMAT_RGBA) {}
+    void onFrameProcessed(const VCImage& image, long long timestamp) override {
+        if (timestamp == 1) {
+            std::unique_lock<std::mutex> g(mLock);
+            mChanged.wait(g, [&] { return mGo; });
+        }
+        FrameCollector::onFrameProcessed(image, timestamp);
+    }
+    void go() {
+        std::lock_guard<std::mutex> g(mLock);
+        mGo = true;
+        mChanged.notify_all();
+    }
+
+private:
+    std::mutex mLock;
+    std::condition_variable mChanged;
+    bool mGo = false;
+};
+
+// A capture started while the previous one still holds the images waits for
+// them (the previous listener, run by a synchronous converter on the
+// snapshot's queue, holds them); a wait that runs out fails the capture.
+TEST_F(GlContextTest, CapturesWaitForThePreviousOne) {
+    const std::string kWaiting =
+        "In int EglSnapShot::takePictureAsync(const VCImage*, const VCImage*, const "
+        "android::sp<EglProgram>&, OnFrameListener&, nsecs_t, EGLTimeKHR), Waiting for previous "
+        "jobs to complete...";
+    LogCapture log;
+    Rig rig(10, false);
+    ASSERT_TRUE(rig.ok);
+    VCImageHandle picture = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
+    for (bool runOut : {false, true}) {
+        HoldingListener listener;
+        sp<EglSnapShot> snapshot = new EglSnapShot(mGl->env(), 16, 8, rig.converter);
+        ASSERT_EQ(0, snapshot->initialize());
+        ASSERT_EQ(0, snapshot->takePictureAsync(picture.get(), nullptr, rig.program, listener, 1,
+                                                kPatient));
+        log.clear();
+        std::thread releaser;
+        if (runOut) {
+            snapshot->setPreviousCaptureTimeout(1000000);  // the held frame outlasts it for sure
+            EXPECT_EQ(VC_ERROR_INVALID_STATE,
+                      snapshot->takePictureAsync(picture.get(), nullptr, rig.program, listener, 2,
+                                                 kPatient));
+            EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Timed out!"));
+            listener.go();
+        } else {
+            releaser = std::thread([&] {
+                while (!log.contains(kWaiting)) std::this_thread::yield();
+                listener.go();
+            });
+            EXPECT_EQ(0, snapshot->takePictureAsync(picture.get(), nullptr, rig.program, listener,
+                                                    2, kPatient));
+            releaser.join();
+        }
+        snapshot->release();
+        const std::vector<CollectedFrame> frames = listener.frames();
+        ASSERT_EQ(runOut ? 1u : 2u, frames.size());
+        for (size_t i = 0; i < frames.size(); ++i) EXPECT_EQ(long(i + 1), frames[i].timestamp);
+    }
+}
+
+// A thousand captures of each kind leave no GL object, buffer or memory
+// behind (ASan sees the memory; GL names and memory files are counted here).
+TEST_F(GlContextTest, ThousandsOfCapturesLeaveNothingBehind) {
+    LogCapture quiet;
+    Rig rig(10, true);
+    ASSERT_TRUE(rig.ok);
+    FrameCollector listener(VC_FORMAT_NV21);
+    VCImageHandle picture = VCImageTest_random(16, 8, VC_FORMAT_NV21, 1);
+    // Names are not reused at once, so what counts is how many are alive.
+    auto liveObjects = [] {
+        GLuint last = 0;
+        glGenTextures(1, &last);
+        glDeleteTextures(1, &last);
+        int n = 0;
+        for (GLuint name = 1; name < last + 8; ++name)
+            n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name);
+        return n;
+    };
+    const int live = liveObjects();
+    int files = -1;
+    const int kEach = 250;
+    for (int kind = 0; kind < 4; ++kind) {
+        sp<EglSnapShot> snapshot = new EglSnapShot(mGl->env(), 16, 8, rig.converter);
+        sp<EglSnapShotLite> lite = new EglSnapShotLite(mGl->env(), 16, 8, rig.converter);
+        ASSERT_EQ(0, snapshot->initialize());
+        ASSERT_EQ(0, lite->initialize());
+        for (int i = 0; i < kEach; ++i) {
+            // Every fourth picture changes size, so images are made anew too.
+            VCImageHandle other = VCImageTest_random(16, 8 - 2 * (i % 4 == 3), VC_FORMAT_NV21, i);
+            VCImage* p = i % 4 == 3 ? other.get() : picture.get();
+            const int status =
+                kind == 0 ? snapshot->takePictureSync(p, nullptr, rig.program, listener, i)
+                : kind == 1
+                    ? snapshot->takePictureAsync(p, nullptr, rig.program, listener, i, kPatient)
+                : kind == 2 ? lite->takePictureSync(rig.program, listener, i)
+                            : lite->takePictureAsync(rig.program, listener, i, kPatient);
+            ASSERT_EQ(0, status) << kind << " " << i;
+            // Host buffers keep a few recycled memory files: counted once warm.
+            if (kind == 0 && i == 20) files = Test_openFiles();
+        }
+        snapshot->release();
+        lite->release();
+    }
+    const bool all = listener.waitFor(4 * kEach);
+    // Captures follow each other on one buffer: never two locks at once.
+    EXPECT_EQ(0u, quiet.countPrefix("EGL: Failed to lock"));
+    ASSERT_TRUE(all) << listener.frames().size() << " frames; " << quiet.countPrefix("EGL: Timeout")
+                     << " timeouts, " << quiet.countPrefix("EGL: Picture failed") << " failures";
+    EXPECT_EQ(4u * kEach, listener.frames().size());
+    EXPECT_EQ(live, liveObjects());
+    EXPECT_EQ(files, Test_openFiles());
+}
+
+}  // namespace
