@@ -1,6 +1,7 @@
 #include "core/KivFilterFactory.h"
 
 #include "core/KivFilter.h"
+#include "core/KivFilterExternal.h"
 
 // Effect headers: one include per effect family.
 #include "core/filters/sce/colorEffects.h"
@@ -38,6 +39,8 @@ const KivFilterFactory::Entry kEffects[] = {
     {434, 434, KivFilterFactory::make<Saturate>},
     {435, 435, KivFilterFactory::make<TintControl>},
     {436, 436, KivFilterFactory::make<HighlightShadow>},
+    // A filter library named by arg ("package,library").
+    {2000, 2000, KivFilterFactory::makeWithArg<KivFilterExternal>},
 };
 
 }  // namespace

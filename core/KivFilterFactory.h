@@ -28,8 +28,8 @@ public:
     // The lookup behind create(), over any table (the first matching row wins).
     static KivFilter* createFrom(const Entry* table, size_t count, int id, void* arg);
 
-    // Row builders: plain construction, construction with the id, and with
-    // arg as the effect's name text.
+    // Row builders: plain construction, construction with the id, with arg
+    // as the effect's name text, and with arg as it is.
     template <class T>
     static KivFilter* make(int, void*) {
         return new T();
@@ -41,6 +41,10 @@ public:
     template <class T>
     static KivFilter* makeWithName(int, void* arg) {
         return new T(static_cast<const char*>(arg));
+    }
+    template <class T>
+    static KivFilter* makeWithArg(int, void* arg) {
+        return new T(arg);
     }
 };
 

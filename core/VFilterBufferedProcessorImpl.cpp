@@ -291,7 +291,12 @@ int VFilterBufferedProcessorImpl::drawThrough(const VCImage& input, unsigned cha
     glClear(GL_COLOR_BUFFER_BIT);
     mProgram->setCameraGeometry(w, h, 0, 0);
     mProgram->setPreviewGeometry(w, h, false);
-    mProgram->onDrawFrame();
+    const KivFilter* effect = mProgram->getFilter();
+    if (mProgram->onDrawFrame() != 0 && effect != nullptr && mProgram->getFilter() == nullptr) {
+        // The effect failed to draw and the program dropped it for its
+        // pass-through: one frame is all there is here, so draw that one.
+        mProgram->onDrawFrame();
+    }
     glFinish();
     // One texel read forces the draw to complete before the buffer is read.
     uint32_t texel = 0;
