@@ -1,15 +1,20 @@
 #include "effects.h"
 
 #include <cxxabi.h>
+#include <dirent.h>
 #include <stdlib.h>
 #include <strings.h>
 
+#include <algorithm>
 #include <typeinfo>
 
 #include "args.h"
 #include "core/KivBuiltInFilterCatalog.h"
+#include "core/KivFilterExternal.h"
+#include "core/KivFilterName.h"
 #include "core/KivImaging.h"
 #include "core/KivParameterOption.h"
+#include "kivplatform/device_path.h"
 
 namespace kivcli {
 namespace {
@@ -93,18 +98,51 @@ bool effectResolve(const std::string& arg, EffectChoice* choice, std::string* er
         return true;
     }
     if (arg.find(',') != std::string::npos) {
-        KivFilter* external = KivImaging_create(kDownloadableId, const_cast<char*>(arg.c_str()));
-        if (external != nullptr) {
-            KivImaging_destroy(external);
+        KivFilterExternal external(const_cast<char*>(arg.c_str()));
+        if (external.hasPlugin()) {
             choice->library = arg;
             choice->label = arg;
             return true;
         }
-        *error = "no filter library '" + arg + "' could be loaded";
+        *error = "no filter library '" + arg + "' could be loaded (-v tells why)";
         return false;
     }
     *error = "unknown effect '" + arg + "' (see 'kivimaging effects')";
     return false;
+}
+
+std::vector<PluginInfo> pluginList() {
+    std::vector<PluginInfo> list;
+    for (const char* device :
+         {KivFilterExternal::kPreloadLibraryDir, KivFilterExternal::kDownloadLibraryDir}) {
+        char folder[4096];
+        int length = KivPlatform_devicePath(device, folder, sizeof(folder));
+        if (length < 0 || length >= int(sizeof(folder))) continue;
+        DIR* dir = opendir(folder);
+        for (dirent* entry; dir != nullptr && (entry = readdir(dir)) != nullptr;) {
+            if (entry->d_name[0] == '.') continue;
+            PluginInfo info;
+            info.path = std::string(folder) + entry->d_name;
+            KivFilterName name;
+            if (KivFilterName_fromFileName(entry->d_name, &name)) {
+                info.effectName = name.package + "," + name.library;
+                KivFilterExternal effect(const_cast<char*>(info.effectName.c_str()));
+                // A library whose name leads to the other folder is not reachable.
+                info.loads = effect.hasPlugin() && effect.getLibraryPath() == info.path;
+                if (info.loads) {
+                    info.pluginName = effect.getPluginName();
+                    info.capabilities = effect.getCapabilities();
+                    info.formats = effect.getSupportedFormats();
+                }
+            }
+            list.push_back(info);
+        }
+        if (dir != nullptr) closedir(dir);
+    }
+    std::sort(list.begin(), list.end(), [](const PluginInfo& a, const PluginInfo& b) {
+        return a.effectName != b.effectName ? a.effectName < b.effectName : a.path < b.path;
+    });
+    return list;
 }
 
 }  // namespace kivcli

@@ -37,6 +37,20 @@ struct EffectChoice {
 
 bool effectResolve(const std::string& arg, EffectChoice* choice, std::string* error);
 
+// A file in one of the filter folders ("/system/cameradata/preloadfilters/
+// Lib/arm/", "/data/DownFilters/Lib/", under KIV_SYSROOT on a host).
+struct PluginInfo {
+    std::string path;        // the file
+    std::string effectName;  // "package,library", what -e takes; "" for other files
+    bool loads = false;      // that name leads to this file and its plug-in loads
+    std::string pluginName;
+    int capabilities = 0;
+    int formats = 0;
+};
+
+// Every file of both folders, each tried as a filter library, by effect name.
+std::vector<PluginInfo> pluginList();
+
 }  // namespace kivcli
 
 #endif

@@ -4,8 +4,10 @@
 
 #include "cli_log.h"
 #include "core/KivFilter.h"
+#include "core/KivFilterExternal.h"
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/Platform.h"
+#include "kivimaging/KivFilterPlugin.h"
 
 namespace kivcli {
 
@@ -53,7 +55,9 @@ bool EffectRunner::select(const EffectChoice& choice, const std::string& paramet
         *error = "no effect could be created for '" + choice.label + "'";
         return false;
     }
-    if (choice.id < 0 && effect->getFilterType() == kPassThroughId) {
+    auto* external = dynamic_cast<KivFilterExternal*>(effect);
+    if (choice.id < 0 && (effect->getFilterType() == kPassThroughId ||
+                          (external != nullptr && !external->hasPlugin()))) {
         *error = "the filter library '" + choice.library + "' could not be loaded";
         return false;
     }
@@ -63,6 +67,8 @@ bool EffectRunner::select(const EffectChoice& choice, const std::string& paramet
 
 bool EffectRunner::acceptsParameter() const {
     KivFilter* effect = mProcessor != nullptr ? mProcessor->getEffect() : nullptr;
+    // A plug-in takes the parameter string whatever its options are.
+    if (dynamic_cast<KivFilterExternal*>(effect) != nullptr) return true;
     const char* const* names = effect != nullptr ? effect->listOptionNames() : nullptr;
     for (int i = 0; names != nullptr && names[i] != nullptr; i++) {
         if (strcmp(names[i], "parameter") == 0) return true;
@@ -92,11 +98,30 @@ VCImage* EffectRunner::run(const VCImage* input, std::string* error) {
     }
     // A failed draw or read-back still returns 0 and is visible only in the log.
     int errorsBefore = cliLogErrorCount();
-    int rc = mProcessor->doProcessRGBA(input->data, input->width, input->height, output->data,
+    int rc = VC_OK;
+    auto* external = dynamic_cast<KivFilterExternal*>(mProcessor->getEffect());
+    if (external != nullptr && (external->getCapabilities() & KIV_PLUGIN_CAP_GL) == 0 &&
+        (external->getCapabilities() & KIV_PLUGIN_CAP_CPU) != 0) {
+        // A plug-in that only processes on the CPU: drawing would merely pass
+        // the picture through.
+        rc = external->setInputImage(input->data, input->width, input->height, VC_FORMAT_RGBA, 0);
+        if (rc == VC_OK) {
+            rc = external->setOutputImage(output->data, output->width, output->height,
+                                          VC_FORMAT_RGBA, 0);
+        }
+        if (rc == VC_OK) rc = external->doEffect();
+        external->setInputImage(nullptr, 0, 0, VC_FORMAT_RGBA, 0);
+        external->setOutputImage(nullptr, 0, 0, VC_FORMAT_RGBA, 0);
+    } else {
+        rc = mProcessor->doProcessRGBA(input->data, input->width, input->height, output->data,
                                        VC_FORMAT_RGBA);
+    }
     if (rc != VC_OK || cliLogErrorCount() != errorsBefore) {
         *error = std::string("the effect could not be rendered (") +
-                 (rc != VC_OK ? VCError_name(rc) : "see --verbose") + ")";
+                 (rc < 0        ? VCError_name(rc)
+                  : rc != VC_OK ? "the plug-in returned " + std::to_string(rc)
+                                : std::string("see --verbose")) +
+                 ")";
         VCImage_destroy(output);
         return nullptr;
     }
