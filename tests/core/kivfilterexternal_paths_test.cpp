@@ -55,45 +55,33 @@ F libc(const char* name) {
     return reinterpret_cast<F>(dlsym(RTLD_NEXT, name));
 }
 
-int modeOf(int flags, va_list args) {
-    return (flags & (O_CREAT | O_TMPFILE)) != 0 ? va_arg(args, int) : 0;
-}
-
 }  // namespace
 
+// Each records the path, then calls the C library's own function. The mode
+// argument exists only with O_CREAT or O_TMPFILE.
+#define KIV_MODE_ARG(flags)                                               \
+    va_list a;                                                            \
+    va_start(a, flags);                                                   \
+    int mode = (flags & (O_CREAT | O_TMPFILE)) != 0 ? va_arg(a, int) : 0; \
+    va_end(a)
+#define KIV_WATCHED_OPEN(name)                                                 \
+    int name(const char* path, int flags, ...) {                               \
+        KIV_MODE_ARG(flags);                                                   \
+        note(AT_FDCWD, path);                                                  \
+        return libc<int (*)(const char*, int, ...)>(#name)(path, flags, mode); \
+    }
+#define KIV_WATCHED_OPENAT(name)                                                           \
+    int name(int dirfd, const char* path, int flags, ...) {                                \
+        KIV_MODE_ARG(flags);                                                               \
+        note(dirfd, path);                                                                 \
+        return libc<int (*)(int, const char*, int, ...)>(#name)(dirfd, path, flags, mode); \
+    }
+
 extern "C" {
-int open(const char* path, int flags, ...) {
-    va_list a;
-    va_start(a, flags);
-    int mode = modeOf(flags, a);
-    va_end(a);
-    note(AT_FDCWD, path);
-    return libc<int (*)(const char*, int, ...)>("open")(path, flags, mode);
-}
-int open64(const char* path, int flags, ...) {
-    va_list a;
-    va_start(a, flags);
-    int mode = modeOf(flags, a);
-    va_end(a);
-    note(AT_FDCWD, path);
-    return libc<int (*)(const char*, int, ...)>("open64")(path, flags, mode);
-}
-int openat(int dirfd, const char* path, int flags, ...) {
-    va_list a;
-    va_start(a, flags);
-    int mode = modeOf(flags, a);
-    va_end(a);
-    note(dirfd, path);
-    return libc<int (*)(int, const char*, int, ...)>("openat")(dirfd, path, flags, mode);
-}
-int openat64(int dirfd, const char* path, int flags, ...) {
-    va_list a;
-    va_start(a, flags);
-    int mode = modeOf(flags, a);
-    va_end(a);
-    note(dirfd, path);
-    return libc<int (*)(int, const char*, int, ...)>("openat64")(dirfd, path, flags, mode);
-}
+KIV_WATCHED_OPEN(open)
+KIV_WATCHED_OPEN(open64)
+KIV_WATCHED_OPENAT(openat)
+KIV_WATCHED_OPENAT(openat64)
 FILE* fopen(const char* path, const char* mode) {
     note(AT_FDCWD, path);
     return libc<FILE* (*)(const char*, const char*)>("fopen")(path, mode);

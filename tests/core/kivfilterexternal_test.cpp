@@ -90,81 +90,40 @@ TEST_F(ExternalFilter, LoadOutcomesAndTheirLogLines) {
         "D|Downloadable FilterL KivFilterExternal set libraryPath to " + mRoot.preloadLib();
     const std::string loaded = "I|Downloadable Filter, mThirdPartyWrapper is loaded (Standin)";
     const std::string kiPreload = "D|KI_PRELOAD_PACKAGE_NAME = com.kiv.android.filter";
-    std::ofstream(mRoot.downloadLib() + "com.example.junk.libjunk.so") << "not a library";
+    // Each failure: the three debug lines of a valid name, then its own line.
+    auto fails = [&](const std::string& last) {
+        return std::vector<std::string>{"D|*", kiPreload, "D|*", "E|Downloadable Filter: " + last};
+    };
+    const std::string junk = mRoot.downloadLib() + "com.example.junk.libjunk.so";
     struct Case {
         std::string name;
         const char* library;  // installed as the name's file; null: nothing installed
-        bool preload;
-        bool createNull;
-        bool loads;
-        std::vector<std::string> lines;
+        bool preload, createNull;
+        std::vector<std::string> lines;  // ends in `loaded` when a plug-in loads
     } cases[] = {
-        {"com.kiv.android.filter,libstandin.so",
-         KIV_STANDIN_FULL,
-         true,
-         false,
-         true,
-         {"D|Downloadable Filter: mPkgAndFileName = com.kiv.android.filter,libstandin.so",
-          kiPreload,
-          preload + "com.kiv.android.filter.libstandin.so, mPkgName = com.kiv.android.filter",
-          loaded}},
+        // clang-format off
+        {"com.kiv.android.filter,libstandin.so", KIV_STANDIN_FULL, true, false,
+         {"D|Downloadable Filter: mPkgAndFileName = com.kiv.android.filter,libstandin.so", kiPreload,
+          preload + "com.kiv.android.filter.libstandin.so, mPkgName = com.kiv.android.filter", loaded}},
         // One of the vendor libraries the library knows: the preload folder too.
-        {"com.example.filtervendor.alpha,libriddle.so",
-         KIV_STANDIN_FULL,
-         true,
-         false,
-         true,
-         {"D|*", kiPreload,
-          preload + "com.example.filtervendor.alpha.libriddle.so, mPkgName = "
-                    "com.example.filtervendor.alpha",
-          loaded}},
-        {kStandin,
-         KIV_STANDIN_FULL,
-         false,
-         false,
-         true,
-         {"D|*", kiPreload,
-          down + "com.example.standin.libstandin.so, mPkgName = com.example.standin", loaded}},
+        {"com.example.filtervendor.alpha,libriddle.so", KIV_STANDIN_FULL, true, false,
+         {"D|*", kiPreload, preload + "com.example.filtervendor.alpha.libriddle.so, mPkgName = "
+                                      "com.example.filtervendor.alpha", loaded}},
+        {kStandin, KIV_STANDIN_FULL, false, false,
+         {"D|*", kiPreload, down + "com.example.standin.libstandin.so, mPkgName = com.example.standin", loaded}},
         // Any other package is looked for in the download folder only.
-        {"com.example.other,libstandin.so",
-         KIV_STANDIN_FULL,
-         true,
-         false,
-         false,
-         {"D|*", kiPreload, "D|*",
-          "E|Downloadable Filter: " + mRoot.downloadLib() +
-              "com.example.other.libstandin.so is not opened, No such file or directory"}},
-        {"com.example.junk,libjunk.so",
-         nullptr,
-         false,
-         false,
-         false,
-         {"D|*", kiPreload, "D|*",
-          "E|Downloadable Filter: " + mRoot.downloadLib() +
-              "com.example.junk.libjunk.so is not opened, " + mRoot.downloadLib() +
-              "com.example.junk.libjunk.so: *"}},
-        {"com.example.nocreate,libnocreate.so",
-         KIV_STANDIN_NO_CREATE,
-         false,
-         false,
-         false,
-         {"D|*", kiPreload, "D|*", "E|Downloadable Filter: libnocreate.so dlsym is fail with *"}},
-        {kStandin,
-         KIV_STANDIN_FULL,
-         false,
-         true,
-         false,
-         {"D|*", kiPreload, "D|*",
-          "E|Downloadable Filter: Create() of libstandin.so returned null"}},
-        {kStandin + ",more",
-         KIV_STANDIN_FULL,
-         false,
-         false,
-         false,
-         {"D|*",
-          "E|Downloadable Filter: refused the effect name "
-          "\"com.example.standin,libstandin.so,more\": more than one comma"}},
+        {"com.example.other,libstandin.so", KIV_STANDIN_FULL, true, false,
+         fails(mRoot.downloadLib() + "com.example.other.libstandin.so is not opened, No such file or directory")},
+        {"com.example.junk,libjunk.so", nullptr, false, false, fails(junk + " is not opened, " + junk + ": *")},
+        {"com.example.nocreate,libnocreate.so", KIV_STANDIN_NO_CREATE, false, false,
+         fails("libnocreate.so dlsym is fail with *")},
+        {kStandin, KIV_STANDIN_FULL, false, true, fails("Create() of libstandin.so returned null")},
+        {kStandin + ",more", KIV_STANDIN_FULL, false, false,
+         {"D|*", "E|Downloadable Filter: refused the effect name "
+                 "\"com.example.standin,libstandin.so,more\": more than one comma"}},
+        // clang-format on
     };
+    std::ofstream(junk) << "not a library";
     for (const Case& c : cases) {
         if (c.library != nullptr) {
             const size_t comma = c.name.find(',');
@@ -178,12 +137,13 @@ TEST_F(ExternalFilter, LoadOutcomesAndTheirLogLines) {
         auto effect = makeEffect(c.name);
         unsetenv("KIV_STANDIN_CREATE_NULL");
         expectLines(log, c.lines, c.name);
-        EXPECT_EQ(c.loads, effect->hasPlugin()) << c.name;
+        const bool loads = c.lines.back() == loaded;
+        EXPECT_EQ(loads, effect->hasPlugin()) << c.name;
         EXPECT_EQ(2000, effect->getFilterType());
         EXPECT_STREQ(c.name.c_str(), effect->getPkgAndFileName());
-        EXPECT_STREQ(c.loads ? "Standin" : "", effect->getPluginName());
-        EXPECT_EQ(c.loads ? 3 : 0, effect->getCapabilities()) << c.name;
-        EXPECT_EQ(c.loads ? 5 : 0, effect->getSupportedFormats()) << c.name;
+        EXPECT_STREQ(loads ? "Standin" : "", effect->getPluginName());
+        EXPECT_EQ(loads ? 3 : 0, effect->getCapabilities()) << c.name;
+        EXPECT_EQ(loads ? 5 : 0, effect->getSupportedFormats()) << c.name;
     }
     // No name at all.
     LogCapture log;
@@ -202,27 +162,18 @@ TEST_F(ExternalFilter, LoadOutcomesAndTheirLogLines) {
 }
 
 TEST_F(ExternalFilter, DestroyUnloadsUnlessTheLibraryCannotFreeItsObject) {
+    const std::string gone = "D|Downloadable Filter, ~KivFilterExternal() : mThirdPartyWrapper = ";
     struct Case {
         const char* library;
-        bool createNull;
-        bool stillLoaded;
+        bool createNull, stillLoaded;
         std::vector<std::string> lines;
     } cases[] = {
-        {KIV_STANDIN_FULL,
-         false,
-         false,
-         {"D|Downloadable Filter, ~KivFilterExternal() : mThirdPartyWrapper = 0x*",
-          "I|Downloadable Filter, Destroy previous filter (Standin)"}},
-        {KIV_STANDIN_FULL,
-         true,
-         false,
-         {"D|Downloadable Filter, ~KivFilterExternal() : mThirdPartyWrapper = *"}},
+        // clang-format off
+        {KIV_STANDIN_FULL, false, false, {gone + "0x*", "I|Downloadable Filter, Destroy previous filter (Standin)"}},
+        {KIV_STANDIN_FULL, true, false, {gone + "*"}},
         // Its object cannot be freed, so its code must stay.
-        {KIV_STANDIN_NO_DESTROY,
-         false,
-         true,
-         {"D|Downloadable Filter, ~KivFilterExternal() : mThirdPartyWrapper = 0x*",
-          "E|Downloadable Filter, ~KivFilterExternal loadDestroy fail!"}},
+        {KIV_STANDIN_NO_DESTROY, false, true, {gone + "0x*", "E|Downloadable Filter, ~KivFilterExternal loadDestroy fail!"}},
+        // clang-format on
     };
     int n = 0;
     for (const Case& c : cases) {
@@ -245,37 +196,24 @@ TEST_F(ExternalFilter, CpuProcessingStatusesAndFormats) {
     mRoot.install(KIV_STANDIN_FULL, "com.example.standin", "libstandin.so");
     const std::vector<uint8_t> in = picture(6, 4);
     std::vector<uint8_t> out;
+    const std::string at = " core/KivFilterExternal:*";
     struct Case {
-        const char* caps;
-        const char* formats;
+        const char *caps, *formats;
         int inFormat;   // 0: no input image
         int outHeight;  // output image height (input is 4)
-        int processResult;
-        int status;
+        int processResult, status;
         int pluginFormat;  // what process() must be told; 0: not called
         std::vector<std::string> lines;
     } cases[] = {
+        // clang-format off
         {"3", "5", VC_FORMAT_RGBA, 4, 0, 0, 1, {}},
         {"3", "5", VC_FORMAT_NV21, 4, 0, 0, 4, {}},
         {"1", "15", VC_FORMAT_NV12, 4, 0, 0, 8, {}},
         {"1", "15", VC_FORMAT_BGRA, 4, -9, -9, 2, {}},
-        {"2",
-         "5",
-         VC_FORMAT_RGBA,
-         4,
-         0,
-         -6,
-         0,
-         {"E|VC_ERROR_UNSUPPORTED (-6): core/KivFilterExternal:*"}},
-        {"3",
-         "5",
-         VC_FORMAT_RGBA,
-         3,
-         0,
-         -4,
-         0,
-         {"E|VC_ERROR_INVALID_SIZE (-4): core/KivFilterExternal:*"}},
-        {"3", "5", 0, 4, 0, -2, 0, {"E|VC_ERROR_NULL_PARAM (-2): core/KivFilterExternal:*"}},
+        {"2", "5", VC_FORMAT_RGBA, 4, 0, -6, 0, {"E|VC_ERROR_UNSUPPORTED (-6):" + at}},
+        {"3", "5", VC_FORMAT_RGBA, 3, 0, -4, 0, {"E|VC_ERROR_INVALID_SIZE (-4):" + at}},
+        {"3", "5", 0, 4, 0, -2, 0, {"E|VC_ERROR_NULL_PARAM (-2):" + at}},
+        // clang-format on
     };
     for (const Case& c : cases) {
         setenv("KIV_STANDIN_CAPS", c.caps, 1);
@@ -383,6 +321,8 @@ TEST_F(ExternalFilterGl, StandinDrawsThroughItsSlotsInOrder) {
 // Every way a plug-in can fail ends in the pass-through picture.
 TEST_F(ExternalFilterGl, FailuresEndInThePassThrough) {
     mRoot.install(KIV_STANDIN_FULL, "com.example.standin", "libstandin.so");
+    const std::string returned = "E|The filter returned ",
+                      fallback = "E|GL Error: failed to load effect shader. Loading default.";
     struct Case {
         const char* label;
         std::string name;
@@ -390,35 +330,16 @@ TEST_F(ExternalFilterGl, FailuresEndInThePassThrough) {
         int compileMode;
         std::vector<std::string> mustLog;
     } cases[] = {
-        {"missing",
-         "com.example.absent,libabsent.so",
-         nullptr,
-         0,
-         {"E|Downloadable Filter, mExtWrapper is null",
-          "E|Downloadable Filter, mThirdPartyWrapper is null",
-          "E|The filter returned 1 from onDrawFrame!"}},
-        {"create null",
-         kStandin,
-         "KIV_STANDIN_CREATE_NULL",
-         0,
-         {"E|The filter returned 1 from onDrawFrame!"}},
-        {"cpu only",
-         kStandin,
-         "KIV_STANDIN_CAPS",
-         0,
-         {"E|The filter returned -6 from onDrawFrame!"}},
-        {"no compile",
-         kStandin,
-         nullptr,
-         STANDIN_COMPILE_FAIL,
-         {"E|Downloadable Filter, compile fragment shader failed",
-          "E|GL Error: failed to load effect shader. Loading default."}},
-        {"no link",
-         kStandin,
-         nullptr,
-         STANDIN_COMPILE_NOLINK,
-         {"E|GL Error: Program failed to link.",
-          "E|GL Error: failed to load effect shader. Loading default."}},
+        // clang-format off
+        {"missing", "com.example.absent,libabsent.so", nullptr, 0,
+         {"E|Downloadable Filter, mExtWrapper is null", "E|Downloadable Filter, mThirdPartyWrapper is null",
+          returned + "1 from onDrawFrame!"}},
+        {"create null", kStandin, "KIV_STANDIN_CREATE_NULL", 0, {returned + "1 from onDrawFrame!"}},
+        {"cpu only", kStandin, "KIV_STANDIN_CAPS", 0, {returned + "-6 from onDrawFrame!"}},
+        {"no compile", kStandin, nullptr, STANDIN_COMPILE_FAIL,
+         {"E|Downloadable Filter, compile fragment shader failed", fallback}},
+        {"no link", kStandin, nullptr, STANDIN_COMPILE_NOLINK, {"E|GL Error: Program failed to link.", fallback}},
+        // clang-format on
     };
     const int w = 20, h = 12;
     const std::vector<uint8_t> in = picture(w, h);
@@ -443,26 +364,19 @@ TEST_F(ExternalFilterGl, GlInfoGeometryAndRelease) {
     mRoot.install(KIV_STANDIN_FULL, "com.example.standin", "libstandin.so");
     ASSERT_EQ(0, mProcessor->bindGLEnvironment());  // a current context
     struct Case {
-        int mode;
-        int status;
+        int mode, status;
         std::vector<std::string> lines;
         int extents[4];      // given to the program
         int infoExtents[4];  // what the plug-in is told
     } cases[] = {
         // Missing third and fourth extents: the program fills in the width
         // for both, the plug-in is told what the program holds.
+        // clang-format off
         {STANDIN_RELEASE_OK, 0, {}, {40, 30, 0, 0}, {40, 30, 40, 40}},
         {STANDIN_RELEASE_ERROR, 7, {}, {40, 30, 7, 9}, {40, 30, 7, 9}},
-        {STANDIN_RELEASE_NULL,
-         -2,
-         {"E|VC_ERROR_NULL_PARAM (-2): core/KivFilterExternal:*"},
-         {8, 6, 0, 0},
-         {8, 6, 8, 8}},
-        {STANDIN_RELEASE_NEGATIVE,
-         -3,
-         {"E|VC_ERROR_INVALID_PARAM (-3): core/KivFilterExternal:*"},
-         {8, 6, 0, 0},
-         {8, 6, 8, 8}},
+        {STANDIN_RELEASE_NULL, -2, {"E|VC_ERROR_NULL_PARAM (-2): core/KivFilterExternal:*"}, {8, 6, 0, 0}, {8, 6, 8, 8}},
+        {STANDIN_RELEASE_NEGATIVE, -3, {"E|VC_ERROR_INVALID_PARAM (-3): core/KivFilterExternal:*"}, {8, 6, 0, 0}, {8, 6, 8, 8}},
+        // clang-format on
     };
     for (const Case& c : cases) {
         auto effect = makeEffect(kStandin);

@@ -6,11 +6,12 @@
 #include <sys/wait.h>
 
 #include <fstream>
-#include <iterator>
 #include <string>
 #include <vector>
 
+#include "support/image_ptr.h"
 #include "support/plugin_sysroot.h"
+#include "support/temp_dir.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_image.h"
 
@@ -38,16 +39,12 @@ protected:
         std::string cmd = "'" KIVIMAGING_PROGRAM "' " + args + " >'" + path("stdout") + "' 2>'" +
                           path("stderr") + "' </dev/null";
         int raw = system(cmd.c_str());
-        auto read = [](const std::string& p) {
-            std::ifstream f(p, std::ios::binary);
-            return std::string(std::istreambuf_iterator<char>(f), {});
-        };
-        return {WIFEXITED(raw) ? WEXITSTATUS(raw) : 1000 + raw, read(path("stdout")),
-                read(path("stderr"))};
+        return {WIFEXITED(raw) ? WEXITSTATUS(raw) : 1000 + raw, kivtest::readText(path("stdout")),
+                kivtest::readText(path("stderr"))};
     }
-    VCImage* load(const std::string& file) {
-        VCImage* image = VCImage_createEmpty(0, 0, VC_FORMAT_RGBA);
-        EXPECT_EQ(VC_OK, VCImage_loadFromFile(image, file.c_str())) << file;
+    ImagePtr load(const std::string& file) {
+        ImagePtr image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
+        EXPECT_EQ(VC_OK, VCImage_loadFromFile(image.get(), file.c_str())) << file;
         return image;
     }
     PluginSysroot mRoot;
@@ -69,7 +66,7 @@ TEST_F(CliPlugins, ListsWhatIsInstalled) {
 
 TEST_F(CliPlugins, AppliesGlAndCpuPlugins) {
     ASSERT_EQ(0, run("sample -o '" + path("in.png") + "' --size 96x64").status);
-    VCImage* in = load(path("in.png"));
+    ImagePtr in = load(path("in.png"));
     // GL: strength 0 leaves the picture as it was, strength 100 does not.
     Result r = run("apply -e com.example.duotone,libduotone.so -p strength=0 '" + path("in.png") +
                    "' -o '" + path("d0.png") + "'");
@@ -78,10 +75,10 @@ TEST_F(CliPlugins, AppliesGlAndCpuPlugins) {
     ASSERT_EQ(0, run("apply -e com.example.duotone,libduotone.so '" + path("in.png") + "' -o '" +
                      path("d100.png") + "'")
                      .status);
-    VCImage* d0 = load(path("d0.png"));
-    VCImage* d100 = load(path("d100.png"));
-    const size_t size = VCImage_size(in);
-    ASSERT_EQ(size, VCImage_size(d0));
+    ImagePtr d0 = load(path("d0.png"));
+    ImagePtr d100 = load(path("d100.png"));
+    const size_t size = VCImage_size(in.get());
+    ASSERT_EQ(size, VCImage_size(d0.get()));
     int same = 0, changed = 0;
     for (size_t i = 0; i < size; ++i) {
         same += std::abs(in->data[i] - d0->data[i]) <= 1;
@@ -93,12 +90,11 @@ TEST_F(CliPlugins, AppliesGlAndCpuPlugins) {
     ASSERT_EQ(0, run("apply -e com.kiv.android.filter,libsolarize.so -p threshold=100 '" +
                      path("in.png") + "' -o '" + path("s.png") + "'")
                      .status);
-    VCImage* s = load(path("s.png"));
+    ImagePtr s = load(path("s.png"));
     for (size_t i = 0; i < size; ++i) {
         const int want = i % 4 != 3 && in->data[i] >= 100 ? 255 - in->data[i] : in->data[i];
         ASSERT_EQ(want, s->data[i]) << i;
     }
-    for (VCImage* image : {in, d0, d100, s}) VCImage_destroy(image);
     // A name whose library is not there, and one that is refused.
     for (const char* name : {"com.example.nothing,libduotone.so", "com.example,../libduotone.so"}) {
         r = run(std::string("apply -e '") + name + "' '" + path("in.png") + "' -o '" +
