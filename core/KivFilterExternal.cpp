@@ -24,6 +24,15 @@ const char KivFilterExternal::kDownloadLibraryDir[] = "/data/DownFilters/Lib/";
 const char KivFilterExternal::kPreloadTextureDir[] = "/system/cameradata/preloadfilters/Tex/";
 const char KivFilterExternal::kDownloadTextureDir[] = "/data/DownFilters/Tex/";
 
+// Calls into a plug-in rely on its virtual table alone: its type information
+// is its own (a separately loaded copy, or none when built without RTTI), so
+// the sanitizer's dynamic-type check does not apply to them.
+#if defined(__clang__) || (defined(__GNUC__) && __GNUC__ >= 8)
+#define KIV_PLUGIN_CALLS __attribute__((no_sanitize("vptr")))
+#else
+#define KIV_PLUGIN_CALLS
+#endif
+
 namespace {
 
 std::atomic<unsigned int> gFirstProgramId{0};
@@ -54,7 +63,7 @@ int formatBit(uint32_t format) {
     }
 }
 
-const char* nameOf(KivFilterPlugin* plugin) {
+KIV_PLUGIN_CALLS const char* nameOf(KivFilterPlugin* plugin) {
     const char* name = plugin->getName();
     return name != nullptr ? name : "(null)";
 }
@@ -72,7 +81,7 @@ KivFilterExternal::KivFilterExternal(void* arg)
     load(static_cast<const char*>(arg));
 }
 
-void KivFilterExternal::load(const char* arg) {
+KIV_PLUGIN_CALLS void KivFilterExternal::load(const char* arg) {
     if (arg == nullptr) {
         EglLog(VF_LOG_ERROR,
                "Downloadable Filter: The argument does not look like a proper library "
@@ -135,7 +144,7 @@ void KivFilterExternal::load(const char* arg) {
     mSupportedFormats = mThirdPartyWrapper->getSupportedFormats();
 }
 
-KivFilterExternal::~KivFilterExternal() {
+KIV_PLUGIN_CALLS KivFilterExternal::~KivFilterExternal() {
     EglLog(VF_LOG_DEBUG, "Downloadable Filter, ~KivFilterExternal() : mThirdPartyWrapper = %p",
            static_cast<void*>(mThirdPartyWrapper));
     if (mThirdPartyWrapper != nullptr) {
@@ -180,7 +189,7 @@ bool KivFilterExternal::checkSupportFormat(int format) const {
     return bit != 0 && (mSupportedFormats & bit) != 0;
 }
 
-int KivFilterExternal::doEffect() {
+KIV_PLUGIN_CALLS int KivFilterExternal::doEffect() {
     if (mThirdPartyWrapper == nullptr) {
         EglLog(VF_LOG_ERROR, "Downloadable Filter, mExtWrapper is null");
         return VC_REPORT(VC_ERROR_NULL_PARAM);
@@ -204,7 +213,7 @@ int KivFilterExternal::doEffect() {
                                        mInputImage->height, bit);
 }
 
-int KivFilterExternal::loadExtFragmentShader(EglProgram& program) {
+KIV_PLUGIN_CALLS int KivFilterExternal::loadExtFragmentShader(EglProgram& program) {
     EglLog(VF_LOG_DEBUG, "Downloadable Filter, KivFilterExternal loadExtFragmentShader %p",
            static_cast<void*>(this));
     if (mThirdPartyWrapper == nullptr) {
@@ -236,7 +245,7 @@ int KivFilterExternal::loadExtFragmentShader(EglProgram& program) {
     return result;
 }
 
-int KivFilterExternal::onDrawFrame(EglProgram& program) {
+KIV_PLUGIN_CALLS int KivFilterExternal::onDrawFrame(EglProgram& program) {
     bool unset = false;
     if (gFirstProgramSet.compare_exchange_strong(unset, true)) {
         gFirstProgramId.store(program.getProgramID());
@@ -261,7 +270,7 @@ int KivFilterExternal::onDrawFrame(EglProgram& program) {
     return 0;
 }
 
-int KivFilterExternal::releaseGL(EglRecycler& recycler) {
+KIV_PLUGIN_CALLS int KivFilterExternal::releaseGL(EglRecycler& recycler) {
     EglLog(VF_LOG_DEBUG, "Downloadable Filter, KivFilterExternal::releaseGL");
     if (mThirdPartyWrapper == nullptr) return 0;
     unsigned int* textures = nullptr;
@@ -277,13 +286,13 @@ int KivFilterExternal::releaseGL(EglRecycler& recycler) {
     return 0;
 }
 
-int KivFilterExternal::setOption(const char* name, int value) {
+KIV_PLUGIN_CALLS int KivFilterExternal::setOption(const char* name, int value) {
     if (mThirdPartyWrapper == nullptr || name == nullptr) return 0;
     mThirdPartyWrapper->setOption(name, value);
     return 1;
 }
 
-int KivFilterExternal::setOption(const char* name, const char* value) {
+KIV_PLUGIN_CALLS int KivFilterExternal::setOption(const char* name, const char* value) {
     if (mThirdPartyWrapper == nullptr || name == nullptr || value == nullptr) return 0;
     mThirdPartyWrapper->setOption(name, value);
     return 1;

@@ -34,7 +34,8 @@
 // Binary contract
 //   libkivimaging calls the object only through its virtual table, so the
 //   order of the virtual functions below is fixed: never insert, remove or
-//   reorder them. Build with a compiler of the Itanium C++ ABI (GCC or Clang,
+//   reorder them. Type information is never used, so a plug-in may be built
+//   without RTTI. Build with a compiler of the Itanium C++ ABI (GCC or Clang,
 //   as the Android NDK does), where the virtual destructor takes the first two
 //   slots:
 //     1, 2  ~KivFilterPlugin()         not called: Destroy frees the object
