@@ -4,6 +4,8 @@
 #include <string.h>
 #include <ui/GraphicBuffer.h>
 
+#include <algorithm>
+
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
@@ -125,8 +127,27 @@ std::vector<uint8_t> GlTest_readPixels(int width, int height) {
 }
 
 int GlTest_liveObjects(int range) {
+    // Mesa hands out names upwards without reusing freed ones at once: scan
+    // at least up to the names it would give next, so that long-running work
+    // does not move its objects out of view.
+    GLuint top = GLuint(range), name = 0;
+    glGenTextures(1, &name);
+    glDeleteTextures(1, &name);
+    top = std::max(top, name);
+    glGenFramebuffers(1, &name);
+    glDeleteFramebuffers(1, &name);
+    top = std::max(top, name);
+    glGenRenderbuffers(1, &name);
+    glDeleteRenderbuffers(1, &name);
+    top = std::max(top, name);
+    glGenBuffers(1, &name);
+    glDeleteBuffers(1, &name);
+    top = std::max(top, name);
+    name = glCreateProgram();  // programs and shaders share their names
+    glDeleteProgram(name);
+    top = std::max(top, name);
     int n = 0;
-    for (GLuint name = 1; name <= GLuint(range); ++name) {
+    for (name = 1; name <= top; ++name) {
         n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name) +
              glIsProgram(name) + glIsShader(name) + glIsBuffer(name);
     }

@@ -69,7 +69,8 @@ void GlTest_fillHalves(int width, int height);
 std::vector<uint8_t> GlTest_readPixels(int width, int height);
 
 // Live GL objects (textures, framebuffers, renderbuffers, programs, shaders,
-// buffers) among the first `range` names of each kind, in the current context.
+// buffers) among the first `range` names of each kind, and up to the names
+// the context would hand out next, in the current context.
 int GlTest_liveObjects(int range);
 
 // A GraphicBuffer as the current context sees it: its EGL image (made through
