@@ -11,6 +11,8 @@
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
 
+#include <string>
+
 struct ANativeWindow;
 namespace android {
 class GraphicBuffer;
@@ -44,6 +46,12 @@ public:
     virtual EGLImageKHR createNativeBufferImage(EGLDisplay display,
                                                 android::GraphicBuffer* buffer) = 0;
     virtual EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) = 0;
+
+    // With a context current: the text GL compiles for a shader of `type`
+    // whose library text is `source`. A device compiles `source` as it is; a
+    // host whose mediump float is 16-bit (and slow) compiles it with highp.
+    // An adapted text lives in *storage.
+    virtual const char* shaderText(unsigned int type, const char* source, std::string* storage) = 0;
 };
 
 #endif

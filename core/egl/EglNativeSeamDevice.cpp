@@ -43,6 +43,10 @@ public:
     EGLBoolean destroyImage(EGLDisplay display, EGLImageKHR image) override {
         return eglDestroyImageKHR(display, image);
     }
+
+    const char* shaderText(unsigned int, const char* source, std::string*) override {
+        return source;
+    }
 };
 
 }  // namespace

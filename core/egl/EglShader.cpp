@@ -2,7 +2,10 @@
 
 #include <GLES2/gl2.h>
 
+#include <string>
+
 #include "core/egl/EglCheck.h"
+#include "core/egl/EglNativeSeam.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_log.h"
 
@@ -34,7 +37,7 @@ int EglShader::initialize(bool link) {
     return bindVertexShader(vertexId, link && mFragmentId != 0);
 }
 
-unsigned int EglShader::loadShader(unsigned int type, const char* source) const {
+unsigned int EglShader::loadShader(unsigned int type, const char* text) const {
     unsigned int shaderType = type;
     GLuint shaderId = 0;
     if (!GL_CHECK(shaderId = glCreateShader(shaderType)) || shaderId == 0) {
@@ -42,12 +45,15 @@ unsigned int EglShader::loadShader(unsigned int type, const char* source) const 
                type == GL_FRAGMENT_SHADER ? "GL_FRAGMENT_SHADER" : "GL_VERTEX_SHADER");
         return 0;
     }
+    // The library's text, as this GL is to compile it.
+    std::string adapted;
+    const char* source = EglNativeSeam::get().shaderText(shaderType, text, &adapted);
     GL_CHECK(glShaderSource(shaderId, 1, &source, NULL));
     GL_CHECK(glCompileShader(shaderId));
     GLint compiled = GL_FALSE;
     GL_CHECK(glGetShaderiv(shaderId, GL_COMPILE_STATUS, &compiled));
     if (compiled != GL_TRUE) {
-        EglLog(VF_LOG_ERROR, "Failed to compile shader: %s", source);
+        EglLog(VF_LOG_ERROR, "Failed to compile shader: %s", text);
         GL_CHECK(glDeleteShader(shaderId));
         return 0;
     }

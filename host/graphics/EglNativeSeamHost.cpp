@@ -22,6 +22,7 @@
 #include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "HostGl.h"
+#include "ShaderPrecision.h"
 #include "vccore/vc_log.h"
 
 namespace {
@@ -167,6 +168,12 @@ public:
         }
         if (buffer != nullptr) buffer->onEglImageDestroyed();
         return result;
+    }
+
+    const char* shaderText(unsigned int type, const char* source, std::string* storage) override {
+        return android::ShaderPrecision_promotes(type)
+                   ? android::ShaderPrecision_highp(source, storage)
+                   : source;
     }
 
 private:
