@@ -4,8 +4,10 @@
 #include "core/KivFilterExternal.h"
 
 // Effect headers: one include per effect family.
+#include "core/filters/sce/beauty.h"
 #include "core/filters/sce/colorEffects.h"
 #include "core/filters/sce/fixedLooks.h"
+#include "core/filters/sce/geometricEffects.h"
 
 namespace {
 
@@ -39,6 +41,14 @@ const KivFilterFactory::Entry kEffects[] = {
     {434, 434, KivFilterFactory::make<Saturate>},
     {435, 435, KivFilterFactory::make<TintControl>},
     {436, 436, KivFilterFactory::make<HighlightShadow>},
+    // Geometric effects.
+    {417, 417, KivFilterFactory::make<FisheyeSingle>},
+    {441, 441, KivFilterFactory::make<Embossed>},
+    {444, 444, KivFilterFactory::make<Ripple>},
+    {445, 445, KivFilterFactory::make<Mosaic>},
+    {447, 447, KivFilterFactory::make<DistortionCorrection>},
+    // Face smoothing.
+    {446, 446, KivFilterFactory::make<Beauty>},
     // A filter library named by arg ("package,library").
     {2000, 2000, KivFilterFactory::makeWithArg<KivFilterExternal>},
 };

@@ -18,7 +18,7 @@ namespace {
 void quietLog(int, const char*, ...) {}
 
 // The effects with a "parameter" option that reads name=value pairs.
-const int kEffects[] = {425, 431, 432, 433, 434, 435, 436};
+const int kEffects[] = {425, 431, 432, 433, 434, 435, 436, 446, 447};
 
 }  // namespace
 
@@ -31,7 +31,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     // Texts arrive as C strings: stop at the first NUL like any caller would.
     std::string text(reinterpret_cast<const char*>(data), size);
     text = text.c_str();
-    static const char* const kKeys[] = {"intensity", "highlight", "shadow", "TE", "SA", nullptr};
+    static const char* const kKeys[] = {"intensity", "highlight", "shadow", "TE",
+                                        "SA",        "face",      nullptr};
     KivParameterString_check("fuzz", text.c_str(), kKeys);
     for (const char* key : kKeys) {
         if (key == nullptr) break;

@@ -309,7 +309,15 @@ int EglProgram::initShaderIndexer() {
 int EglProgram::onDrawFrame() {
     Mutex::Autolock lock(mLock);
 
+    // Deleting a recycled image unbinds the framebuffer; the frame still goes
+    // where the caller bound it.
+    GLint target = 0;
+    const bool images = mRecycler->pendingEglImages() > 0;
+    if (images) GL_CHECK(glGetIntegerv(GL_FRAMEBUFFER_BINDING, &target));
     mRecycler->recycle();
+    if (images && target != 0 && glIsFramebuffer(target)) {
+        GL_CHECK(glBindFramebuffer(GL_FRAMEBUFFER, target));
+    }
     // Released (or never initialised): nothing to draw with.
     if (mShader == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
 

@@ -166,6 +166,9 @@ void EglShader::setUniformfv(const char* name, int components, int size, const f
         case 3:
             GL_CHECK(glUniform3fv(obj->mHandle, size, value));
             break;
+        case 4:
+            GL_CHECK(glUniform4fv(obj->mHandle, size, value));
+            break;
         default:
             EglLog(VF_LOG_ERROR, "EglShader: %d-component uniform '%s' is not supported",
                    components, name);

@@ -1,7 +1,7 @@
 // The adjustable colour effects: what each parameter text sets (and the
-// warnings for what it could not use), their pictures through the buffered
-// processor (RGBA and NV21) against a CPU statement of the colour steps, load
-// failures, and GL objects over a thousand switches on one long-lived program.
+// warnings for what it could not use), and their pictures through the
+// buffered processor (RGBA and NV21) against a CPU statement of the colour
+// steps. Load failures and GL objects: effect_gl_test.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -360,86 +360,5 @@ INSTANTIATE_TEST_SUITE_P(EveryControl, ColorEffectsThroughProcessor,
                          [](const ::testing::TestParamInfo<Case>& info) {
                              return caseName(info.param);
                          });
-
-// A copy of an effect with a shader that cannot compile.
-template <class Effect>
-class Uncompilable : public Effect {
-public:
-    const char* getFragmentShader() const override { return "void main() { broken"; }
-};
-
-TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) {
-    const int w = 8, h = 6;
-    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, true));
-    Uncompilable<CustomColor> custom;
-    Uncompilable<Serene> serene;
-    Brightness brightness;
-    struct Row {
-        KivFilter* effect;
-        int programFaults;
-        std::vector<std::string> prefixes;  // each logged exactly once, at error level
-    } rows[] = {
-        {&custom, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/customColor:"}},
-        {&serene, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/colorPresets:"}},
-        {&brightness,
-         1,
-         {"Could not create a new program",
-          "VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/brightness:"}},
-    };
-    for (Row& r : rows) {
-        EffectRenderer renderer(picture);
-        ASSERT_TRUE(renderer.ok());
-        LogCapture log;
-        GlFault_failProgramCreations(r.programFaults);
-        int result = renderer.draw(r.effect);
-        GlFault_failProgramCreations(0);
-        EXPECT_EQ(0, result);
-        for (const std::string& p : r.prefixes)
-            EXPECT_EQ(1u, log.countPrefix(p, VF_LOG_ERROR)) << p;
-        EXPECT_TRUE(
-            log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
-        EXPECT_FALSE(dynamic_cast<FullShaderEffects*>(r.effect)->hasShader());
-        // The pass-through took over: the picture, opaque.
-        EXPECT_EQ(picture.rgba(), renderer.pixels());
-    }
-    // The same effect loads once the driver has programs again.
-    EffectRenderer renderer(picture);
-    ASSERT_EQ(0, renderer.draw(&brightness));
-    EXPECT_TRUE(brightness.hasShader());
-}
-
-TEST_F(GlContextTest, AThousandSwitchesOnOneProgramLeaveNoGlObject) {
-    const int w = 12, h = 10;
-    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, true));
-    std::vector<std::unique_ptr<KivFilter>> effects;
-    for (int id = 425; id <= 436; ++id) effects.emplace_back(KivImaging_create(id, nullptr));
-    LogCapture quiet;
-    int before = 0;
-    {
-        EffectRenderer renderer(picture);
-        ASSERT_TRUE(renderer.ok());
-        for (int i = 0; i < 1024; ++i) {
-            if (i == 24) before = GlTest_liveObjects(4096);
-            KivFilter* f = effects[i % effects.size()].get();
-            int n = (i * 37) % 401 - 200;
-            std::string text = "intensity=" + std::to_string(n) +
-                               ",highlight=" + std::to_string(n / 2) +
-                               ",shadow=" + std::to_string(-n) + ",TE=" + std::to_string(n) +
-                               ",SA=" + std::to_string(-n) + ",CO=" + std::to_string(n / 3);
-            f->setOption("parameter", text.c_str());
-            ASSERT_EQ(0, renderer.draw(f)) << i;
-            // Now and then the whole frame: the switch really drew this effect.
-            if (i % 97 == 0) {
-                int id = 425 + static_cast<int>(i % effects.size());
-                lookref::expectPixels(lookref::renderColour(stepsOf(id), uniformsOf(f), picture),
-                                      nullptr, renderer.pixels().data(), w, h, kTolerance,
-                                      "frame " + std::to_string(i));
-            }
-        }
-        // The current effect's shader and the program's own: nothing piled up.
-        EXPECT_EQ(before, GlTest_liveObjects(4096));
-    }
-    for (auto& f : effects) EXPECT_FALSE(dynamic_cast<FullShaderEffects*>(f.get())->hasShader());
-}
 
 }  // namespace

@@ -311,15 +311,20 @@ TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     std::vector<uint8_t> rgba = lookref::makeTestPicture(w, h, false);
     lookref::Nv21Picture nv21 = lookref::makeNv21Picture(w, h);
     std::vector<uint8_t> out(w * h * 4);
-    // The fixed looks and the adjustable colour effects, which hold GL objects
-    // of their own, with a new parameter text before every draw.
+    // The fixed looks, and the effects that hold GL objects of their own
+    // (colour, geometric, Beauty with a face), with a new parameter text
+    // before every draw.
     std::vector<int> ids = lookref::lookIds();
     for (int id = 425; id <= 436; ++id) ids.push_back(id);
+    for (int id : {417, 441, 444, 445, 446, 447}) ids.push_back(id);
     auto run = [&](int i) {
         mProcessor->setEffect(ids[i % ids.size()]);
         int n = i % 401 - 200;
         std::string text = "intensity=" + std::to_string(n) + ",highlight=" + std::to_string(-n) +
-                           ",TE=" + std::to_string(n) + ",SA=" + std::to_string(n / 2);
+                           ",TE=" + std::to_string(n) + ",SA=" + std::to_string(n / 2) +
+                           ",FA=1,LE=" + std::to_string(n) +
+                           ",face=1,width=16,height=12,left=2,top=2,right=12,bottom=10,"
+                           "tonemin=3158064,tonemax=16777200";
         mProcessor->setEffectParameter(text.c_str());
         if (i % 3 == 0) mProcessor->setEffect("com.morvane.unknown,libnone.so");
         int r = (i % 2) ? mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(),
@@ -330,19 +335,25 @@ TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     // Quiet: a thousand draws log a great deal.
     LogCapture quiet;
     for (int i = 0; i < 20; ++i) run(i);
-    ASSERT_EQ(0, mProcessor->bindGLEnvironment());
-    const int before = GlTest_liveObjects(4096);
-    mProcessor->unbindGLEnvironment();
+    // Counted during a bind with the same effect loaded (Brightness, with a
+    // program and shaders of its own) before and after.
+    auto liveDuringBind = [&]() {
+        mProcessor->setEffect(431);
+        mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(), VC_FORMAT_RGBA);
+        EXPECT_EQ(0, mProcessor->bindGLEnvironment());
+        int live = GlTest_liveObjects(4096);
+        mProcessor->unbindGLEnvironment();
+        return live;
+    };
+    const int before = liveDuringBind();
     const int filesBefore = Test_openFiles();
     for (int i = 20; i < 1020; ++i) {
         run(i);
         if (HasFatalFailure()) return;
     }
-    ASSERT_EQ(0, mProcessor->bindGLEnvironment());
-    const int after = GlTest_liveObjects(4096);
-    mProcessor->unbindGLEnvironment();
+    const int after = liveDuringBind();
     // Only what a bind makes is alive each time: the program and its shaders,
-    // and (both times Brightness is loaded) the effect's own program and shaders.
+    // and the effect's own program and shaders.
     EXPECT_EQ(before, after);
     EXPECT_EQ(filesBefore, Test_openFiles());
     EXPECT_LE(after, 5);

@@ -83,6 +83,42 @@ struct Nv21Picture {
 };
 Nv21Picture makeNv21Picture(int width, int height);
 
+// Per pixel and channel, the range an RGBA8 result may land in (before the
+// tolerance), and pixels too close to a hard threshold to be compared. For
+// effects whose sample positions the GPU computes in reduced precision, the
+// range spans the colours within `positionSlack` of the exact position.
+struct Expectation {
+    int width = 0, height = 0;
+    std::vector<uint8_t> lo, hi;
+    std::vector<bool> skip;
+};
+// Every pixel within [lo - tolerance, hi + tolerance]; no more than a
+// `maxSkipped` share of pixels skipped.
+void expectWithin(const Expectation& e, const uint8_t* actual, int tolerance,
+                  const std::string& label, double maxSkipped = 0.125);
+
+// The geometric looks (417 FisheyeSingle, 441 Embossed, 444 Ripple, 445
+// Mosaic, 447 DistortionCorrection) drawn over the picture at its own size
+// (camera and preview geometry = picture size), identity mapping. `time` is
+// Ripple's u_time, `level` DistortionCorrection's current level.
+Expectation renderGeometric(int id, const Picture& picture, float time, float level,
+                            float positionSlack);
+
+// Beauty's compose of one face over the picture (preview = picture size,
+// identity mapping): intensity 1 to 4, facecoord (centre, scale), skin range.
+struct BeautyFace {
+    int intensity;
+    float facecoord[4];
+    float toneMin[3];
+    float toneMax[3];
+};
+Expectation renderBeauty(const Picture& picture, const BeautyFace& face);
+
+// A test picture with a face: the look picture's edges and gradients around a
+// skin-coloured ellipse (centre (0.45, 0.5) of the picture, radii 0.3 x 0.35)
+// with a fine, smooth texture inside.
+std::vector<uint8_t> makeFacePicture(int width, int height);
+
 // Deterministic test picture: smooth gradients with sharp-edged blocks and a
 // few flat patches, alpha varying unless opaque.
 std::vector<uint8_t> makeTestPicture(int width, int height, bool opaque);

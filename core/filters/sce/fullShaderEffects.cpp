@@ -33,6 +33,33 @@ int FullShaderEffects::getUniform(const char* name, float out[4]) const {
     return 0;
 }
 
+android::sp<EglShader> KivEffectShader_build(const char* fragment, const char* const* uniforms,
+                                             const char* source, int line, int* status) {
+    android::sp<EglShader> shader = new EglShader();
+    *status = 0;
+    if (shader->initialize(false) != 0) {
+        *status = VCError_report(VC_ERROR_ALLOC_FAILED, source, line);
+    } else {
+        unsigned int id = shader->loadShader(GL_FRAGMENT_SHADER, fragment);
+        *status = id == 0 ? VCError_report(VC_ERROR_UNKNOWN, source, line)
+                          : shader->bindFragmentShader(id, true);
+    }
+    if (*status != 0) {
+        shader->release();
+        return nullptr;
+    }
+    shader->bindProgram(EglShader::SHADER_PRECISION_HIGH);
+    shader->addNameIndexer("a_position", EglShader::INDEX_ATTRIBUTE,
+                           EglShader::INDEX_TYPE_POSITION);
+    shader->addNameIndexer("a_texcoord", EglShader::INDEX_ATTRIBUTE,
+                           EglShader::INDEX_TYPE_TEXCOORD);
+    shader->addNameIndexer("texSampler", EglShader::INDEX_UNIFORM, EglShader::INDEX_TYPE_SAMPLER);
+    for (int i = 0; uniforms != nullptr && uniforms[i] != nullptr; ++i) {
+        shader->addNameIndexer(uniforms[i], EglShader::INDEX_UNIFORM, 0);
+    }
+    return shader;
+}
+
 int FullShaderEffects::loadFullShader(EglProgram& program, unsigned int& shaderId,
                                       const char* source, int line) {
     // The effect draws the quad itself.
@@ -42,30 +69,12 @@ int FullShaderEffects::loadFullShader(EglProgram& program, unsigned int& shaderI
         mShader->release();
         mShader.clear();
     }
-    android::sp<EglShader> shader = new EglShader();
-    if (shader->initialize(false) != 0) {
-        shader->release();
-        return VCError_report(VC_ERROR_ALLOC_FAILED, source, line);
-    }
-    unsigned int fragment = shader->loadShader(GL_FRAGMENT_SHADER, getFragmentShader());
-    if (fragment == 0) {
-        shader->release();
-        return VCError_report(VC_ERROR_UNKNOWN, source, line);
-    }
-    int result = shader->bindFragmentShader(fragment, true);
-    if (result != 0) {
-        shader->release();
-        return result;
-    }
-    shader->bindProgram(EglShader::SHADER_PRECISION_HIGH);
-    shader->addNameIndexer("a_position", EglShader::INDEX_ATTRIBUTE,
-                           EglShader::INDEX_TYPE_POSITION);
-    shader->addNameIndexer("a_texcoord", EglShader::INDEX_ATTRIBUTE,
-                           EglShader::INDEX_TYPE_TEXCOORD);
-    shader->addNameIndexer("texSampler", EglShader::INDEX_UNIFORM, EglShader::INDEX_TYPE_SAMPLER);
-    for (const Uniform& u : mUniforms) shader->addNameIndexer(u.name, EglShader::INDEX_UNIFORM, 0);
-    mShader = shader;
-    return 0;
+    std::vector<const char*> names;
+    for (const Uniform& u : mUniforms) names.push_back(u.name);
+    names.push_back(nullptr);
+    int status = 0;
+    mShader = KivEffectShader_build(getFragmentShader(), names.data(), source, line, &status);
+    return status;
 }
 
 int FullShaderEffects::drawFullShader(EglProgram& program, const float* texcoords,

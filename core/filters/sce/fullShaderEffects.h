@@ -19,6 +19,15 @@
 #include "core/KivFilter.h"
 #include "core/egl/EglShader.h"
 
+// A linked program of the quad's vertex shader and `fragment` (a complete
+// shader), left current, with "a_position", "a_texcoord", "texSampler" and
+// the null-terminated `uniforms` indexed. Null on failure, after logging the
+// standard error line under `source`:`line` (-5 when no program can be made,
+// -1 when the shader does not compile; a link failure is logged by the
+// shader object), with the code in *status.
+android::sp<EglShader> KivEffectShader_build(const char* fragment, const char* const* uniforms,
+                                             const char* source, int line, int* status);
+
 class FullShaderEffects : public KivFilter {
 public:
     FullShaderEffects() = default;

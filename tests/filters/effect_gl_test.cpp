@@ -1,0 +1,141 @@
+// The effects that own GL objects (the colour effects, DistortionCorrection,
+// Beauty) and the position snippets, on one long-lived program as a live
+// pipeline keeps it: load failures logged under each effect's own source with
+// the pass-through taking over, and no GL object left over a thousand
+// switches with parameter changes and Beauty's size changes between draws.
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "core/KivImaging.h"
+#include "core/egl/EglProgram.h"
+#include "core/filters/sce/beauty.h"
+#include "core/filters/sce/colorEffects.h"
+#include "core/filters/sce/geometricEffects.h"
+#include "support/effect_renderer.h"
+#include "support/gl_context.h"
+#include "support/gl_fault.h"
+#include "support/log_capture.h"
+#include "support/look_reference.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+// A copy of an effect with a shader that cannot compile.
+template <class Effect>
+class Uncompilable : public Effect {
+public:
+    const char* getFragmentShader() const override { return "void main() { broken"; }
+};
+
+// Whether an effect holds GL objects of its own now.
+bool holdsGl(KivFilter* f) {
+    if (auto* full = dynamic_cast<FullShaderEffects*>(f)) return full->hasShader();
+    if (auto* beauty = dynamic_cast<Beauty*>(f))
+        return beauty->hasPrograms() || beauty->hasBlurTargets();
+    return false;
+}
+
+TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) {
+    const int w = 8, h = 6;
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, true));
+    Uncompilable<CustomColor> custom;
+    Uncompilable<Serene> serene;
+    Uncompilable<DistortionCorrection> distortion;
+    Brightness brightness;
+    Beauty beauty;
+    struct Row {
+        KivFilter* effect;
+        int programFaults;                  // program creations that fail
+        std::vector<std::string> prefixes;  // each logged exactly once, at error level
+    } rows[] = {
+        {&custom, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/customColor:"}},
+        {&serene, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/colorPresets:"}},
+        {&distortion, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/distortionCorrection:"}},
+        {&brightness,
+         1,
+         {"Could not create a new program",
+          "VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/brightness:"}},
+        {&beauty, 1, {"VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/beauty:"}},
+    };
+    for (Row& r : rows) {
+        SCOPED_TRACE(r.prefixes.back());
+        EffectRenderer renderer(picture);
+        ASSERT_TRUE(renderer.ok());
+        LogCapture log;
+        GlFault_failProgramCreations(r.programFaults);
+        int result = renderer.draw(r.effect);
+        GlFault_failProgramCreations(0);
+        EXPECT_EQ(0, result);
+        for (const std::string& p : r.prefixes)
+            EXPECT_EQ(1u, log.countPrefix(p, VF_LOG_ERROR)) << p;
+        EXPECT_TRUE(
+            log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
+        EXPECT_FALSE(holdsGl(r.effect));
+        // The pass-through took over: the picture, opaque.
+        EXPECT_EQ(picture.rgba(), renderer.pixels());
+    }
+    // The same effects load once the driver has programs again.
+    EffectRenderer renderer(picture);
+    for (KivFilter* f : {static_cast<KivFilter*>(&brightness), static_cast<KivFilter*>(&beauty)}) {
+        ASSERT_EQ(0, renderer.draw(f));
+        EXPECT_TRUE(holdsGl(f));
+    }
+}
+
+TEST_F(GlContextTest, AThousandSwitchesOnOneProgramLeaveNoGlObject) {
+    const int w = 24, h = 16;
+    lookref::Picture picture(w, h, lookref::makeFacePicture(w, h));
+    std::vector<std::unique_ptr<KivFilter>> effects;
+    for (int id = 425; id <= 436; ++id) effects.emplace_back(KivImaging_create(id, nullptr));
+    for (int id : {445, 444, 441, 417, 447}) effects.emplace_back(KivImaging_create(id, nullptr));
+    auto beauty = std::make_unique<Beauty>();
+    KivFilter* fisheye = effects[15].get();  // no GL objects of its own
+    LogCapture quiet;
+    int before = 0;
+    {
+        EffectRenderer renderer(picture);
+        ASSERT_TRUE(renderer.ok());
+        ASSERT_EQ(0, renderer.draw(fisheye));
+        before = GlTest_liveObjects(4096);
+        for (int i = 0; i < 1000; ++i) {
+            // Beauty builds four programs per switch, slow on a software GL: it
+            // comes every 25th switch and then draws three frames at changing
+            // preview sizes, which rebuild its blur targets.
+            KivFilter* f = i % 25 == 12 ? beauty.get() : effects[i % effects.size()].get();
+            int n = (i * 37) % 401 - 200;
+            std::string text =
+                "intensity=" + std::to_string(n) + ",highlight=" + std::to_string(n / 2) +
+                ",shadow=" + std::to_string(-n) + ",TE=" + std::to_string(n) +
+                ",SA=" + std::to_string(-n) + ",FA=" + std::to_string(i % 2) +
+                ",LE=" + std::to_string(n) +
+                ",face=1,width=24,height=16,left=2,top=2,right=" + std::to_string(12 + i % 7) +
+                ",bottom=14,tonemin=3158064,tonemax=16777200";
+            f->setOption("parameter", text.c_str());
+            for (int frame = 0; frame < (f == beauty.get() ? 3 : 1); ++frame) {
+                renderer.program().setPreviewGeometry(w - 4 * frame, h + 4 * frame, false);
+                ASSERT_EQ(0, renderer.draw(f)) << i;
+            }
+            renderer.program().setPreviewGeometry(w, h, false);
+            // Now and then: the switch really drew this effect, into the target
+            // (as a program of its own draws it; the animated two move on every
+            // frame). Right after Beauty, recycling its blur targets must not
+            // have unbound the frame's target.
+            if ((i % 97 == 0 || i % 25 == 13) && f->getFilterType() != 444 &&
+                f->getFilterType() != 447) {
+                std::vector<uint8_t> drawn = renderer.pixels();
+                EXPECT_EQ(EffectRenderer_renderOnce(f, picture), drawn) << i;
+            }
+        }
+        // Back to the effect counted first: what each switch handed to the
+        // recycler is gone.
+        ASSERT_EQ(0, renderer.draw(fisheye));
+        EXPECT_EQ(before, GlTest_liveObjects(4096));
+    }
+    for (auto& f : effects) EXPECT_FALSE(holdsGl(f.get())) << f->getFilterType();
+    EXPECT_FALSE(holdsGl(beauty.get()));
+}
+
+}  // namespace
