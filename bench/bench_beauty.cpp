@@ -26,6 +26,7 @@
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglImage.h"
+#include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglProgram.h"
 #include "core/egl/EglShader.h"
 #include "core/egl/EglWindowSurface.h"
@@ -76,6 +77,10 @@ VCImage* makeFrame() {
 
 GLuint compile(const char* fragment) {
     auto shader = [](GLenum type, const char* text) {
+        // The text GL compiles for the library's shaders on this platform
+        // (highp where mediump is emulated), so both sides run the same code.
+        std::string adapted;
+        text = EglNativeSeam::get().shaderText(type, text, &adapted);
         GLuint s = glCreateShader(type);
         glShaderSource(s, 1, &text, nullptr);
         glCompileShader(s);
