@@ -1,7 +1,7 @@
 // ANativeWindow: the producer end of a window's buffer queue, laid out as on
 // a device (a C struct of function pointers with a reference-counted base).
-// The host graphics layer implements it (android::HostWindow) and its EGL
-// seam renders into it.
+// The host graphics layer implements it (android::Surface over a
+// BufferQueue) and its EGL seam renders into it.
 #ifndef KIV_HOST_SYSTEM_WINDOW_H
 #define KIV_HOST_SYSTEM_WINDOW_H
 
@@ -28,6 +28,7 @@ enum {
     NATIVE_WINDOW_DEFAULT_HEIGHT = 7,
     NATIVE_WINDOW_TRANSFORM_HINT = 8,
     NATIVE_WINDOW_CONSUMER_RUNNING_BEHIND = 9,
+    NATIVE_WINDOW_CONSUMER_USAGE_BITS = 10,
 };
 
 // Operations for ANativeWindow::perform().
@@ -43,9 +44,33 @@ enum {
     NATIVE_WINDOW_SET_BUFFERS_DIMENSIONS = 8,
     NATIVE_WINDOW_SET_BUFFERS_FORMAT = 9,
     NATIVE_WINDOW_SET_SCALING_MODE = 10,
+    NATIVE_WINDOW_LOCK = 11,
+    NATIVE_WINDOW_UNLOCK_AND_POST = 12,
     NATIVE_WINDOW_API_CONNECT = 13,
     NATIVE_WINDOW_API_DISCONNECT = 14,
+    NATIVE_WINDOW_SET_BUFFERS_USER_DIMENSIONS = 15,
+    NATIVE_WINDOW_SET_POST_TRANSFORM_CROP = 16,
+    NATIVE_WINDOW_SET_BUFFERS_STICKY_TRANSFORM = 17,
 };
+
+// Buffer transforms (NATIVE_WINDOW_SET_BUFFERS_TRANSFORM and the sticky one).
+enum {
+    NATIVE_WINDOW_TRANSFORM_FLIP_H = 0x01,
+    NATIVE_WINDOW_TRANSFORM_FLIP_V = 0x02,
+    NATIVE_WINDOW_TRANSFORM_ROT_90 = 0x04,
+    NATIVE_WINDOW_TRANSFORM_ROT_180 = 0x03,
+    NATIVE_WINDOW_TRANSFORM_ROT_270 = 0x07,
+};
+
+// NATIVE_WINDOW_SET_SCALING_MODE values.
+enum {
+    NATIVE_WINDOW_SCALING_MODE_FREEZE = 0,
+    NATIVE_WINDOW_SCALING_MODE_SCALE_TO_WINDOW = 1,
+    NATIVE_WINDOW_SCALING_MODE_SCALE_CROP = 2,
+};
+
+// The timestamp that asks the window to stamp the buffer when it is queued.
+#define NATIVE_WINDOW_TIMESTAMP_AUTO ((int64_t)INT64_MIN)
 
 // Producer APIs for NATIVE_WINDOW_API_CONNECT.
 enum {
@@ -130,6 +155,20 @@ static inline int native_window_set_buffers_format(struct ANativeWindow* window,
 static inline int native_window_set_buffers_timestamp(struct ANativeWindow* window,
                                                       int64_t timestamp) {
     return window->perform(window, NATIVE_WINDOW_SET_BUFFERS_TIMESTAMP, timestamp);
+}
+
+static inline int native_window_set_buffers_geometry(struct ANativeWindow* window, int w, int h,
+                                                     int format) {
+    return window->perform(window, NATIVE_WINDOW_SET_BUFFERS_GEOMETRY, w, h, format);
+}
+
+static inline int native_window_set_buffers_transform(struct ANativeWindow* window, int transform) {
+    return window->perform(window, NATIVE_WINDOW_SET_BUFFERS_TRANSFORM, transform);
+}
+
+static inline int native_window_set_buffers_sticky_transform(struct ANativeWindow* window,
+                                                             int transform) {
+    return window->perform(window, NATIVE_WINDOW_SET_BUFFERS_STICKY_TRANSFORM, transform);
 }
 
 static inline int native_window_api_connect(struct ANativeWindow* window, int api) {
