@@ -11,6 +11,7 @@
 #include "core/egl/HalPixelFormat.h"
 #include "core/egl/Platform.h"
 #include "vccore/vc_convert.h"
+#include "vccore/vc_geometry.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_log.h"
 
@@ -20,27 +21,6 @@ using android::GraphicBuffer;
 using android::sp;
 
 namespace {
-
-// Nearest source index for a destination index: the sample under the
-// destination pixel's centre.
-inline int nearest(int d, int dstSize, int srcSize) {
-    int s = (int)(((int64_t)(2 * d + 1) * srcSize) / (2 * (int64_t)dstSize));
-    return s < srcSize ? s : srcSize - 1;
-}
-
-// Resizes one plane of `step`-byte samples.
-void resizePlane(unsigned char* dst, int dstWidth, int dstHeight, const unsigned char* src,
-                 int srcWidth, int srcHeight, int step) {
-    for (int y = 0; y < dstHeight; ++y) {
-        const unsigned char* srcRow =
-            src + (size_t)nearest(y, dstHeight, srcHeight) * srcWidth * step;
-        unsigned char* dstRow = dst + (size_t)y * dstWidth * step;
-        for (int x = 0; x < dstWidth; ++x) {
-            memcpy(dstRow + (size_t)x * step,
-                   srcRow + (size_t)nearest(x, dstWidth, srcWidth) * step, step);
-        }
-    }
-}
 
 // The pixels of a locked buffer, handed out for as long as the lock lasts:
 // destroying the record gives the buffer back.
@@ -518,18 +498,15 @@ void EglImage::doTransformResizeYUV(unsigned char* dst, int dstWidth, int dstHei
         srcHeight > 1) {
         size_t dstLuma = (size_t)dstWidth * dstHeight;
         size_t srcLuma = (size_t)srcWidth * srcHeight;
-        resizePlane(dst, dstWidth, dstHeight, src, srcWidth, srcHeight, 1);
+        VCImage_scalePlane(src, srcWidth, srcHeight, dst, dstWidth, dstHeight, 1);
+        const int cw = dstWidth / 2, ch = dstHeight / 2, scw = srcWidth / 2, sch = srcHeight / 2;
         if (mFormat == VC_FORMAT_YV12) {
-            size_t dstQuarter = dstLuma / 4;
-            size_t srcQuarter = srcLuma / 4;
-            resizePlane(dst + dstLuma, dstWidth / 2, dstHeight / 2, src + srcLuma, srcWidth / 2,
-                        srcHeight / 2, 1);
-            resizePlane(dst + dstLuma + dstQuarter, dstWidth / 2, dstHeight / 2,
-                        src + srcLuma + srcQuarter, srcWidth / 2, srcHeight / 2, 1);
+            VCImage_scalePlane(src + srcLuma, scw, sch, dst + dstLuma, cw, ch, 1);
+            VCImage_scalePlane(src + srcLuma + srcLuma / 4, scw, sch, dst + dstLuma + dstLuma / 4,
+                               cw, ch, 1);
         } else {
             // Interleaved chroma: each pair moves as one two-byte sample.
-            resizePlane(dst + dstLuma, dstWidth / 2, dstHeight / 2, src + srcLuma, srcWidth / 2,
-                        srcHeight / 2, 2);
+            VCImage_scalePlane(src + srcLuma, scw, sch, dst + dstLuma, cw, ch, 2);
         }
     }
     EglLog(VF_LOG_DEBUG, "doTransformResizeYUV X");

@@ -107,6 +107,28 @@ TEST(VCImageScale, SamplesAtPixelCentres) {
     for (VCImage* i : {src, down, up, same, in, out}) VCImage_destroy(i);
 }
 
+// Planes of 1- and 2-byte samples sample like RGBA pixels: the same 5x4 -> 10x6
+// picture scaled as one 4-byte plane and as 1- and 2-byte planes agrees sample for sample.
+TEST(VCImageScale, PlanesOfAnySampleSizeSampleAlike) {
+    VCImage* src = labelled(5, 4, 1);
+    VCImage* up = VCImage_createNew(10, 6, VC_FORMAT_RGBA);
+    ASSERT_EQ(VC_OK, VCImage_scale(src, up));
+    for (int step : {1, 2}) {
+        // Byte k of every RGBA pixel, gathered into a plane of step-byte samples.
+        std::vector<uint8_t> plane(5 * 4 * step), out(10 * 6 * step);
+        for (int i = 0; i < 5 * 4 * step; ++i) plane[i] = src->data[(i / step) * 4 + i % step];
+        ASSERT_EQ(VC_OK, VCImage_scalePlane(plane.data(), 5, 4, out.data(), 10, 6, step));
+        for (int i = 0; i < 10 * 6 * step; ++i)
+            ASSERT_EQ(out[i], up->data[(i / step) * 4 + i % step]) << step << " " << i;
+    }
+    uint8_t byte = 0;
+    EXPECT_EQ(VC_ERROR_NULL_PARAM, VCImage_scalePlane(nullptr, 1, 1, &byte, 1, 1, 1));
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_scalePlane(&byte, 1, 0, &byte, 1, 1, 1));
+    EXPECT_EQ(VC_ERROR_INVALID_SIZE, VCImage_scalePlane(&byte, 1, 1, &byte, 1, 1, 0));
+    VCImage_destroy(src);
+    VCImage_destroy(up);
+}
+
 TEST(VCImageCrop, RgbAndEvery420Layout) {
     LogCapture log;
     VCImage* src = labelled(6, 5);

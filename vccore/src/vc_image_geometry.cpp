@@ -122,8 +122,16 @@ extern "C" int VCImage_scale(const VCImage* source, VCImage* destination) {
     }
     if (!planesFit(source) || !planesFit(destination)) return VC_REPORT(VC_ERROR_INVALID_SIZE);
 
-    const int sw = source->width, sh = source->height;
-    const int dw = destination->width, dh = destination->height;
+    return VCImage_scalePlane(source->data, source->width, source->height, destination->data,
+                              destination->width, destination->height, 4);
+}
+
+extern "C" int VCImage_scalePlane(const uint8_t* source, int sw, int sh, uint8_t* destination,
+                                  int dw, int dh, int bytesPerSample) {
+    if (source == nullptr || destination == nullptr) return VC_REPORT(VC_ERROR_NULL_PARAM);
+    if (sw < 1 || sh < 1 || dw < 1 || dh < 1 || bytesPerSample < 1)
+        return VC_REPORT(VC_ERROR_INVALID_SIZE);
+    const size_t step = static_cast<size_t>(bytesPerSample);
     // The canvas scale factors are single-precision quotients.
     const float scaleX = static_cast<float>(dw) / static_cast<float>(sw);
     const float scaleY = static_cast<float>(dh) / static_cast<float>(sh);
@@ -135,17 +143,17 @@ extern "C" int VCImage_scale(const VCImage* source, VCImage* destination) {
     }
     for (int y = 0; y < dh; ++y) {
         const double syf = floor((y + 0.5) / static_cast<double>(scaleY));
-        uint8_t* row = destination->data + static_cast<size_t>(y) * dw * 4;
+        uint8_t* row = destination + static_cast<size_t>(y) * dw * step;
         if (syf >= sh) {
-            memset(row, 0, static_cast<size_t>(dw) * 4);
+            memset(row, 0, static_cast<size_t>(dw) * step);
             continue;
         }
-        const uint8_t* srcRow = source->data + static_cast<size_t>(syf) * sw * 4;
+        const uint8_t* srcRow = source + static_cast<size_t>(syf) * sw * step;
         for (int x = 0; x < dw; ++x) {
             if (columns[x] < 0)
-                memset(row + x * 4, 0, 4);
+                memset(row + x * step, 0, step);
             else
-                memcpy(row + x * 4, srcRow + static_cast<size_t>(columns[x]) * 4, 4);
+                memcpy(row + x * step, srcRow + static_cast<size_t>(columns[x]) * step, step);
         }
     }
     free(columns);

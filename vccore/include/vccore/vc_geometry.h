@@ -16,6 +16,15 @@ extern "C" {
 // copied as they are (no premultiplication, no filtering).
 int VCImage_scale(const VCImage* source, VCImage* destination);
 
+// The same nearest-neighbour sampling over one plane of tightly packed
+// samples of bytesPerSample bytes (1 for luma or a planar chroma plane, 2 for
+// interleaved chroma pairs, 4 for RGBA), so YUV pictures resize plane by
+// plane exactly as RGBA ones do. Returns 0, or VC_ERROR_NULL_PARAM /
+// VC_ERROR_INVALID_SIZE for missing planes or non-positive sizes.
+int VCImage_scalePlane(const uint8_t* source, int sourceWidth, int sourceHeight,
+                       uint8_t* destination, int destinationWidth, int destinationHeight,
+                       int bytesPerSample);
+
 // Copies the destination-sized rectangle at (x, y) of the source into the
 // destination (allocated when it has no buffer). RGB formats at any offset;
 // 4:2:0 formats at even offsets and even sizes only.
