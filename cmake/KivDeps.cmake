@@ -20,6 +20,8 @@ pkg_check_modules(KIV_TURBOJPEG REQUIRED IMPORTED_TARGET libturbojpeg)
 pkg_check_modules(KIV_JPEG REQUIRED IMPORTED_TARGET libjpeg)
 pkg_check_modules(KIV_PNG REQUIRED IMPORTED_TARGET libpng)
 pkg_check_modules(KIV_EXIF REQUIRED IMPORTED_TARGET libexif)
+# The host's virtual camera reads video files (never linked into a device build).
+pkg_check_modules(KIV_AV REQUIRED IMPORTED_TARGET libavformat libavcodec libavutil libswscale)
 
 if(KIV_BUILD_TESTS)
   find_package(GTest REQUIRED)

@@ -197,6 +197,8 @@ int Surface::performOperation(int operation, va_list args) {
         case NATIVE_WINDOW_SET_BUFFERS_TIMESTAMP:
             mTimestamp = va_arg(args, int64_t);
             return NO_ERROR;
+        case NATIVE_WINDOW_SET_DEQUEUE_TIMEOUT:
+            return mProducer->setDequeueTimeout(va_arg(args, int64_t));
         case NATIVE_WINDOW_SET_SCALING_MODE: {
             const int mode = va_arg(args, int);
             if (mode < NATIVE_WINDOW_SCALING_MODE_FREEZE ||

@@ -51,6 +51,8 @@ enum {
     NATIVE_WINDOW_SET_BUFFERS_USER_DIMENSIONS = 15,
     NATIVE_WINDOW_SET_POST_TRANSFORM_CROP = 16,
     NATIVE_WINDOW_SET_BUFFERS_STICKY_TRANSFORM = 17,
+    // How long a dequeue may block, in ns (int64_t): < 0 for ever, 0 not at all.
+    NATIVE_WINDOW_SET_DEQUEUE_TIMEOUT = 42,
 };
 
 // Buffer transforms (NATIVE_WINDOW_SET_BUFFERS_TRANSFORM and the sticky one).

@@ -1,0 +1,73 @@
+#include "support/camera_frames.h"
+
+#include <stdlib.h>
+
+#include <algorithm>
+
+#include "core/egl/EglProgram.h"
+#include "kivhost/VirtualCamera.h"
+#include "vccore/vc_convert.h"
+
+std::vector<uint8_t> CameraFrames_nv21(uint64_t index, int width, int height) {
+    std::vector<uint8_t> nv21(VCImage_requiredSize(width, height, VC_FORMAT_NV21));
+    VCImage frame;
+    frame.data = nv21.data();
+    frame.width = width;
+    frame.height = height;
+    frame.format = VC_FORMAT_NV21;
+    frame.wrapped = 1;
+    auto generator = kivhost::VirtualCamera_generator(width, height);
+    if (generator == nullptr || !generator->render(index, &frame)) nv21.clear();
+    frame.data = nullptr;
+    return nv21;
+}
+
+std::vector<uint8_t> CameraFrames_rgba(uint64_t index, int width, int height) {
+    std::vector<uint8_t> nv21 = CameraFrames_nv21(index, width, height);
+    std::vector<uint8_t> rgba((size_t)width * height * 4);
+    VCImage in, out;
+    in.data = nv21.data();
+    in.width = out.width = width;
+    in.height = out.height = height;
+    in.format = VC_FORMAT_NV21;
+    out.format = VC_FORMAT_RGBA;
+    in.wrapped = out.wrapped = 1;
+    out.data = rgba.data();
+    if (nv21.empty() || VCImage_convert(&in, &out) != 0) rgba.clear();
+    in.data = out.data = nullptr;
+    return rgba;
+}
+
+ExternalTextureDrawer::ExternalTextureDrawer(int width, int height)
+    : mWidth(width), mHeight(height) {
+    if (!GlTest_makeTarget(width, height, &mTarget)) return;
+    mProgram = new EglProgram();
+    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    if (mProgram->initialize(10, false) != 0) return;
+    mProgram->setCameraGeometry(width, height, 0, 0);
+    mProgram->setPreviewGeometry(width, height, false);
+    mOk = true;
+}
+
+ExternalTextureDrawer::~ExternalTextureDrawer() {
+    if (mProgram != nullptr) mProgram->release();
+    GlTest_deleteTarget(&mTarget);
+}
+
+std::vector<uint8_t> ExternalTextureDrawer::draw(GLuint texture) {
+    if (!mOk) return {};
+    glBindFramebuffer(GL_FRAMEBUFFER, mTarget.framebuffer);
+    glActiveTexture(GL_TEXTURE0);
+    glBindTexture(GL_TEXTURE_EXTERNAL_OES, texture);
+    glClearColor(0, 0, 0, 1);
+    glClear(GL_COLOR_BUFFER_BIT);
+    if (mProgram->onDrawFrame() != 0) return {};
+    return GlTest_readPixels(mWidth, mHeight);
+}
+
+int CameraFrames_maxDifference(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b) {
+    if (a.size() != b.size() || a.empty()) return 256;
+    int worst = 0;
+    for (size_t i = 0; i < a.size(); ++i) worst = std::max(worst, abs((int)a[i] - (int)b[i]));
+    return worst;
+}
