@@ -113,9 +113,7 @@ int VirtualCamera::start(double fps) {
     if (fps <= 0) return android::BAD_VALUE;
     std::lock_guard<std::mutex> guard(mLock);
     if (mThread.joinable()) return android::INVALID_OPERATION;
-    mStop = false;
-    mStalled = false;
-    mBurst = 0;
+    mStop = false;  // a stall or burst asked for before the start holds
     mThread = std::thread(&VirtualCamera::run, this, fps);
     return 0;
 }
