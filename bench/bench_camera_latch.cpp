@@ -103,16 +103,12 @@ public:
     }
 
     bool frame(const std::vector<unsigned char>& nv21) {
-        VCImage in, out;
-        in.data = const_cast<unsigned char*>(nv21.data());
-        out.data = mRgba.data();
-        in.width = out.width = kWidth;
-        in.height = out.height = kHeight;
-        in.format = VC_FORMAT_NV21;
-        out.format = VC_FORMAT_RGBA;
-        in.wrapped = out.wrapped = 1;
-        const bool converted = VCImage_convert(&in, &out) == 0;
-        in.data = out.data = nullptr;
+        VCImage* in = VCImage_createWrap(const_cast<unsigned char*>(nv21.data()), kWidth, kHeight,
+                                         VC_FORMAT_NV21, 0, 0);
+        VCImage* out = VCImage_createWrap(mRgba.data(), kWidth, kHeight, VC_FORMAT_RGBA, 0, 0);
+        const bool converted = VCImage_convert(in, out) == 0;
+        VCImage_destroy(in);
+        VCImage_destroy(out);
         static const GLfloat quad[] = {-1, -1, 0, 1, -1, 0, -1, 1, 0, 1, 1, 0};
         static const GLfloat uv[] = {0, 0, 1, 0, 0, 1, 1, 1};
         glActiveTexture(GL_TEXTURE0);
@@ -162,14 +158,10 @@ void BM_CameraLatch_Interleaved(benchmark::State& state) {
     std::vector<std::vector<unsigned char>> frames;
     for (int i = 0; ready && i < 4; ++i) {
         frames.emplace_back(VCImage_requiredSize(kWidth, kHeight, VC_FORMAT_NV21));
-        VCImage frame;
-        frame.data = frames.back().data();
-        frame.width = kWidth;
-        frame.height = kHeight;
-        frame.format = VC_FORMAT_NV21;
-        frame.wrapped = 1;
-        kivhost::VirtualCamera_generator(kWidth, kHeight)->render(i, &frame);
-        frame.data = nullptr;
+        VCImage* frame =
+            VCImage_createWrap(frames.back().data(), kWidth, kHeight, VC_FORMAT_NV21, 0, 0);
+        kivhost::VirtualCamera_generator(kWidth, kHeight)->render(i, frame);
+        VCImage_destroy(frame);
     }
     using Clock = std::chrono::steady_clock;
     uint64_t index = 0;

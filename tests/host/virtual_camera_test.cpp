@@ -21,6 +21,7 @@ extern "C" {
 #include "support/log_capture.h"
 #include "support/manual_clock.h"
 #include "support/temp_dir.h"
+#include "support/vc_image_handle.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
@@ -200,16 +201,11 @@ TEST(VirtualCameraTest, PicturesOfAFolderComeInTurnStretchedToTheCamera) {
         std::vector<uint8_t> nv21 = takeFrame(window);
         ASSERT_EQ(nv21.size(), 32u * 16 * 3 / 2);
         // Uniform: every luma and chroma sample is the colour's, converted once.
-        VCImage rgba, yuv;
         uint8_t rgbaPixels[2 * 2 * 4], yuvPixels[6];
         for (int p = 0; p < 4; ++p) std::copy_n(colours[i % 2], 4, rgbaPixels + p * 4);
-        rgba.data = rgbaPixels;
-        yuv.data = yuvPixels;
-        rgba.width = yuv.width = rgba.height = yuv.height = 2;
-        rgba.format = VC_FORMAT_RGBA;
-        yuv.format = VC_FORMAT_NV21;
-        rgba.wrapped = yuv.wrapped = 1;
-        ASSERT_EQ(VCImage_convert(&rgba, &yuv), 0);
+        VCImageHandle rgba(VCImage_createWrap(rgbaPixels, 2, 2, VC_FORMAT_RGBA, 0, 0));
+        VCImageHandle yuv(VCImage_createWrap(yuvPixels, 2, 2, VC_FORMAT_NV21, 0, 0));
+        ASSERT_EQ(VCImage_convert(rgba.get(), yuv.get()), 0);
         for (size_t b = 0; b < 32 * 16; ++b) ASSERT_EQ(nv21[b], yuvPixels[0]) << "picture " << i;
         for (size_t b = 32 * 16; b < nv21.size(); ++b) ASSERT_EQ(nv21[b], yuvPixels[4 + b % 2]);
     }

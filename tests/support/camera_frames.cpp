@@ -6,35 +6,23 @@
 
 #include "core/egl/EglProgram.h"
 #include "kivhost/VirtualCamera.h"
+#include "support/vc_image_handle.h"
 #include "vccore/vc_convert.h"
 
 std::vector<uint8_t> CameraFrames_nv21(uint64_t index, int width, int height) {
     std::vector<uint8_t> nv21(VCImage_requiredSize(width, height, VC_FORMAT_NV21));
-    VCImage frame;
-    frame.data = nv21.data();
-    frame.width = width;
-    frame.height = height;
-    frame.format = VC_FORMAT_NV21;
-    frame.wrapped = 1;
+    VCImageHandle frame(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
     auto generator = kivhost::VirtualCamera_generator(width, height);
-    if (generator == nullptr || !generator->render(index, &frame)) nv21.clear();
-    frame.data = nullptr;
+    if (generator == nullptr || !generator->render(index, frame.get())) nv21.clear();
     return nv21;
 }
 
 std::vector<uint8_t> CameraFrames_rgba(uint64_t index, int width, int height) {
     std::vector<uint8_t> nv21 = CameraFrames_nv21(index, width, height);
     std::vector<uint8_t> rgba((size_t)width * height * 4);
-    VCImage in, out;
-    in.data = nv21.data();
-    in.width = out.width = width;
-    in.height = out.height = height;
-    in.format = VC_FORMAT_NV21;
-    out.format = VC_FORMAT_RGBA;
-    in.wrapped = out.wrapped = 1;
-    out.data = rgba.data();
-    if (nv21.empty() || VCImage_convert(&in, &out) != 0) rgba.clear();
-    in.data = out.data = nullptr;
+    VCImageHandle in(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
+    VCImageHandle out(VCImage_createWrap(rgba.data(), width, height, VC_FORMAT_RGBA, 0, 0));
+    if (nv21.empty() || VCImage_convert(in.get(), out.get()) != 0) rgba.clear();
     return rgba;
 }
 
