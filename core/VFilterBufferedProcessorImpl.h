@@ -17,6 +17,7 @@
 #include <functional>
 
 #include "vccore/vc_image.h"
+#include "vccore/vc_picture.h"
 
 #include "core/VFilterBufferedProcessor.h"
 
@@ -79,6 +80,27 @@ public:
     // returns.
     FileStatus processFilePath(const char* inputPath,
                                const std::function<const char*()>& outputPath);
+
+    // What processStream encodes: a JPEG at `quality`, or a straight-alpha PNG.
+    struct StreamOutput {
+        bool png;
+        int quality;
+    };
+    // Runs the current effect over a JPEG or PNG picture held in memory and
+    // encodes the result, a band of rows at a time on three threads
+    // (KivBandPipeline), so that memory stays small whatever the picture's
+    // size. The stream is byte for byte the whole-picture path's: the
+    // picture decoded to RGBA, drawn by doProcessRGBA and encoded (or, with
+    // `throughNv21`, decoded to NV21 and drawn by doProcessNV21 as
+    // processFile does). 0 with the malloc'ed stream; VC_ERROR_UNSUPPORTED
+    // when this picture cannot stream here (larger than a texture, odd sizes
+    // through NV21, no GPU memory the CPU reaches), with nothing done, so the
+    // whole-picture path serves; VC_ERROR_CODEC_FAILED when it does not
+    // decode (*why says why) or encode; -7 when the context or the program
+    // cannot be made.
+    int processStream(const unsigned char* bytes, size_t length, bool throughNv21,
+                      const StreamOutput& output, unsigned char** stream, size_t* streamLength,
+                      VCDecodeFailure* why);
 
     // Makes the context current and builds the program with the current effect
     // (and, on msm8974, enables 8K textures). 0 or -7.

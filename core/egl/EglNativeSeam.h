@@ -10,13 +10,35 @@
 
 #include <EGL/egl.h>
 #include <EGL/eglext.h>
+#include <GLES2/gl2.h>
+#include <stddef.h>
 
+#include <memory>
 #include <string>
 
 struct ANativeWindow;
 namespace android {
 class GraphicBuffer;
 }
+
+// A picture-sized RGBA GL_TEXTURE_2D of the current context whose storage
+// the CPU reaches directly, so that a picture can cross a band of rows at a
+// time: the CPU writes rows the GPU samples later, or reads rows the GPU has
+// rendered (after a glFinish), without a GL transfer. Memory is only taken
+// by rows that are touched, and rows below a point can be given back.
+// Created and destroyed with its context current.
+class EglSharedPicture {
+public:
+    virtual ~EglSharedPicture() = default;
+    virtual GLuint texture() const = 0;
+    // Row `y` (row 0 is the first of the picture and of GL's rows);
+    // rows are pitch() bytes apart.
+    virtual unsigned char* row(int y) const = 0;
+    virtual size_t pitch() const = 0;
+    // Rows [0, y) will not be used again: their memory may be given back
+    // (they then read as zeros).
+    virtual void discardRowsBelow(int y) = 0;
+};
 
 class EglNativeSeam {
 public:
@@ -52,6 +74,10 @@ public:
     // host whose mediump float is 16-bit (and slow) compiles it with highp.
     // An adapted text lives in *storage.
     virtual const char* shaderText(unsigned int type, const char* source, std::string* storage) = 0;
+
+    // With a context current: a shared picture, or null where the GL cannot
+    // take CPU memory as texture storage (callers then copy through GL).
+    virtual std::unique_ptr<EglSharedPicture> createSharedPicture(int width, int height) = 0;
 };
 
 #endif

@@ -23,6 +23,7 @@
 #include "core/egl/EglNativeSeam.h"
 #include "HostGl.h"
 #include "ShaderPrecision.h"
+#include "SharedPixels.h"
 #include "vccore/vc_log.h"
 
 namespace {
@@ -39,6 +40,25 @@ EGLSurface createPbuffer(EGLDisplay display, EGLConfig config, int width, int he
     const EGLint attribs[] = {EGL_WIDTH, width, EGL_HEIGHT, height, EGL_NONE};
     return eglCreatePbufferSurface(display, config, attribs);
 }
+
+// A texture of the current context on a memory file the CPU keeps mapped.
+class HostSharedPicture : public EglSharedPicture {
+public:
+    ~HostSharedPicture() override { android::SharedPixels::deleteImported(mTexture, mMemory); }
+    bool make(int width, int height) {
+        return mPixels.allocate((uint32_t)width, (uint32_t)height) &&
+               (mTexture = mPixels.importTexture(&mMemory)) != 0;
+    }
+    GLuint texture() const override { return mTexture; }
+    unsigned char* row(int y) const override { return mPixels.pixels() + (size_t)y * pitch(); }
+    size_t pitch() const override { return android::SharedPixels::rowPitch(mPixels.width()); }
+    void discardRowsBelow(int y) override { mPixels.discardBelow((size_t)y * pitch()); }
+
+private:
+    android::SharedPixels mPixels;
+    GLuint mTexture = 0;
+    GLuint mMemory = 0;
+};
 
 class HostEglNativeSeam : public EglNativeSeam {
 public:
@@ -174,6 +194,14 @@ public:
         return android::ShaderPrecision_promotes(type)
                    ? android::ShaderPrecision_highp(source, storage)
                    : source;
+    }
+
+    std::unique_ptr<EglSharedPicture> createSharedPicture(int width, int height) override {
+        if (width < 1 || height < 1) return nullptr;
+        std::unique_ptr<HostSharedPicture> picture(new HostSharedPicture());
+        if (!picture->make(width, height)) return nullptr;
+        glBindTexture(GL_TEXTURE_2D, 0);
+        return std::unique_ptr<EglSharedPicture>(picture.release());
     }
 
 private:

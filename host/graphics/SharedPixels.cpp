@@ -1,6 +1,7 @@
 #include "host/graphics/SharedPixels.h"
 
 #include <fcntl.h>
+#include <linux/falloc.h>
 #include <string.h>
 #include <sys/mman.h>
 #include <unistd.h>
@@ -125,6 +126,19 @@ bool SharedPixels::allocate(uint32_t width, uint32_t height) {
     return true;
 }
 
+void SharedPixels::discardBelow(size_t bytes) {
+    if (mPixels == nullptr) return;
+    const size_t page = (size_t)sysconf(_SC_PAGESIZE);
+    const size_t start = (size_t)(mPixels - static_cast<unsigned char*>(mMapping));
+    // Pixels start on a page; only pages wholly below the point go.
+    const size_t end = bytes / page * page;
+    if (end <= mDiscarded) return;
+    if (fallocate(mFd, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, (off_t)(start + mDiscarded),
+                  (off_t)(end - mDiscarded)) == 0) {
+        mDiscarded = end;
+    }
+}
+
 void SharedPixels::free() {
     if (mMapping != nullptr) munmap(mMapping, mFileSize);
     if (mFd >= 0) close(mFd);
@@ -133,6 +147,7 @@ void SharedPixels::free() {
     mFileSize = 0;
     mPixels = nullptr;
     mWidth = mHeight = 0;
+    mDiscarded = 0;
 }
 
 bool SharedPixels::mayImport() {

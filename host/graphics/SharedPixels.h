@@ -32,6 +32,11 @@ public:
     uint32_t height() const { return mHeight; }
     bool empty() const { return mPixels == nullptr; }
 
+    // Gives back the memory of the first `bytes` bytes of pixels (whole
+    // pages only; they read as zeros after). Cumulative: a call that reaches
+    // less far than an earlier one does nothing.
+    void discardBelow(size_t bytes);
+
     // With a context current: an RGBA texture whose storage is this memory,
     // left bound; 0 when the driver does not take it
     // (tried once per process on a small texture first, whose rows must land
@@ -54,6 +59,7 @@ private:
     GLuint import(GLuint* memoryObject) const;
     static bool probe();
 
+    size_t mDiscarded = 0;  // pixel bytes given back so far (whole pages)
     int mFd = -1;
     void* mMapping = nullptr;
     size_t mFileSize = 0;

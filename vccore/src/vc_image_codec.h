@@ -78,6 +78,23 @@ void VCPicture_setLastFailure(VCDecodeFailure failure);
 // caller has checked the image, its pixels and the quality (1…100).
 VCImage* VCJpeg_encode(const VCImage* image, int quality);
 
+// An encoder fed RGBA rows as they come (the stream writers of vc_stream.h).
+class VCStreamEncoder {
+public:
+    virtual ~VCStreamEncoder() = default;
+    // The next `rows` rows, `pitch` bytes apart; false on failure or past the
+    // picture's last row.
+    virtual bool writeRows(const unsigned char* rgba, size_t pitch, int rows) = 0;
+    // After the last row: the malloc'ed stream, or null.
+    virtual unsigned char* finish(size_t* length) = 0;
+};
+
+// The stream VCJpeg_encode makes of an "RGBA" image (quality 1...100), or of
+// a straight-alpha PNG as VCPicture_encodePng makes it; null when the
+// encoder cannot start.
+std::unique_ptr<VCStreamEncoder> VCJpegEncoder_create(int width, int height, int quality);
+std::unique_ptr<VCStreamEncoder> VCPngEncoder_create(int width, int height);
+
 // Writes premultiplied RGBA pixels to a PNG file with straight alpha; false
 // on any failure (not logged).
 bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height);

@@ -195,12 +195,6 @@ void flushSink(png_structp png) {
     if (sink->file != nullptr && fflush(sink->file) != 0) png_error(png, "write failed");
 }
 
-struct PngWriteState {
-    png_structp png;
-    png_infop info;
-    unsigned char* row;
-};
-
 // Straight alpha from premultiplied: c·255/a rounded, capped at 255; fully
 // transparent pixels carry no colour.
 void unpremultiplyRow(const unsigned char* from, unsigned char* to, png_uint_32 width) {
@@ -220,41 +214,82 @@ void unpremultiplyRow(const unsigned char* from, unsigned char* to, png_uint_32 
     }
 }
 
-bool writeRows(PngWriteState* state, PngSink* sink, const unsigned char* rgba, png_uint_32 width,
-               png_uint_32 height, bool premultiplied) {
-    if (setjmp(png_jmpbuf(state->png))) return false;
-    png_set_write_fn(state->png, sink, writeToSink, flushSink);
-    png_set_IHDR(state->png, state->info, width, height, 8, PNG_COLOR_TYPE_RGB_ALPHA,
-                 PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
-    png_write_info(state->png, state->info);
-    size_t stride = static_cast<size_t>(width) * 4;
-    for (png_uint_32 y = 0; y < height; ++y) {
-        const unsigned char* row = rgba + y * stride;
-        if (premultiplied) {
-            unpremultiplyRow(row, state->row, width);
-            row = state->row;
-        }
-        png_write_row(state->png, row);
+// A straight-alpha PNG written row by row into a sink; each call into libpng
+// sits in a function of its own with its own setjmp.
+class PngWriter : public VCStreamEncoder {
+public:
+    PngWriter(int width, int height, bool premultiplied)
+        : mWidth(static_cast<png_uint_32>(width)),
+          mHeight(static_cast<png_uint_32>(height)),
+          mPremultiplied(premultiplied) {
+        if (width < 1 || height < 1) return;
+        mRow = static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4));
+        mPng = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
+        if (mPng != nullptr) mInfo = png_create_info_struct(mPng);
     }
-    png_write_end(state->png, nullptr);
-    return true;
-}
+    ~PngWriter() override {
+        if (mPng != nullptr) png_destroy_write_struct(&mPng, mInfo != nullptr ? &mInfo : nullptr);
+        free(mRow);
+        free(mSink.bytes);
+    }
 
-// RGBA pixels (premultiplied or straight) as a straight-alpha PNG into the sink.
-bool writePng(PngSink* sink, const unsigned char* rgba, int width, int height, bool premultiplied) {
-    if (rgba == nullptr || width < 1 || height < 1) return false;
-    PngWriteState state = {nullptr, nullptr, nullptr};
-    state.row = static_cast<unsigned char*>(malloc(static_cast<size_t>(width) * 4));
-    state.png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, onPngError, onPngWarning);
-    if (state.png != nullptr) state.info = png_create_info_struct(state.png);
-    bool ok = state.row != nullptr && state.info != nullptr &&
-              writeRows(&state, sink, rgba, static_cast<png_uint_32>(width),
-                        static_cast<png_uint_32>(height), premultiplied);
-    if (state.png != nullptr)
-        png_destroy_write_struct(&state.png, state.info != nullptr ? &state.info : nullptr);
-    free(state.row);
-    return ok;
-}
+    // Where the stream goes: `file`, or (null) a growing buffer.
+    bool begin(FILE* file) {
+        if (mRow == nullptr || mInfo == nullptr) return false;
+        mSink.file = file;
+        if (setjmp(png_jmpbuf(mPng))) return false;
+        png_set_write_fn(mPng, &mSink, writeToSink, flushSink);
+        png_set_IHDR(mPng, mInfo, mWidth, mHeight, 8, PNG_COLOR_TYPE_RGB_ALPHA, PNG_INTERLACE_NONE,
+                     PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
+        png_write_info(mPng, mInfo);
+        return mStarted = true;
+    }
+
+    bool writeRows(const unsigned char* rgba, size_t pitch, int rows) override {
+        if (!mStarted || rows < 0 || static_cast<png_uint_32>(rows) > mHeight - mWritten)
+            return false;
+        if (setjmp(png_jmpbuf(mPng))) return mStarted = false;
+        for (int i = 0; i < rows; ++i) {
+            const unsigned char* row = rgba + i * pitch;
+            if (mPremultiplied) {
+                unpremultiplyRow(row, mRow, mWidth);
+                row = mRow;
+            }
+            png_write_row(mPng, row);
+        }
+        mWritten += static_cast<png_uint_32>(rows);
+        return true;
+    }
+
+    bool end() {
+        if (!mStarted || mWritten != mHeight) return false;
+        if (setjmp(png_jmpbuf(mPng))) return false;
+        png_write_end(mPng, nullptr);
+        return true;
+    }
+
+    unsigned char* finish(size_t* length) override {
+        if (!end() || mSink.length == 0) return nullptr;
+        unsigned char* bytes = mSink.bytes;
+        *length = mSink.length;
+        mSink.bytes = nullptr;
+        return bytes;
+    }
+
+    PngWriter(const PngWriter&) = delete;
+    PngWriter& operator=(const PngWriter&) = delete;
+
+private:
+    png_uint_32 mWidth;
+    png_uint_32 mHeight;
+    bool mPremultiplied;
+    unsigned char* mRow = nullptr;
+    png_structp mPng = nullptr;
+    png_infop mInfo = nullptr;
+    PngSink mSink;
+    png_uint_32 mWritten = 0;
+    bool mStarted = false;
+};
 
 }  // namespace
 
@@ -262,14 +297,24 @@ std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, 
     return std::unique_ptr<VCPictureReader>(new PngReader(bytes, length));
 }
 
+std::unique_ptr<VCStreamEncoder> VCPngEncoder_create(int width, int height) {
+    std::unique_ptr<PngWriter> writer(new PngWriter(width, height, false));
+    if (!writer->begin(nullptr)) return nullptr;
+    return std::unique_ptr<VCStreamEncoder>(writer.release());
+}
+
 bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height) {
-    if (path == nullptr) return false;
-    PngSink sink;
-    sink.file = fopen(path, "wb");
-    if (sink.file == nullptr) return false;
-    bool ok = writePng(&sink, rgba, width, height, true);
-    if (ferror(sink.file)) ok = false;
-    if (fclose(sink.file) != 0) ok = false;
+    if (path == nullptr || rgba == nullptr || width < 1 || height < 1) return false;
+    FILE* file = fopen(path, "wb");
+    if (file == nullptr) return false;
+    bool ok;
+    {
+        PngWriter writer(width, height, true);
+        ok = writer.begin(file) && writer.writeRows(rgba, static_cast<size_t>(width) * 4, height) &&
+             writer.end();
+    }
+    if (ferror(file)) ok = false;
+    if (fclose(file) != 0) ok = false;
     return ok;
 }
 
@@ -279,11 +324,9 @@ extern "C" unsigned char* VCPicture_encodePng(const VCImage* image, size_t* leng
         return nullptr;
     uint32_t required = VCImage_requiredSize(image->width, image->height, VC_FORMAT_RGBA);
     if (required == 0 || VCImage_size(image) < required) return nullptr;
-    PngSink sink;
-    if (!writePng(&sink, image->data, image->width, image->height, false) || sink.length == 0) {
-        free(sink.bytes);
+    PngWriter writer(image->width, image->height, false);
+    if (!writer.begin(nullptr) ||
+        !writer.writeRows(image->data, static_cast<size_t>(image->width) * 4, image->height))
         return nullptr;
-    }
-    *length = sink.length;
-    return sink.bytes;
+    return writer.finish(length);
 }

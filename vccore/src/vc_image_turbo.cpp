@@ -200,6 +200,121 @@ private:
     bool mCmyk = false;
 };
 
+// RGBA rows into a 4:2:0 JPEG through libjpeg's scanline interface, with the
+// settings TurboJPEG takes for an RGBA picture (tjCompress2), so the stream
+// is the one VCJpeg_encode makes of the whole picture.
+class JpegWriter : public VCStreamEncoder {
+public:
+    JpegWriter() {
+        mDestination.init_destination = [](j_compress_ptr info) { self(info)->grow(); };
+        mDestination.empty_output_buffer = [](j_compress_ptr info) -> boolean {
+            self(info)->mLength = self(info)->mCapacity;
+            return self(info)->grow() ? TRUE : FALSE;
+        };
+        mDestination.term_destination = [](j_compress_ptr info) {
+            JpegWriter* w = self(info);
+            w->mLength = w->mCapacity - w->mDestination.free_in_buffer;
+        };
+        mInfo.err = jpeg_std_error(&mError);
+        mError.output_message = [](j_common_ptr) {};
+        mError.error_exit = [](j_common_ptr info) {
+            longjmp(reinterpret_cast<JpegWriter*>(info->client_data)->mJump, 1);
+        };
+        mInfo.client_data = this;
+    }
+    ~JpegWriter() override {
+        if (mCreated) jpeg_destroy_compress(&mInfo);
+        free(mStream);
+    }
+
+    bool begin(int width, int height, int quality) {
+        if (setjmp(mJump)) return false;
+        jpeg_create_compress(&mInfo);
+        mCreated = true;
+        mInfo.dest = &mDestination;
+        mInfo.image_width = static_cast<JDIMENSION>(width);
+        mInfo.image_height = static_cast<JDIMENSION>(height);
+        mInfo.in_color_space = JCS_EXT_RGBA;
+        mInfo.input_components = 4;
+        jpeg_set_defaults(&mInfo);
+        jpeg_set_quality(&mInfo, quality, TRUE);
+        // TurboJPEG's choice: the accurate DCT from quality 96 up.
+        mInfo.dct_method = quality >= 96 ? JDCT_ISLOW : JDCT_FASTEST;
+        jpeg_set_colorspace(&mInfo, JCS_YCbCr);
+        mInfo.comp_info[0].h_samp_factor = 2;
+        mInfo.comp_info[0].v_samp_factor = 2;
+        for (int c = 1; c < 3; ++c) {
+            mInfo.comp_info[c].h_samp_factor = 1;
+            mInfo.comp_info[c].v_samp_factor = 1;
+        }
+        jpeg_start_compress(&mInfo, TRUE);
+        return mStarted = true;
+    }
+
+    bool writeRows(const unsigned char* rgba, size_t pitch, int rows) override {
+        if (!mStarted || rows < 0 ||
+            static_cast<JDIMENSION>(rows) > mInfo.image_height - mInfo.next_scanline)
+            return false;
+        JSAMPROW pointers[kRowsPerCall];
+        if (setjmp(mJump)) return mStarted = false;
+        for (int done = 0; done < rows;) {
+            int n = rows - done < kRowsPerCall ? rows - done : kRowsPerCall;
+            for (int i = 0; i < n; ++i)
+                pointers[i] = const_cast<JSAMPROW>(rgba + static_cast<size_t>(done + i) * pitch);
+            done += static_cast<int>(
+                jpeg_write_scanlines(&mInfo, pointers, static_cast<JDIMENSION>(n)));
+        }
+        return true;
+    }
+
+    unsigned char* finish(size_t* length) override {
+        if (!mStarted || mInfo.next_scanline != mInfo.image_height || !end()) return nullptr;
+        unsigned char* stream = mStream;
+        *length = mLength;
+        mStream = nullptr;
+        return stream;
+    }
+
+    JpegWriter(const JpegWriter&) = delete;
+    JpegWriter& operator=(const JpegWriter&) = delete;
+
+private:
+    static constexpr int kRowsPerCall = 16;
+
+    static JpegWriter* self(j_compress_ptr info) {
+        return reinterpret_cast<JpegWriter*>(info->client_data);
+    }
+
+    // Room after the first mLength bytes: the buffer doubles (a failure to
+    // grow stops the encoder through its error exit).
+    bool grow() {
+        size_t capacity = mCapacity == 0 ? 1 << 16 : mCapacity * 2;
+        unsigned char* grown = static_cast<unsigned char*>(realloc(mStream, capacity));
+        if (grown == nullptr) ERREXIT1(&mInfo, JERR_OUT_OF_MEMORY, 0);
+        mStream = grown;
+        mCapacity = capacity;
+        mDestination.next_output_byte = mStream + mLength;
+        mDestination.free_in_buffer = mCapacity - mLength;
+        return true;
+    }
+
+    bool end() {
+        if (setjmp(mJump)) return false;
+        jpeg_finish_compress(&mInfo);
+        return mLength > 0;
+    }
+
+    jpeg_compress_struct mInfo{};
+    jpeg_error_mgr mError{};
+    jpeg_destination_mgr mDestination{};
+    jmp_buf mJump;
+    unsigned char* mStream = nullptr;
+    size_t mLength = 0;
+    size_t mCapacity = 0;
+    bool mCreated = false;
+    bool mStarted = false;
+};
+
 // TurboJPEG pixel format of an RGB-family or grey image, -1 otherwise.
 int turboPixelFormat(uint32_t format) {
     switch (format) {
@@ -316,6 +431,12 @@ int encode422(tjhandle turbo, const VCImage* image, int quality, Output* out) {
 
 std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length) {
     return std::unique_ptr<VCPictureReader>(new JpegReader(bytes, length));
+}
+
+std::unique_ptr<VCStreamEncoder> VCJpegEncoder_create(int width, int height, int quality) {
+    std::unique_ptr<JpegWriter> writer(new JpegWriter());
+    if (width < 1 || height < 1 || !writer->begin(width, height, quality)) return nullptr;
+    return std::unique_ptr<VCStreamEncoder>(writer.release());
 }
 
 VCImage* VCJpeg_encode(const VCImage* image, int quality) {

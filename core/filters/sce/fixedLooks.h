@@ -2,10 +2,27 @@
 #ifndef KIV_CORE_FILTERS_SCE_FIXEDLOOKS_H
 #define KIV_CORE_FILTERS_SCE_FIXEDLOOKS_H
 
+#include <math.h>
+
+#include "core/KivPixelReach.h"
 #include "core/filters/sce/singleCameraEffects.h"
 
+// A fixed look reads the camera texel under its pixel (and the pixel's
+// position) only, unless it says otherwise.
+class FixedLook : public SingleCameraEffects, public KivPixelReachSource {
+public:
+    KivPixelReach pixelReach(int, int) const override { return {KivPixelReach::SAME_PIXEL, 0}; }
+};
+
+// Comic and GothicNoir compare each texel with neighbours 0.002 of the
+// picture up and to the left: that many rows, and one more that linear
+// filtering blends in.
+inline KivPixelReach KivEdgeLookReach(int height) {
+    return {KivPixelReach::NEIGHBOURS, (int)ceil(0.002 * height) + 1};
+}
+
 // Pass-through: copies the texel. The fallback of every processor.
-class NoEffect : public SingleCameraEffects {
+class NoEffect : public FixedLook {
 public:
     static const int kType = 400;
     int getFilterType() const override { return kType; }
@@ -13,7 +30,7 @@ public:
 };
 
 // The classic sepia matrix, each channel clamped at 1, alpha kept.
-class Sepia : public SingleCameraEffects {
+class Sepia : public FixedLook {
 public:
     static const int kType = 401;
     int getFilterType() const override { return kType; }
@@ -21,7 +38,7 @@ public:
 };
 
 // Luma with weights 0.299, 0.587, 0.114; alpha kept.
-class Grayscale : public SingleCameraEffects {
+class Grayscale : public FixedLook {
 public:
     static const int kType = 402;
     int getFilterType() const override { return kType; }
@@ -29,7 +46,7 @@ public:
 };
 
 // Inverted RGB, alpha kept.
-class Negative : public SingleCameraEffects {
+class Negative : public FixedLook {
 public:
     static const int kType = 403;
     int getFilterType() const override { return kType; }
@@ -37,7 +54,7 @@ public:
 };
 
 // A fixed linear fade with step 64: per channel c * (1 - k*64) + m*64/256; opaque.
-class FadedColor : public SingleCameraEffects {
+class FadedColor : public FixedLook {
 public:
     static const int kType = 408;
     int getFilterType() const override { return kType; }
@@ -46,24 +63,26 @@ public:
 
 // Luma posterised in 6 levels after a 2x2 average, darkened by a wrinkle term, mixed with a
 // paper intensity, rebuilt with chroma scaled by 0.8; strong edges go black.
-class Comic : public SingleCameraEffects {
+class Comic : public FixedLook {
 public:
     static const int kType = 410;
     int getFilterType() const override { return kType; }
     const char* getFragmentShader() const override;
+    KivPixelReach pixelReach(int, int height) const override { return KivEdgeLookReach(height); }
 };
 
 // Grey only: 5 luma levels, black edges, lowered contrast and a radial darkening.
-class GothicNoir : public SingleCameraEffects {
+class GothicNoir : public FixedLook {
 public:
     static const int kType = 412;
     int getFilterType() const override { return kType; }
     const char* getFragmentShader() const override;
+    KivPixelReach pixelReach(int, int height) const override { return KivEdgeLookReach(height); }
 };
 
 // Three corner tints (red, yellow, blue) weighted by closeness; the sum may exceed 1 and
 // is clamped by the target.
-class Rainbow : public SingleCameraEffects {
+class Rainbow : public FixedLook {
 public:
     static const int kType = 415;
     int getFilterType() const override { return kType; }
@@ -71,7 +90,7 @@ public:
 };
 
 // 70% image, 30% of a constant blue-grey.
-class InstagramNashville : public SingleCameraEffects {
+class InstagramNashville : public FixedLook {
 public:
     static const int kType = 416;
     int getFilterType() const override { return kType; }
@@ -79,7 +98,7 @@ public:
 };
 
 // Darkens with the distance from the centre between 0.3 and 0.7.
-class Vignette : public SingleCameraEffects {
+class Vignette : public FixedLook {
 public:
     static const int kType = 422;
     int getFilterType() const override { return kType; }
@@ -87,7 +106,7 @@ public:
 };
 
 // Mean of RGB inside [0.3, 0.8] gives white, outside black; opaque.
-class BW : public SingleCameraEffects {
+class BW : public FixedLook {
 public:
     static const int kType = 440;
     int getFilterType() const override { return kType; }
@@ -95,7 +114,7 @@ public:
 };
 
 // Four levels per channel (floor(c*4)/3, so 1.0 gives 4/3, clamped by the target); opaque.
-class Posterize : public SingleCameraEffects {
+class Posterize : public FixedLook {
 public:
     static const int kType = 442;
     int getFilterType() const override { return kType; }
@@ -103,7 +122,7 @@ public:
 };
 
 // Mean of RGB mapped through blue, yellow, red; opaque.
-class ThermalVision : public SingleCameraEffects {
+class ThermalVision : public FixedLook {
 public:
     static const int kType = 443;
     int getFilterType() const override { return kType; }

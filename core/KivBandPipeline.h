@@ -1,0 +1,93 @@
+// One picture through one effect a band of rows at a time: decoded, drawn
+// and encoded on three threads at once, so that memory stays a few bands
+// whatever the picture's size and every core has work.
+//
+// The source and the target are picture-sized shared pictures (EglNativeSeam)
+// of which only the rows in flight hold memory. Every band is drawn with the
+// whole picture's geometry and a scissor around the band, so each pixel is
+// computed exactly as one draw of the whole picture computes it (GL
+// interpolates from the framebuffer's origin: a band drawn as a picture of
+// its own would round differently). The source keeps the rows a band reads
+// beyond its own (the effect's reach) until every band that reads them is
+// drawn.
+//
+//   decoder thread:  reader -> rows of the source (through NV21 and back when
+//                    asked, as a picture decoded to NV21 reaches the GPU)
+//   GL thread:       per band, once its source rows are there: draw, finish
+//   encoder thread:  rows of the target -> writer, then their memory goes
+#ifndef KIV_CORE_KIVBANDPIPELINE_H
+#define KIV_CORE_KIVBANDPIPELINE_H
+
+#include <GLES2/gl2.h>
+
+#include <condition_variable>
+#include <mutex>
+#include <vector>
+
+#include "vccore/vc_stream.h"
+
+class EglProgram;
+class EglSharedPicture;
+
+class KivBandPipeline {
+public:
+    struct Picture {
+        int width;
+        int height;
+        // Rows beyond a band's own that its pixels read, above and below;
+        // `height` for effects that may read anywhere.
+        int haloRows;
+        // Source rows cross RGBA -> NV21 -> RGBA (even sizes only).
+        bool throughNv21;
+    };
+
+    // `program` draws the effect from the source (bound as the current
+    // external texture) into `framebuffer`, whose colour buffer is `target`.
+    KivBandPipeline(EglProgram& program, EglSharedPicture& source, EglSharedPicture& target,
+                    const Picture& picture);
+
+    // On the thread whose context holds the GL objects. 0; or
+    // VC_ERROR_CODEC_FAILED when the picture did not decode (the reader says
+    // why) or did not encode; VC_ERROR_UNKNOWN when a draw failed;
+    // VC_ERROR_ALLOC_FAILED without memory for a band.
+    int run(VCStreamReader* reader, VCStreamWriter* writer);
+
+    // Rows per drawn band for a picture `width` pixels wide: about four
+    // megabytes of RGBA, in whole llvmpipe tiles (64 rows).
+    static int bandRows(int width);
+    // For tests: bands of `rows` rows (a multiple of 64) whatever the width;
+    // 0 goes back to bandRows().
+    static void setBandRowsForTesting(int rows);
+
+    KivBandPipeline(const KivBandPipeline&) = delete;
+    KivBandPipeline& operator=(const KivBandPipeline&) = delete;
+
+private:
+    static int onDecoded(void* self, const unsigned char* rgba, int first, int rows);
+    int storeRows(const unsigned char* rgba, int first, int rows);
+    void decode(VCStreamReader* reader);
+    void encode(VCStreamWriter* writer);
+    int draw();
+    // Records the first failure and wakes every stage.
+    void fail(int status);
+
+    EglProgram& mProgram;
+    EglSharedPicture& mSource;
+    EglSharedPicture& mTarget;
+    const Picture mPicture;
+    const int mBandRows;
+
+    // The decoder thread's band scratch (NV21, and RGBA where the source's
+    // rows are padded).
+    std::vector<unsigned char> mNv21;
+    std::vector<unsigned char> mRgba;
+
+    std::mutex mLock;
+    std::condition_variable mChanged;
+    int mDecoded = 0;  // source rows written
+    int mDrawn = 0;    // target rows finished
+    int mEncoded = 0;  // target rows encoded
+    int mStatus = 0;   // the first failure
+};
+
+#endif

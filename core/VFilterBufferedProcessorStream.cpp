@@ -1,0 +1,159 @@
+// The buffered processor's streamed path for pictures held as files: the
+// same effect and the same bytes as the whole-picture path, a band at a time.
+#include <GLES2/gl2.h>
+#include <GLES2/gl2ext.h>
+#include <stdint.h>
+
+#include <memory>
+
+#include "core/KivBandPipeline.h"
+#include "core/KivPixelReach.h"
+#include "core/VFilterBufferedProcessorImpl.h"
+#include "core/egl/EglCheck.h"
+#include "core/egl/EglEnvironment.h"
+#include "core/egl/EglExtensions.h"
+#include "core/egl/EglNativeSeam.h"
+#include "core/egl/EglProgram.h"
+#include "core/egl/Platform.h"
+#include "vccore/vc_error.h"
+#include "vccore/vc_log.h"
+#include "vccore/vc_stream.h"
+
+#define VC_SOURCE "core/VFilterBufferedProcessorStream"
+
+namespace {
+
+// Rows a band needs beyond its own: what the effect reads, plus the row on
+// each side that linear filtering touches (with no weight) at the edges.
+int haloRows(const KivPixelReach& reach, int height) {
+    switch (reach.kind) {
+        case KivPixelReach::SAME_PIXEL:
+            return 2;
+        case KivPixelReach::NEIGHBOURS:
+            return reach.haloRows + 2;
+        default:
+            return height;
+    }
+}
+
+// The GL objects of one streamed picture, made and deleted with the context
+// current: the source as an external texture (an EGL image of its 2D
+// texture, as the GPU sees every camera picture) and the target in a
+// framebuffer.
+class StreamObjects {
+public:
+    explicit StreamObjects(EGLDisplay display) : mDisplay(display) {}
+    ~StreamObjects() {
+        if (mFramebuffer != 0) {
+            glBindFramebuffer(GL_FRAMEBUFFER, 0);
+            glDeleteFramebuffers(1, &mFramebuffer);
+        }
+        if (mExternal != 0) {
+            glBindTexture(GL_TEXTURE_EXTERNAL_OES, 0);
+            glDeleteTextures(1, &mExternal);
+        }
+        if (mImage != EGL_NO_IMAGE_KHR) EglExtensions::get().eglDestroyImageKHR(mDisplay, mImage);
+    }
+
+    bool make(int width, int height) {
+        EglNativeSeam& seam = EglNativeSeam::get();
+        source = seam.createSharedPicture(width, height);
+        target = seam.createSharedPicture(width, height);
+        return source != nullptr && target != nullptr;
+    }
+
+    // Sampled linear and clamped, as the whole picture's external image is.
+    bool bind() {
+        const EglExtensions& ext = EglExtensions::get();
+        glBindTexture(GL_TEXTURE_2D, source->texture());
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+        glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+        glBindTexture(GL_TEXTURE_2D, 0);
+        const EGLint attribs[] = {EGL_GL_TEXTURE_LEVEL_KHR, 0, EGL_IMAGE_PRESERVED_KHR, EGL_TRUE,
+                                  EGL_NONE};
+        mImage = ext.eglCreateImageKHR(mDisplay, eglGetCurrentContext(), EGL_GL_TEXTURE_2D_KHR,
+                                       (EGLClientBuffer)(uintptr_t)source->texture(), attribs);
+        if (mImage == EGL_NO_IMAGE_KHR) return false;
+        glGenTextures(1, &mExternal);
+        glActiveTexture(GL_TEXTURE0);
+        glBindTexture(GL_TEXTURE_EXTERNAL_OES, mExternal);
+        glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
+        glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+        glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+        glTexParameteri(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+        ext.glEGLImageTargetTexture2DOES(GL_TEXTURE_EXTERNAL_OES, (GLeglImageOES)mImage);
+        glGenFramebuffers(1, &mFramebuffer);
+        glBindFramebuffer(GL_FRAMEBUFFER, mFramebuffer);
+        glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D,
+                               target->texture(), 0);
+        return glCheckFramebufferStatus(GL_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE &&
+               glGetError() == GL_NO_ERROR;
+    }
+
+    // Declared first, so deleted last, after what is made over them.
+    std::unique_ptr<EglSharedPicture> source;
+    std::unique_ptr<EglSharedPicture> target;
+
+private:
+    EGLDisplay mDisplay;
+    EGLImageKHR mImage = EGL_NO_IMAGE_KHR;
+    GLuint mExternal = 0;
+    GLuint mFramebuffer = 0;
+};
+
+struct ReaderCloser {
+    void operator()(VCStreamReader* r) const { VCStreamReader_close(r); }
+};
+struct WriterCloser {
+    void operator()(VCStreamWriter* w) const { VCStreamWriter_close(w); }
+};
+
+}  // namespace
+
+int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size_t length,
+                                                bool throughNv21, const StreamOutput& output,
+                                                unsigned char** stream, size_t* streamLength,
+                                                VCDecodeFailure* why) {
+    if (bytes == nullptr || stream == nullptr || streamLength == nullptr || why == nullptr)
+        return VC_ERROR_NULL_PARAM;
+    *why = VC_DECODE_OK;
+    std::unique_ptr<VCStreamReader, ReaderCloser> reader(VCStreamReader_open(bytes, length));
+    int width = 0, height = 0;
+    if (reader == nullptr || VCStreamReader_readHeader(reader.get(), &width, &height) != 0) {
+        *why = reader == nullptr ? VC_DECODE_NOT_A_PICTURE : VCStreamReader_failure(reader.get());
+        return VC_ERROR_CODEC_FAILED;
+    }
+    // NV21 pads odd sizes, which the whole-picture path does its own way.
+    if (throughNv21 && ((width | height) & 1) != 0) return VC_ERROR_UNSUPPORTED;
+
+    if (bindGLEnvironment() != 0) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    struct Unbind {
+        VFilterBufferedProcessorImpl* self;
+        ~Unbind() { self->unbindGLEnvironment(); }
+    } unbind{this};
+    const int maxSize = Platform::getMaximumTextureSize();
+    if (width > maxSize || height > maxSize) return VC_ERROR_UNSUPPORTED;
+    StreamObjects gl(mEglEnv->getEGLDisplay());
+    if (!gl.make(width, height)) return VC_ERROR_UNSUPPORTED;
+    if (!gl.bind()) {
+        EglLog(VF_LOG_ERROR, "EGL: cannot stream a %dx%d picture through GL", width, height);
+        return VC_REPORT(VC_ERROR_INVALID_STATE);
+    }
+    std::unique_ptr<VCStreamWriter, WriterCloser> writer(
+        output.png ? VCStreamWriter_openPng(width, height)
+                   : VCStreamWriter_openJpeg(width, height, output.quality));
+    if (writer == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+
+    mProgram->setCameraGeometry(width, height, 0, 0);
+    mProgram->setPreviewGeometry(width, height, false);
+    const KivPixelReach reach = KivFilter_pixelReach(mFilter, width, height);
+    KivBandPipeline pipeline(*mProgram, *gl.source, *gl.target,
+                             {width, height, haloRows(reach, height), throughNv21});
+    int rc = pipeline.run(reader.get(), writer.get());
+    if (rc != 0) {
+        *why = VCStreamReader_failure(reader.get());
+        return rc;
+    }
+    *stream = VCStreamWriter_finish(writer.release(), streamLength);
+    return *stream != nullptr ? 0 : VC_ERROR_CODEC_FAILED;
+}

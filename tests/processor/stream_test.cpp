@@ -1,0 +1,227 @@
+// The streamed path of the buffered processor: every effect the factory
+// serves gives, band by band, the very bytes of the whole-picture path.
+// kiv-test-labels: threads
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <cmath>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "core/KivBandPipeline.h"
+#include "core/KivFilter.h"
+#include "core/KivImaging.h"
+#include "core/KivPixelReach.h"
+#include "core/VFilterBufferedProcessorImpl.h"
+#include "core/egl/Platform.h"
+#include "support/vc_image_handle.h"
+#include "vccore/vc_file.h"
+#include "vccore/vc_picture.h"
+
+namespace {
+
+using Bytes = std::vector<unsigned char>;
+
+// Even sizes (NV21 needs them); taller than three 64-row bands.
+const int kWidth = 72;
+const int kHeight = 210;
+
+// Every id of the built-in ranges that the factory serves.
+std::vector<int> factoryIds() {
+    std::vector<int> ids;
+    for (auto range :
+         {std::make_pair(200, 213), std::make_pair(400, 447), std::make_pair(500, 508)}) {
+        for (int id = range.first; id <= range.second; ++id) {
+            KivFilter* effect = KivImaging_create(id, nullptr);
+            if (effect == nullptr) continue;
+            if (effect->getFilterType() == id) ids.push_back(id);
+            delete effect;
+        }
+    }
+    return ids;
+}
+
+// A photo-like picture: colour ramps, rings and hard edges (which the
+// neighbour-reading effects pick out), alpha varying for PNG.
+VCImageHandle photo(int width, int height, bool alpha) {
+    VCImageHandle image(VCImage_createNew(width, height, VC_FORMAT_RGBA));
+    for (int y = 0; y < height; ++y) {
+        for (int x = 0; x < width; ++x) {
+            unsigned char* p = image->data + (static_cast<size_t>(y) * width + x) * 4;
+            double ring = 0.5 + 0.5 * std::sin(std::hypot(x - width * 0.4, y - height * 0.6) / 3.0);
+            p[0] = static_cast<unsigned char>(255.0 * x / width);
+            p[1] = static_cast<unsigned char>(255.0 * ring);
+            p[2] = ((x / 9 + y / 13) & 1) ? 230 : 20;
+            p[3] = alpha ? static_cast<unsigned char>(128 + (x * 7 + y) % 128) : 255;
+        }
+    }
+    return image;
+}
+
+Bytes bytesOf(unsigned char* stream, size_t length) {
+    Bytes out(stream, stream + length);
+    free(stream);
+    return out;
+}
+
+Bytes jpegOf(int width, int height) {
+    VCImageHandle jpeg(VCImage_encodeToJpeg(photo(width, height, false).get(), 90));
+    return Bytes(jpeg->data, jpeg->data + jpeg->size);
+}
+
+const Bytes& jpegInput() {
+    static const Bytes bytes = jpegOf(kWidth, kHeight);
+    return bytes;
+}
+
+const Bytes& pngInput() {
+    static const Bytes bytes = [] {
+        size_t length = 0;
+        unsigned char* png = VCPicture_encodePng(photo(kWidth, kHeight, true).get(), &length);
+        return bytesOf(png, length);
+    }();
+    return bytes;
+}
+
+class StreamTest : public ::testing::TestWithParam<int> {
+protected:
+    static void SetUpTestSuite() {
+        sProcessor = new VFilterBufferedProcessorImpl();
+        sProcessor->initialize();
+        KivBandPipeline::setBandRowsForTesting(64);
+    }
+    static void TearDownTestSuite() {
+        KivBandPipeline::setBandRowsForTesting(0);
+        sProcessor->release();
+        delete sProcessor;
+    }
+
+    // The whole-picture path: decoded into `format`, one draw, encoded.
+    Bytes whole(const Bytes& input, uint32_t format, bool png, int quality) {
+        VCImageHandle in(VCImage_createEmpty(0, 0, format));
+        EXPECT_EQ(0, VCImage_decodeFromJpeg(in.get(), input.data(), (int)input.size()));
+        VCImageHandle out(VCImage_createNew(in->width, in->height, VC_FORMAT_RGBA));
+        const int rc = format == VC_FORMAT_NV21
+                           ? sProcessor->doProcessNV21(in->data, in->width, in->height, out->data)
+                           : sProcessor->doProcessRGBA(in->data, in->width, in->height, out->data,
+                                                       VC_FORMAT_RGBA);
+        EXPECT_EQ(0, rc);
+        if (png) {
+            size_t length = 0;
+            unsigned char* stream = VCPicture_encodePng(out.get(), &length);
+            return bytesOf(stream, length);
+        }
+        VCImageHandle jpeg(VCImage_encodeToJpeg(out.get(), quality));
+        return Bytes(jpeg->data, jpeg->data + jpeg->size);
+    }
+
+    Bytes streamed(const Bytes& input, bool nv21, bool png, int quality, int* rc) {
+        unsigned char* stream = nullptr;
+        size_t length = 0;
+        VCDecodeFailure why = VC_DECODE_CORRUPT;
+        *rc = sProcessor->processStream(input.data(), input.size(), nv21, {png, quality}, &stream,
+                                        &length, &why);
+        EXPECT_EQ(VC_DECODE_OK, why);
+        return *rc == 0 ? bytesOf(stream, length) : Bytes();
+    }
+
+    static VFilterBufferedProcessorImpl* sProcessor;
+};
+
+VFilterBufferedProcessorImpl* StreamTest::sProcessor = nullptr;
+
+TEST_P(StreamTest, BandsGiveTheWholePicturesBytes) {
+    ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
+    struct Case {
+        const Bytes& input;
+        bool nv21, png;
+        int quality;
+    } cases[] = {
+        {jpegInput(), false, false, 90},  // kivimaging apply
+        {jpegInput(), true, false, 98},   // processFile
+        {pngInput(), false, true, 0},     // PNG in and out, alpha kept
+    };
+    for (const Case& c : cases) {
+        int rc = -1;
+        Bytes band = streamed(c.input, c.nv21, c.png, c.quality, &rc);
+        ASSERT_EQ(0, rc) << "nv21 " << c.nv21 << " png " << c.png;
+        EXPECT_TRUE(band ==
+                    whole(c.input, c.nv21 ? VC_FORMAT_NV21 : VC_FORMAT_RGBA, c.png, c.quality))
+            << "nv21 " << c.nv21 << " png " << c.png;
+    }
+}
+
+// Effects that read rows around their own keep those rows until every band
+// that reads them is drawn: rows a page wide, so that a row given back too
+// early really reads as zeros.
+TEST_P(StreamTest, NeighbourReadingEffectsKeepTheirReach) {
+    const int width = 1024, height = 1800;
+    ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
+    const KivPixelReach reach = KivFilter_pixelReach(sProcessor->getEffect(), width, height);
+    if (reach.kind != KivPixelReach::NEIGHBOURS) GTEST_SKIP() << "reads no neighbours";
+    EXPECT_GT(reach.haloRows, 0);
+    static const Bytes input = jpegOf(width, height);
+    int rc = -1;
+    Bytes band = streamed(input, false, false, 90, &rc);
+    ASSERT_EQ(0, rc);
+    EXPECT_TRUE(band == whole(input, VC_FORMAT_RGBA, false, 90));
+}
+
+INSTANTIATE_TEST_SUITE_P(Factory, StreamTest, ::testing::ValuesIn(factoryIds()),
+                         [](const ::testing::TestParamInfo<int>& info) {
+                             return std::to_string(info.param);
+                         });
+
+}  // namespace
+
+namespace {
+
+// What cannot stream says so before anything is drawn; what fails midway
+// stops every stage and says why.
+TEST(StreamRefusal, StatusAndReason) {
+    VFilterBufferedProcessorImpl processor;
+    processor.initialize();
+    processor.setEffect(401);
+    KivBandPipeline::setBandRowsForTesting(64);
+    const Bytes jpeg = jpegOf(kWidth, kHeight);
+    const Bytes odd = jpegOf(kWidth - 1, kHeight);
+    const Bytes truncated(jpeg.begin(), jpeg.begin() + jpeg.size() * 2 / 3);
+    const Bytes text = {'n', 'o', 't', ' ', 'a', ' ', 'p', 'i', 'c'};
+    struct Row {
+        const char* what;
+        const Bytes& input;
+        bool nv21;
+        int maxTexture;  // 0: the GPU's own
+        int status;
+        VCDecodeFailure why;
+    } table[] = {
+        {"odd size through NV21", odd, true, 0, VC_ERROR_UNSUPPORTED, VC_DECODE_OK},
+        {"odd size as RGBA", odd, false, 0, 0, VC_DECODE_OK},
+        {"taller than a texture", jpeg, false, 128, VC_ERROR_UNSUPPORTED, VC_DECODE_OK},
+        {"not a picture", text, false, 0, VC_ERROR_CODEC_FAILED, VC_DECODE_NOT_A_PICTURE},
+        {"cut short", truncated, false, 0, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+    };
+    for (const Row& row : table) {
+        if (row.maxTexture > 0) Platform::setMaximumTextureSizeForTesting(row.maxTexture);
+        unsigned char* stream = nullptr;
+        size_t length = 0;
+        VCDecodeFailure why = VC_DECODE_CORRUPT;
+        EXPECT_EQ(row.status, processor.processStream(row.input.data(), row.input.size(), row.nv21,
+                                                      {false, 90}, &stream, &length, &why))
+            << row.what;
+        EXPECT_EQ(row.why, why) << row.what;
+        EXPECT_EQ(row.status == 0, stream != nullptr) << row.what;
+        free(stream);
+        Platform::resetForTesting();
+    }
+    VCDecodeFailure why;
+    unsigned char* stream = nullptr;
+    size_t length = 0;
+    EXPECT_EQ(VC_ERROR_NULL_PARAM,
+              processor.processStream(nullptr, 0, false, {false, 90}, &stream, &length, &why));
+    KivBandPipeline::setBandRowsForTesting(0);
+    processor.release();
+}
+
+}  // namespace
