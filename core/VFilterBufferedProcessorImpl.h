@@ -121,6 +121,11 @@ private:
     // input's size and converts the target into `output` in `outputFormat`.
     // Everything is released (and the environment unbound) on the way out.
     int drawThrough(const VCImage& input, unsigned char* output, uint32_t outputFormat);
+    // processFilePath band by band (processStream through NV21) when the
+    // picture and the output path allow it: true with *status set, false
+    // with nothing done but, perhaps, the output path asked for.
+    bool processFileStreamed(const char* inputPath, const std::function<const char*()>& output,
+                             FileStatus* status);
     int initializeGL();
     int releaseFromGL();
     void deleteEffect();

@@ -5,6 +5,8 @@
 #include <stdlib.h>
 #include <string.h>
 
+#include <vector>
+
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/EglCheck.h"
 #include "vccore/vc_file.h"
@@ -159,17 +161,26 @@ jobject VFilterBufferedProcessorImpl::processBitmap(JNIEnv* env, jobject bitmap)
 
 VFilterBufferedProcessorImpl::FileStatus VFilterBufferedProcessorImpl::processFilePath(
     const char* inputPath, const std::function<const char*()>& outputPath) {
+    // The path is asked for once, whichever way the picture goes.
+    bool asked = false;
+    const char* out = nullptr;
+    auto output = [&]() {
+        if (!asked) out = outputPath();
+        asked = true;
+        return out;
+    };
+    FileStatus status = FILE_OK;
+    if (inputPath != nullptr && processFileStreamed(inputPath, output, &status)) return status;
+
     VCImage* nv21 = VCImage_createEmpty(0, 0, VC_FORMAT_NV21);
     VCImage* rgba = nullptr;
-    const char* out = nullptr;
-    FileStatus status = FILE_OK;
     if (nv21 == nullptr || inputPath == nullptr || VCImage_loadFromFile(nv21, inputPath) != 0) {
         status = FILE_LOAD_FAILED;
     } else if ((rgba = VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA)) == nullptr) {
         status = FILE_ALLOC_FAILED;
     } else if (doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data) < 0) {
         status = FILE_PROCESS_FAILED;
-    } else if ((out = outputPath()) == nullptr) {
+    } else if (output() == nullptr) {
         status = FILE_NO_OUTPUT_PATH;
     } else if (VCImage_saveToFile(rgba, out, kJpegQuality) != 0) {
         status = FILE_SAVE_FAILED;
@@ -177,6 +188,63 @@ VFilterBufferedProcessorImpl::FileStatus VFilterBufferedProcessorImpl::processFi
     if (nv21 != nullptr) VCImage_destroy(nv21);
     if (rgba != nullptr) VCImage_destroy(rgba);
     return status;
+}
+
+namespace {
+
+// What VCImage_saveToFile makes of a path: the first of ".jpeg", ".jpg" and
+// ".png" found anywhere in it, in that order, any case.
+bool savesJpeg(const char* path) {
+    for (const char* ext : {".jpeg", ".jpg", ".png"}) {
+        if (strcasestr(path, ext) != nullptr) return strcmp(ext, ".png") != 0;
+    }
+    return false;
+}
+
+// The whole file, or empty when it cannot be read.
+std::vector<unsigned char> readWhole(const char* path) {
+    std::vector<unsigned char> bytes;
+    FILE* file = fopen(path, "rb");
+    if (file == nullptr) return bytes;
+    long length = fsize(file);
+    if (length > 0) {
+        bytes.resize((size_t)length);
+        if (fread(bytes.data(), 1, bytes.size(), file) != bytes.size()) bytes.clear();
+    }
+    fclose(file);
+    return bytes;
+}
+
+}  // namespace
+
+bool VFilterBufferedProcessorImpl::processFileStreamed(const char* inputPath,
+                                                       const std::function<const char*()>& output,
+                                                       FileStatus* status) {
+    std::vector<unsigned char> bytes = readWhole(inputPath);
+    if (bytes.empty()) return false;
+    unsigned char* jpeg = nullptr;
+    size_t length = 0;
+    VCDecodeFailure why = VC_DECODE_OK;
+    // Anything but a finished picture (a failure too) goes the whole way,
+    // which fails as it always has.
+    if (processStream(bytes.data(), bytes.size(), true, {false, kJpegQuality}, &jpeg, &length,
+                      &why) != 0) {
+        return false;
+    }
+    bytes = std::vector<unsigned char>();
+    const char* out = output();
+    if (out == nullptr) {
+        *status = FILE_NO_OUTPUT_PATH;
+    } else if (savesJpeg(out)) {
+        save_to_file(out, jpeg, length);
+        *status = FILE_OK;
+    } else {
+        // Another format: the picture is made again the whole way for it.
+        free(jpeg);
+        return false;
+    }
+    free(jpeg);
+    return true;
 }
 
 void VFilterBufferedProcessorImpl::processFile(JNIEnv* env, jstring inputPath, jstring outputPath) {

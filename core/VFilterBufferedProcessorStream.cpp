@@ -7,6 +7,7 @@
 #include <memory>
 
 #include "core/KivBandPipeline.h"
+#include "core/KivFilter.h"
 #include "core/KivPixelReach.h"
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/EglCheck.h"
@@ -101,6 +102,12 @@ private:
     GLuint mFramebuffer = 0;
 };
 
+// Says why a picture takes the whole-picture path.
+int unstreamable(const char* why) {
+    EglLog(VF_LOG_DEBUG, "EGL: picture not streamed: %s", why);
+    return VC_ERROR_UNSUPPORTED;
+}
+
 struct ReaderCloser {
     void operator()(VCStreamReader* r) const { VCStreamReader_close(r); }
 };
@@ -117,6 +124,8 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
     if (bytes == nullptr || stream == nullptr || streamLength == nullptr || why == nullptr)
         return VC_ERROR_NULL_PARAM;
     *why = VC_DECODE_OK;
+    // Where the platform's fast codec is installed, JPEG goes through it.
+    if (VCStream_fastJpegCodecInstalled()) return unstreamable("the fast JPEG codec is installed");
     std::unique_ptr<VCStreamReader, ReaderCloser> reader(VCStreamReader_open(bytes, length));
     int width = 0, height = 0;
     if (reader == nullptr || VCStreamReader_readHeader(reader.get(), &width, &height) != 0) {
@@ -124,17 +133,18 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         return VC_ERROR_CODEC_FAILED;
     }
     // NV21 pads odd sizes, which the whole-picture path does its own way.
-    if (throughNv21 && ((width | height) & 1) != 0) return VC_ERROR_UNSUPPORTED;
+    if (throughNv21 && ((width | height) & 1) != 0) return unstreamable("odd size through NV21");
 
+    if (mFilter == nullptr) return unstreamable("no effect");
     if (bindGLEnvironment() != 0) return VC_REPORT(VC_ERROR_INVALID_STATE);
     struct Unbind {
         VFilterBufferedProcessorImpl* self;
         ~Unbind() { self->unbindGLEnvironment(); }
     } unbind{this};
     const int maxSize = Platform::getMaximumTextureSize();
-    if (width > maxSize || height > maxSize) return VC_ERROR_UNSUPPORTED;
+    if (width > maxSize || height > maxSize) return unstreamable("larger than a texture");
     StreamObjects gl(mEglEnv->getEGLDisplay());
-    if (!gl.make(width, height)) return VC_ERROR_UNSUPPORTED;
+    if (!gl.make(width, height)) return unstreamable("no GPU memory the CPU reaches");
     if (!gl.bind()) {
         EglLog(VF_LOG_ERROR, "EGL: cannot stream a %dx%d picture through GL", width, height);
         return VC_REPORT(VC_ERROR_INVALID_STATE);
@@ -144,9 +154,29 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
                    : VCStreamWriter_openJpeg(width, height, output.quality));
     if (writer == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
 
+    // Effects that do not say what they read (downloadable ones) may do
+    // anything with the picture; one that draws by itself in several passes
+    // reads rows its band's passes did not draw.
+    const KivPixelReach reach = KivFilter_pixelReach(mFilter, width, height);
+    if (dynamic_cast<const KivPixelReachSource*>(mFilter) == nullptr)
+        return unstreamable("the effect does not say which pixels it reads");
+    if (!mProgram->getDrawFlag() && reach.kind != KivPixelReach::SAME_PIXEL)
+        return unstreamable("the effect draws neighbour-reading passes by itself");
+    // The whole picture's trace, as its draw would leave it.
+    EglLog(VF_LOG_DEBUG, "%s",
+           throughNv21 ? "int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char*, "
+                         "int, int, unsigned char*)"
+                       : "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned char*, "
+                         "int, int, unsigned char*, int)");
+    if (throughNv21 && !Platform::isNativeInputFormat(VC_FORMAT_NV21)) {
+        const uint32_t nv21 = VC_FORMAT_NV21, preferred = Platform::getPreferredInputFormat(true);
+        EglLog(VF_LOG_ERROR,
+               "Input format '%4.4s' is not a native format for EglImage: Conversion required to "
+               "%4.4s",
+               reinterpret_cast<const char*>(&nv21), reinterpret_cast<const char*>(&preferred));
+    }
     mProgram->setCameraGeometry(width, height, 0, 0);
     mProgram->setPreviewGeometry(width, height, false);
-    const KivPixelReach reach = KivFilter_pixelReach(mFilter, width, height);
     KivBandPipeline pipeline(*mProgram, *gl.source, *gl.target,
                              {width, height, haloRows(reach, height), throughNv21});
     int rc = pipeline.run(reader.get(), writer.get());
@@ -154,6 +184,7 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         *why = VCStreamReader_failure(reader.get());
         return rc;
     }
+    EglLog(VF_LOG_DEBUG, "EGL: Synchronously waiting for rendering...");
     *stream = VCStreamWriter_finish(writer.release(), streamLength);
     return *stream != nullptr ? 0 : VC_ERROR_CODEC_FAILED;
 }

@@ -103,10 +103,6 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
     Result r = run({"apply", "-v", "-e", "403", in, "-o", out});
     ASSERT_EQ(0, r.status) << r.err;
     EXPECT_NE(std::string::npos, r.out.find("403 Negative: " + out)) << r.out;
-    // The library's trace of every buffer lock is logged at error level on
-    // purpose; the tool shows it as the trace it is.
-    EXPECT_NE(std::string::npos, r.err.find("[D] EGL: lockGraphicBuffer format : ")) << r.err;
-    EXPECT_EQ(std::string::npos, r.err.find("[E] EGL: lockGraphicBuffer"));
 
     ImagePtr src = load(in);
     ImagePtr dst = load(out);

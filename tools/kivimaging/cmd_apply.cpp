@@ -13,6 +13,7 @@
 #include "effects.h"
 #include "file_io.h"
 #include "image_io.h"
+#include "orientation.h"
 #include "progress.h"
 #include "runner.h"
 
@@ -158,7 +159,33 @@ int cmdApply(int argc, char** argv) {
     for (size_t i = 0; i < jobs.size(); i++) {
         const Job& job = jobs[i];
         bar.update(static_cast<int>(i), baseName(job.input).c_str());
-        ImageHolder input(imageLoadRgba(job.input, &error, maxSide));
+        FileBytes bytes;
+        if (!fileReadPicture(job.input, &bytes, &error)) {
+            bar.finish();
+            failure(error);
+            continue;
+        }
+        // Upright pictures stream band by band; a turned one is turned whole.
+        if (orientationOfJpeg(bytes.data(), bytes.size()) == 1) {
+            std::vector<unsigned char> stream;
+            EffectRunner::StreamResult streamed = runner.runStream(
+                bytes, job.input, imageFileFormat(job.output) == ImageFileFormat::kPng, quality,
+                &stream, &error);
+            if (streamed == EffectRunner::STREAM_DONE &&
+                !fileWriteAtomic(job.output, stream.data(), stream.size(), &error)) {
+                streamed = EffectRunner::STREAM_FAILED;
+            }
+            if (streamed != EffectRunner::STREAM_UNSUITED) {
+                if (streamed == EffectRunner::STREAM_DONE) {
+                    written++;
+                } else {
+                    bar.finish();
+                    failure(error);
+                }
+                continue;
+            }
+        }
+        ImageHolder input(imageDecodeRgba(bytes, job.input, &error, maxSide));
         ImageHolder result(input.get() != nullptr ? runner.run(input.get(), &error) : nullptr);
         if (result.get() == nullptr || !imageSave(result.get(), job.output, quality, &error)) {
             bar.finish();

@@ -25,9 +25,18 @@ ImageFileFormat imageFileFormat(const std::string& path) {
     return ImageFileFormat::kNone;
 }
 
+std::string imageDecodeError(const std::string& path, VCDecodeFailure why) {
+    return "cannot decode '" + path + "': " + VCPicture_failureText(why);
+}
+
 VCImage* imageLoadRgba(const std::string& path, std::string* error, int maxSide) {
     FileBytes bytes;
     if (!fileReadPicture(path, &bytes, error)) return nullptr;
+    return imageDecodeRgba(bytes, path, error, maxSide);
+}
+
+VCImage* imageDecodeRgba(const FileBytes& bytes, const std::string& path, std::string* error,
+                         int maxSide) {
     const int length = static_cast<int>(bytes.size());
     int width = 0, height = 0;
     if (maxSide > 0 && VCPicture_readHeader(bytes.data(), length, &width, &height) == VC_OK &&
@@ -40,7 +49,7 @@ VCImage* imageLoadRgba(const std::string& path, std::string* error, int maxSide)
     ImageHolder image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
     if (image.get() == nullptr ||
         VCImage_decodeFromJpeg(image.get(), bytes.data(), length) != VC_OK) {
-        *error = "cannot decode '" + path + "': " + VCPicture_failureText(VCPicture_lastFailure());
+        *error = imageDecodeError(path, VCPicture_lastFailure());
         return nullptr;
     }
     int orientation = orientationOfJpeg(bytes.data(), bytes.size());

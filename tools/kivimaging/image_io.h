@@ -3,8 +3,10 @@
 #define TOOLS_KIVIMAGING_IMAGE_IO_H
 
 #include <string>
+#include <vector>
 
 #include "vccore/vc_image.h"
+#include "vccore/vc_picture.h"
 
 namespace kivcli {
 
@@ -45,6 +47,11 @@ inline bool imageWritableFormat(const std::string& path) {
 // that is refused from its header, before anything is decoded. Null with a
 // message naming the path and the reason otherwise.
 VCImage* imageLoadRgba(const std::string& path, std::string* error, int maxSide = 0);
+// The same from the file's bytes (`path` only names it in messages).
+VCImage* imageDecodeRgba(const std::vector<unsigned char>& bytes, const std::string& path,
+                         std::string* error, int maxSide = 0);
+// The message for a picture that did not decode.
+std::string imageDecodeError(const std::string& path, VCDecodeFailure why);
 
 // Writes an "RGBA" image (straight alpha, as decoded and rendered) as PNG or
 // JPEG by the path's extension, replacing any file there only once the new

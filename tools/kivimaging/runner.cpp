@@ -1,8 +1,10 @@
 #include "runner.h"
 
+#include <stdlib.h>
 #include <string.h>
 
 #include "cli_log.h"
+#include "image_io.h"
 #include "core/KivFilter.h"
 #include "core/KivFilterExternal.h"
 #include "core/VFilterBufferedProcessorImpl.h"
@@ -126,6 +128,35 @@ VCImage* EffectRunner::run(const VCImage* input, std::string* error) {
         return nullptr;
     }
     return output;
+}
+
+EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned char>& bytes,
+                                                   const std::string& path, bool png, int quality,
+                                                   std::vector<unsigned char>* stream,
+                                                   std::string* error) {
+    if (mProcessor == nullptr) return STREAM_UNSUITED;
+    int errorsBefore = cliLogErrorCount();
+    unsigned char* encoded = nullptr;
+    size_t length = 0;
+    VCDecodeFailure why = VC_DECODE_OK;
+    int rc = mProcessor->processStream(bytes.data(), bytes.size(), false, {png, quality}, &encoded,
+                                       &length, &why);
+    if (rc == VC_ERROR_UNSUPPORTED) return STREAM_UNSUITED;
+    if (rc == 0 && cliLogErrorCount() == errorsBefore) {
+        stream->assign(encoded, encoded + length);
+        free(encoded);
+        return STREAM_DONE;
+    }
+    free(encoded);
+    if (why != VC_DECODE_OK) {
+        *error = imageDecodeError(path, why);
+    } else if (rc == VC_ERROR_CODEC_FAILED) {
+        *error = "'" + path + "': the picture could not be encoded";
+    } else {
+        *error = "'" + path + "': the effect could not be rendered (" +
+                 (rc != VC_OK ? VCError_name(rc) : "see --verbose") + ")";
+    }
+    return STREAM_FAILED;
 }
 
 }  // namespace kivcli

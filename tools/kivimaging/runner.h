@@ -3,6 +3,7 @@
 #define TOOLS_KIVIMAGING_RUNNER_H
 
 #include <string>
+#include <vector>
 
 #include "effects.h"
 #include "vccore/vc_image.h"
@@ -30,6 +31,17 @@ public:
     int maxPictureSide();
     // Renders `input` ("RGBA") into a new "RGBA" image of the same size.
     VCImage* run(const VCImage* input, std::string* error);
+
+    // Renders a JPEG or PNG picture held in `bytes` band by band, straight
+    // into an encoded PNG or JPEG (`quality`): the bytes run() and imageSave
+    // would give for the picture as decoded, without it ever being whole in
+    // memory. STREAM_DONE with *stream (malloc'ed) filled; STREAM_UNSUITED
+    // when this picture or GPU needs the whole-picture path (nothing done);
+    // STREAM_FAILED with a message (`path` names the input in it).
+    enum StreamResult { STREAM_DONE, STREAM_UNSUITED, STREAM_FAILED };
+    StreamResult runStream(const std::vector<unsigned char>& bytes, const std::string& path,
+                           bool png, int quality, std::vector<unsigned char>* stream,
+                           std::string* error);
 
     EffectRunner(const EffectRunner&) = delete;
     EffectRunner& operator=(const EffectRunner&) = delete;

@@ -9,6 +9,7 @@
 #include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
+#include "vccore/vc_stream.h"
 
 namespace {
 
@@ -251,6 +252,10 @@ std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* byt
     if (startsWith(bytes, length, kPngSignature, sizeof(kPngSignature)))
         return VCPngReader_create(bytes, length);
     return nullptr;
+}
+
+extern "C" int VCStream_fastJpegCodecInstalled(void) {
+    return FastCodec().present() ? 1 : 0;
 }
 
 extern "C" VCImage* VCImage_encodeToJpeg(const VCImage* image, int quality) {

@@ -15,6 +15,10 @@
 extern "C" {
 #endif
 
+// Whether the platform's fast JPEG codec is installed: the whole-picture
+// functions then code JPEG through it, and only it can give their bytes.
+int VCStream_fastJpegCodecInstalled(void);
+
 typedef struct VCStreamReader VCStreamReader;
 typedef struct VCStreamWriter VCStreamWriter;
 
