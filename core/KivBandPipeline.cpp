@@ -155,7 +155,9 @@ int KivBandPipeline::draw() {
             glClearColor(0, 0, 0, 1);
             glClear(GL_COLOR_BUFFER_BIT);
         }
-        int drawn = mProgram.onDrawFrame();
+        // One frame in parts: the effect's per-frame hook runs once, for the
+        // first band; effects that draw by themselves draw every band.
+        int drawn = y0 == 0 || clear ? mProgram.onDrawFrame() : mProgram.redrawFrame();
         glFinish();
         if (drawn != 0) {
             fail(VC_REPORT(VC_ERROR_UNKNOWN));

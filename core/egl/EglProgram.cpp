@@ -306,6 +306,31 @@ int EglProgram::initShaderIndexer() {
     return 0;
 }
 
+void EglProgram::bindQuad_l() {
+    mShader->bindProgram(EglShader::SHADER_PRECISION_HIGH);
+    if (!mNameIndexReady) initShaderIndexer();
+    mShader->bindVertexAttrib("a_position", 3, kVertices);
+    const float* texcoord = nullptr;
+    if (isDualCamera()) {
+        texcoord = kTexCoords[mPreviewFlip ? GEOMETRY_VFLIP : GEOMETRY_NORMAL];
+    } else if (mCamera0GeometryType >= GEOMETRY_VFLIP && mCamera0GeometryType <= GEOMETRY_HFLIP) {
+        texcoord = kTexCoords[mCamera0GeometryType];
+    }
+    if (texcoord != nullptr) mShader->bindVertexAttrib("a_texcoord", 2, texcoord);
+}
+
+int EglProgram::redrawFrame() {
+    Mutex::Autolock lock(mLock);
+    if (mShader == nullptr || !mDrawFlag || mReloadNeeded) return VC_REPORT(VC_ERROR_INVALID_STATE);
+    GL_CHECK(glViewport(0, 0, mPreviewWidth, mPreviewHeight));
+    bindQuad_l();
+    if (!GL_CHECK(glDrawArrays(GL_TRIANGLE_STRIP, 0, 4))) return VC_REPORT(VC_ERROR_UNKNOWN);
+    mShader->unBindVertexAttrib("a_position");
+    mShader->unBindVertexAttrib("a_texcoord");
+    GL_CHECK(glFlush());
+    return 0;
+}
+
 int EglProgram::onDrawFrame() {
     Mutex::Autolock lock(mLock);
 
@@ -331,19 +356,7 @@ int EglProgram::onDrawFrame() {
 
     GL_CHECK(glViewport(0, 0, mPreviewWidth, mPreviewHeight));
 
-    if (mDrawFlag) {
-        mShader->bindProgram(EglShader::SHADER_PRECISION_HIGH);
-        if (!mNameIndexReady) initShaderIndexer();
-        mShader->bindVertexAttrib("a_position", 3, kVertices);
-        const float* texcoord = nullptr;
-        if (isDualCamera()) {
-            texcoord = kTexCoords[mPreviewFlip ? GEOMETRY_VFLIP : GEOMETRY_NORMAL];
-        } else if (mCamera0GeometryType >= GEOMETRY_VFLIP &&
-                   mCamera0GeometryType <= GEOMETRY_HFLIP) {
-            texcoord = kTexCoords[mCamera0GeometryType];
-        }
-        if (texcoord != nullptr) mShader->bindVertexAttrib("a_texcoord", 2, texcoord);
-    }
+    if (mDrawFlag) bindQuad_l();
 
     if (mFilter != nullptr) {
         int result = mFilter->onDrawFrame(*this);

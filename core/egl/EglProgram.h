@@ -71,6 +71,12 @@ public:
     unsigned int getProgramID() const;
 
     int onDrawFrame();
+    // Draws the quad of the last frame again, with the uniforms and textures
+    // its effect set for it and without the effect's per-frame hook: another
+    // part of the same frame (under a scissor), so an effect that animates
+    // from frame to frame does not move on. Only where the program draws the
+    // quad (the draw flag); -7 otherwise.
+    int redrawFrame();
 
     // For effects: whether the program binds the quad and draws itself.
     void setDrawFlag(bool draw) { mDrawFlag = draw; }
@@ -94,6 +100,8 @@ public:
 
 private:
     int initialize_l(int cameraMode, bool defaultOnly);
+    // Uses the program and binds the quad's vertices and texture coordinates.
+    void bindQuad_l();
     void release_l();
     int loadEffectShader();
     int loadDefaultShader();

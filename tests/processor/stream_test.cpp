@@ -109,8 +109,10 @@ protected:
         delete sProcessor;
     }
 
-    // The whole-picture path: decoded into `format`, one draw, encoded.
+    // The whole-picture path: decoded into `format`, one draw, encoded. Each
+    // path gets the effect fresh: some move on from frame to frame.
     Bytes whole(const Bytes& input, uint32_t format, bool png, int quality) {
+        sProcessor->setEffect(GetParam());
         VCImageHandle in(VCImage_createEmpty(0, 0, format));
         EXPECT_EQ(0, VCImage_decodeFromJpeg(in.get(), input.data(), (int)input.size()));
         VCImageHandle out(VCImage_createNew(in->width, in->height, VC_FORMAT_RGBA));
@@ -129,6 +131,7 @@ protected:
     }
 
     Bytes streamed(const Bytes& input, bool nv21, bool png, int quality, int* rc) {
+        sProcessor->setEffect(GetParam());
         unsigned char* stream = nullptr;
         size_t length = 0;
         VCDecodeFailure why = VC_DECODE_CORRUPT;
