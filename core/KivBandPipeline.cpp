@@ -1,5 +1,6 @@
 #include "core/KivBandPipeline.h"
 
+#include <pthread.h>
 #include <string.h>
 
 #include <algorithm>
@@ -175,8 +176,14 @@ int KivBandPipeline::draw() {
 }
 
 int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
-    std::thread decoder([this, reader] { decode(reader); });
-    std::thread encoder([this, writer] { encode(writer); });
+    std::thread decoder([this, reader] {
+        pthread_setname_np(pthread_self(), "kiv-decode");
+        decode(reader);
+    });
+    std::thread encoder([this, writer] {
+        pthread_setname_np(pthread_self(), "kiv-encode");
+        encode(writer);
+    });
     int rc = draw();
     decoder.join();
     encoder.join();

@@ -18,6 +18,7 @@
 
 #include "vccore/vc_image.h"
 #include "vccore/vc_picture.h"
+#include "vccore/vc_stream.h"
 
 #include "core/VFilterBufferedProcessor.h"
 
@@ -85,6 +86,10 @@ public:
     struct StreamOutput {
         bool png;
         int quality;
+        // When set, the stream goes to it as it is made (from another
+        // thread) and nothing is returned through `stream`.
+        VCStreamSink sink = nullptr;
+        void* sinkUser = nullptr;
     };
     // Runs the current effect over a JPEG or PNG picture held in memory and
     // encodes the result, a band of rows at a time on three threads

@@ -153,6 +153,7 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         output.png ? VCStreamWriter_openPng(width, height)
                    : VCStreamWriter_openJpeg(width, height, output.quality));
     if (writer == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    if (output.sink != nullptr) VCStreamWriter_setSink(writer.get(), output.sink, output.sinkUser);
 
     // Effects that do not say what they read (downloadable ones) may do
     // anything with the picture; one that draws by itself in several passes
@@ -185,6 +186,9 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         return rc;
     }
     EglLog(VF_LOG_DEBUG, "EGL: Synchronously waiting for rendering...");
+    *stream = nullptr;
+    *streamLength = 0;
+    if (output.sink != nullptr) return VCStreamWriter_end(writer.release());
     *stream = VCStreamWriter_finish(writer.release(), streamLength);
     return *stream != nullptr ? 0 : VC_ERROR_CODEC_FAILED;
 }

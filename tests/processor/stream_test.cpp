@@ -283,3 +283,51 @@ TEST(StreamFile, ProcessFileWritesTheWholePathsFile) {
 }
 
 }  // namespace
+
+namespace {
+
+// A sink gets the stream as it is made, the same bytes; one that refuses
+// stops every stage (no hang) with the encoder's failure.
+TEST(StreamSink, SameBytesOrAFailure) {
+    VFilterBufferedProcessorImpl processor;
+    processor.initialize();
+    processor.setEffect(401);
+    KivBandPipeline::setBandRowsForTesting(64);
+    const Bytes jpeg = jpegOf(kWidth, kHeight);
+    struct Collect {
+        Bytes bytes;
+        size_t refuseAfter;
+    };
+    for (bool png : {false, true}) {
+        unsigned char* stream = nullptr;
+        size_t length = 0;
+        VCDecodeFailure why;
+        ASSERT_EQ(0, processor.processStream(jpeg.data(), jpeg.size(), false, {png, 90}, &stream,
+                                             &length, &why));
+        const Bytes whole = bytesOf(stream, length);
+        for (size_t refuseAfter : {SIZE_MAX, size_t(0), whole.size() / 2}) {
+            Collect sink{{}, refuseAfter};
+            VFilterBufferedProcessorImpl::StreamOutput out = {png, 90};
+            out.sink = [](void* user, const unsigned char* bytes, size_t n) {
+                Collect* c = static_cast<Collect*>(user);
+                if (c->bytes.size() + n > c->refuseAfter) return -1;
+                c->bytes.insert(c->bytes.end(), bytes, bytes + n);
+                return 0;
+            };
+            out.sinkUser = &sink;
+            const bool fits = refuseAfter >= whole.size();
+            EXPECT_EQ(fits ? 0 : VC_ERROR_CODEC_FAILED,
+                      processor.processStream(jpeg.data(), jpeg.size(), false, out, &stream,
+                                              &length, &why))
+                << png << " " << refuseAfter;
+            EXPECT_EQ(nullptr, stream);
+            if (fits) {
+                EXPECT_TRUE(sink.bytes == whole) << png;
+            }
+        }
+    }
+    KivBandPipeline::setBandRowsForTesting(0);
+    processor.release();
+}
+
+}  // namespace

@@ -153,7 +153,8 @@ int cmdApply(int argc, char** argv) {
 
     // Pictures the GPU cannot take are refused from their header, before a
     // long decoding that could only end in a failed draw.
-    const int maxSide = runner.maxPictureSide();
+    // (Asked once a picture needs the whole-picture way: asking builds a program.)
+    int maxSide = -1;
     int written = 0;
     ProgressBar bar(stdout, static_cast<int>(jobs.size()), jobs.size() > 1 && isatty(1));
     for (size_t i = 0; i < jobs.size(); i++) {
@@ -167,12 +168,16 @@ int cmdApply(int argc, char** argv) {
         }
         // Upright pictures stream band by band; a turned one is turned whole.
         if (orientationOfJpeg(bytes.data(), bytes.size()) == 1) {
-            std::vector<unsigned char> stream;
+            AtomicFile output;
+            if (!output.open(job.output, &error)) {
+                bar.finish();
+                failure(error);
+                continue;
+            }
             EffectRunner::StreamResult streamed = runner.runStream(
                 bytes, job.input, imageFileFormat(job.output) == ImageFileFormat::kPng, quality,
-                &stream, &error);
-            if (streamed == EffectRunner::STREAM_DONE &&
-                !fileWriteAtomic(job.output, stream.data(), stream.size(), &error)) {
+                &output, &error);
+            if (streamed == EffectRunner::STREAM_DONE && !output.commit(&error)) {
                 streamed = EffectRunner::STREAM_FAILED;
             }
             if (streamed != EffectRunner::STREAM_UNSUITED) {
@@ -185,6 +190,7 @@ int cmdApply(int argc, char** argv) {
                 continue;
             }
         }
+        if (maxSide < 0) maxSide = runner.maxPictureSide();
         ImageHolder input(imageDecodeRgba(bytes, job.input, &error, maxSide));
         ImageHolder result(input.get() != nullptr ? runner.run(input.get(), &error) : nullptr);
         if (result.get() == nullptr || !imageSave(result.get(), job.output, quality, &error)) {

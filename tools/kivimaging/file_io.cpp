@@ -87,49 +87,72 @@ bool fileReadPicture(const std::string& path, FileBytes* bytes, std::string* err
     return true;
 }
 
-bool fileWriteAtomic(const std::string& path, const unsigned char* bytes, size_t length,
-                     std::string* error) {
-    const std::string folder = folderOf(path);
+bool AtomicFile::open(const std::string& path, std::string* error) {
+    mPath = path;
+    mFolder = folderOf(path);
     std::string base = path.substr(path.find_last_of('/') + 1);
     if (base.size() > 160) base.resize(160);  // room for the suffix within NAME_MAX
     // A hidden name beside the target (same file system, so the rename is
     // atomic) that no other writer, even of the same target, picks.
     static unsigned serial = 0;
-    std::string temporary;
-    int fd = -1;
-    for (int attempt = 0; attempt < 100 && fd < 0; ++attempt) {
-        temporary = folder + "/." + base + "." + std::to_string(getpid()) + "-" +
-                    std::to_string(serial++) + ".tmp";
-        fd = open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
-        if (fd < 0 && errno != EEXIST) break;
+    for (int attempt = 0; attempt < 100 && mFd < 0; ++attempt) {
+        mTemporary = mFolder + "/." + base + "." + std::to_string(getpid()) + "-" +
+                     std::to_string(serial++) + ".tmp";
+        mFd = ::open(mTemporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
+        if (mFd < 0 && errno != EEXIST) break;
     }
-    if (fd < 0) {
+    if (mFd < 0) {
         *error = failed("write", path, strerror(errno));
         return false;
     }
-    bool ok = writeAll(fd, bytes, length) && fsync(fd) == 0;
-    int reason = errno;
-    if (close(fd) != 0 && ok) {
-        ok = false;
-        reason = errno;
-    }
-    if (ok && rename(temporary.c_str(), path.c_str()) != 0) {
-        ok = false;
-        reason = errno;
-    }
-    if (!ok) {
-        unlink(temporary.c_str());
-        *error = failed("write", path, strerror(reason));
+    return true;
+}
+
+bool AtomicFile::write(const unsigned char* bytes, size_t length) {
+    if (mFd < 0 || mReason != 0) return false;
+    if (!writeAll(mFd, bytes, length)) mReason = errno;
+    return mReason == 0;
+}
+
+bool AtomicFile::commit(std::string* error) {
+    if (mFd < 0) return false;
+    if (mReason == 0 && fsync(mFd) != 0) mReason = errno;
+    if (close(mFd) != 0 && mReason == 0) mReason = errno;
+    mFd = -1;
+    if (mReason == 0 && rename(mTemporary.c_str(), mPath.c_str()) != 0) mReason = errno;
+    if (mReason != 0) {
+        unlink(mTemporary.c_str());
+        *error = failed("write", mPath, strerror(mReason));
         return false;
     }
+    mTemporary.clear();
     // The rename itself reaches the disk with its folder; a folder that
     // cannot be synced (some file systems) does not undo the write.
-    int dir = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    int dir = ::open(mFolder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     if (dir >= 0) {
         fsync(dir);
         close(dir);
     }
     return true;
+}
+
+bool AtomicFile::writeFailed(std::string* error) const {
+    if (mReason == 0) return false;
+    *error = failed("write", mPath, strerror(mReason));
+    return true;
+}
+
+AtomicFile::~AtomicFile() {
+    if (mFd >= 0) close(mFd);
+    if (!mTemporary.empty()) unlink(mTemporary.c_str());
+}
+
+bool fileWriteAtomic(const std::string& path, const unsigned char* bytes, size_t length,
+                     std::string* error) {
+    AtomicFile file;
+    if (!file.open(path, error)) return false;
+    file.write(bytes, length);
+    return file.commit(error);
 }
 
 bool fileSame(const std::string& a, const std::string& b) {

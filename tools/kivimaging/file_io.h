@@ -25,6 +25,27 @@ bool fileReadPicture(const std::string& path, FileBytes* bytes, std::string* err
 bool fileWriteAtomic(const std::string& path, const unsigned char* bytes, size_t length,
                      std::string* error);
 
+// The same, written as it comes: open(), any number of write()s, then
+// commit(); a file never committed leaves the target as it was and no
+// temporary behind. A failed write is reported by commit().
+class AtomicFile {
+public:
+    AtomicFile() = default;
+    ~AtomicFile();
+    bool open(const std::string& path, std::string* error);
+    bool write(const unsigned char* bytes, size_t length);
+    bool commit(std::string* error);
+    // Whether a write failed, and then why.
+    bool writeFailed(std::string* error) const;
+    AtomicFile(const AtomicFile&) = delete;
+    AtomicFile& operator=(const AtomicFile&) = delete;
+
+private:
+    std::string mPath, mFolder, mTemporary;
+    int mFd = -1;
+    int mReason = 0;  // the first write's failure (errno)
+};
+
 // Whether two paths name the same existing file (hard links and symbolic
 // links included).
 bool fileSame(const std::string& a, const std::string& b);

@@ -132,26 +132,28 @@ VCImage* EffectRunner::run(const VCImage* input, std::string* error) {
 
 EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned char>& bytes,
                                                    const std::string& path, bool png, int quality,
-                                                   std::vector<unsigned char>* stream,
-                                                   std::string* error) {
+                                                   AtomicFile* output, std::string* error) {
     if (mProcessor == nullptr) return STREAM_UNSUITED;
     int errorsBefore = cliLogErrorCount();
-    unsigned char* encoded = nullptr;
+    unsigned char* unused = nullptr;
     size_t length = 0;
     VCDecodeFailure why = VC_DECODE_OK;
-    int rc = mProcessor->processStream(bytes.data(), bytes.size(), false, {png, quality}, &encoded,
-                                       &length, &why);
+    VFilterBufferedProcessorImpl::StreamOutput out = {png, quality};
+    // Straight into the output's temporary file, from the encoder's thread.
+    out.sink = [](void* file, const unsigned char* bytes, size_t n) {
+        return static_cast<AtomicFile*>(file)->write(bytes, n) ? 0 : -1;
+    };
+    out.sinkUser = output;
+    int rc =
+        mProcessor->processStream(bytes.data(), bytes.size(), false, out, &unused, &length, &why);
     if (rc == VC_ERROR_UNSUPPORTED) return STREAM_UNSUITED;
-    if (rc == 0 && cliLogErrorCount() == errorsBefore) {
-        stream->assign(encoded, encoded + length);
-        free(encoded);
-        return STREAM_DONE;
-    }
-    free(encoded);
+    if (rc == 0 && cliLogErrorCount() == errorsBefore) return STREAM_DONE;
     if (why != VC_DECODE_OK) {
         *error = imageDecodeError(path, why);
     } else if (rc == VC_ERROR_CODEC_FAILED) {
-        *error = "'" + path + "': the picture could not be encoded";
+        // A refused write stops the encoder: that is the story then.
+        if (!output->writeFailed(error))
+            *error = "'" + path + "': the picture could not be encoded";
     } else {
         *error = "'" + path + "': the effect could not be rendered (" +
                  (rc != VC_OK ? VCError_name(rc) : "see --verbose") + ")";

@@ -2,10 +2,14 @@
 #ifndef TOOLS_KIVIMAGING_RUNNER_H
 #define TOOLS_KIVIMAGING_RUNNER_H
 
+#include <stdlib.h>
+
+#include <memory>
 #include <string>
 #include <vector>
 
 #include "effects.h"
+#include "file_io.h"
 #include "vccore/vc_image.h"
 
 class VFilterBufferedProcessorImpl;
@@ -40,8 +44,7 @@ public:
     // STREAM_FAILED with a message (`path` names the input in it).
     enum StreamResult { STREAM_DONE, STREAM_UNSUITED, STREAM_FAILED };
     StreamResult runStream(const std::vector<unsigned char>& bytes, const std::string& path,
-                           bool png, int quality, std::vector<unsigned char>* stream,
-                           std::string* error);
+                           bool png, int quality, AtomicFile* output, std::string* error);
 
     EffectRunner(const EffectRunner&) = delete;
     EffectRunner& operator=(const EffectRunner&) = delete;

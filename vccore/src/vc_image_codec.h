@@ -87,6 +87,21 @@ public:
     virtual bool writeRows(const unsigned char* rgba, size_t pitch, int rows) = 0;
     // After the last row: the malloc'ed stream, or null.
     virtual unsigned char* finish(size_t* length) = 0;
+    // Before the first row: the stream goes to the sink as it is made, and
+    // the encoder ends with end() (false on failure, the sink's too).
+    void setSink(int (*sink)(void*, const unsigned char*, size_t), void* user) {
+        mSink = sink;
+        mSinkUser = user;
+    }
+    virtual bool end() = 0;
+
+protected:
+    // Hands bytes to the sink; false when it refuses.
+    bool toSink(const unsigned char* bytes, size_t length) {
+        return length == 0 || mSink(mSinkUser, bytes, length) == 0;
+    }
+    int (*mSink)(void*, const unsigned char*, size_t) = nullptr;
+    void* mSinkUser = nullptr;
 };
 
 // The stream VCJpeg_encode makes of an "RGBA" image (quality 1...100), or of

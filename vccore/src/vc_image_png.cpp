@@ -163,7 +163,10 @@ private:
 
 // Where a PNG stream goes: a FILE, or a growing malloc'ed buffer.
 struct PngSink {
+    // A file, a function, or (neither) a growing buffer.
     FILE* file = nullptr;
+    int (*out)(void*, const unsigned char*, size_t) = nullptr;
+    void* user = nullptr;
     unsigned char* bytes = nullptr;
     size_t length = 0;
     size_t capacity = 0;
@@ -173,6 +176,10 @@ void writeToSink(png_structp png, png_bytep data, png_size_t count) {
     PngSink* sink = static_cast<PngSink*>(png_get_io_ptr(png));
     if (sink->file != nullptr) {
         if (fwrite(data, 1, count, sink->file) != count) png_error(png, "write failed");
+        return;
+    }
+    if (sink->out != nullptr) {
+        if (sink->out(sink->user, data, count) != 0) png_error(png, "write failed");
         return;
     }
     if (count > sink->capacity - sink->length) {
@@ -246,6 +253,13 @@ public:
     }
 
     bool writeRows(const unsigned char* rgba, size_t pitch, int rows) override {
+        if (mSink.out == nullptr && VCStreamEncoder::mSink != nullptr) {
+            // The header went out before there was a sink.
+            if (!toSink(mSink.bytes, mSink.length)) return false;
+            mSink.length = 0;
+            mSink.out = VCStreamEncoder::mSink;
+            mSink.user = mSinkUser;
+        }
         if (!mStarted || rows < 0 || static_cast<png_uint_32>(rows) > mHeight - mWritten)
             return false;
         if (setjmp(png_jmpbuf(mPng))) return mStarted = false;
@@ -261,7 +275,7 @@ public:
         return true;
     }
 
-    bool end() {
+    bool end() override {
         if (!mStarted || mWritten != mHeight) return false;
         if (setjmp(png_jmpbuf(mPng))) return false;
         png_write_end(mPng, nullptr);

@@ -107,6 +107,16 @@ extern "C" unsigned char* VCStreamWriter_finish(VCStreamWriter* writer, size_t* 
     return stream;
 }
 
+extern "C" void VCStreamWriter_setSink(VCStreamWriter* writer, VCStreamSink sink, void* user) {
+    if (writer != nullptr) writer->encoder->setSink(sink, user);
+}
+
+extern "C" int VCStreamWriter_end(VCStreamWriter* writer) {
+    bool ok = writer != nullptr && writer->encoder->end();
+    delete writer;
+    return ok ? 0 : VC_ERROR_CODEC_FAILED;
+}
+
 extern "C" void VCStreamWriter_close(VCStreamWriter* writer) {
     delete writer;
 }

@@ -208,12 +208,23 @@ public:
     JpegWriter() {
         mDestination.init_destination = [](j_compress_ptr info) { self(info)->grow(); };
         mDestination.empty_output_buffer = [](j_compress_ptr info) -> boolean {
-            self(info)->mLength = self(info)->mCapacity;
-            return self(info)->grow() ? TRUE : FALSE;
+            JpegWriter* w = self(info);
+            w->mLength = w->mCapacity;
+            // With a sink the buffer is handed over whole and used again.
+            if (w->mSink != nullptr) {
+                if (!w->toSink(w->mStream, w->mLength)) ERREXIT(&w->mInfo, JERR_FILE_WRITE);
+                w->mLength = 0;
+                w->mDestination.next_output_byte = w->mStream;
+                w->mDestination.free_in_buffer = w->mCapacity;
+                return TRUE;
+            }
+            return w->grow() ? TRUE : FALSE;
         };
         mDestination.term_destination = [](j_compress_ptr info) {
             JpegWriter* w = self(info);
             w->mLength = w->mCapacity - w->mDestination.free_in_buffer;
+            if (w->mSink != nullptr && !w->toSink(w->mStream, w->mLength))
+                ERREXIT(&w->mInfo, JERR_FILE_WRITE);
         };
         mInfo.err = jpeg_std_error(&mError);
         mError.output_message = [](j_common_ptr) {};
@@ -268,7 +279,7 @@ public:
     }
 
     unsigned char* finish(size_t* length) override {
-        if (!mStarted || mInfo.next_scanline != mInfo.image_height || !end()) return nullptr;
+        if (!end()) return nullptr;
         unsigned char* stream = mStream;
         *length = mLength;
         mStream = nullptr;
@@ -298,12 +309,15 @@ private:
         return true;
     }
 
-    bool end() {
+public:
+    bool end() override {
+        if (!mStarted || mInfo.next_scanline != mInfo.image_height) return false;
         if (setjmp(mJump)) return false;
         jpeg_finish_compress(&mInfo);
-        return mLength > 0;
+        return mSink != nullptr || mLength > 0;
     }
 
+private:
     jpeg_compress_struct mInfo{};
     jpeg_error_mgr mError{};
     jpeg_destination_mgr mDestination{};

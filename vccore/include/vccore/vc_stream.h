@@ -44,6 +44,16 @@ void VCStreamReader_close(VCStreamReader* reader);
 // width x height picture; null for a size no record can hold or no memory.
 VCStreamWriter* VCStreamWriter_openJpeg(int width, int height, int quality);
 VCStreamWriter* VCStreamWriter_openPng(int width, int height);
+// Where a writer may hand its stream as it is made, instead of keeping it:
+// `length` bytes, valid during the call; non-zero stops the encoder.
+typedef int (*VCStreamSink)(void* user, const unsigned char* bytes, size_t length);
+// Before the first row: the stream goes to `sink` from now on; the writer
+// then ends with VCStreamWriter_end instead of VCStreamWriter_finish.
+void VCStreamWriter_setSink(VCStreamWriter* writer, VCStreamSink sink, void* user);
+// With a sink, once every row is written: the rest of the stream goes to it.
+// 0 or VC_ERROR_CODEC_FAILED (the sink refused, too). The writer is closed.
+int VCStreamWriter_end(VCStreamWriter* writer);
+
 // The next `rows` rows of RGBA, `pitch` bytes apart. 0 or VC_ERROR_CODEC_FAILED
 // (also for more rows than the picture has).
 int VCStreamWriter_writeRows(VCStreamWriter* writer, const unsigned char* rgba, size_t pitch,
