@@ -286,9 +286,13 @@ int VFilterBufferedProcessorImpl::drawThrough(const VCImage& input, unsigned cha
         source->setImageData(input, GL_CLAMP_TO_EDGE) != 0 || target->bindFrameBuffer() != 0) {
         return 0;  // logged where it failed
     }
-    // What the effect leaves undrawn is opaque black, in the target itself.
-    glClearColor(0, 0, 0, 1);
-    glClear(GL_COLOR_BUFFER_BIT);
+    // What the effect leaves undrawn is opaque black, in the target itself;
+    // the program's own opaque quad leaves nothing undrawn (a clear would
+    // cost a pass over the whole target for nothing).
+    if (!mProgram->getDrawFlag()) {
+        glClearColor(0, 0, 0, 1);
+        glClear(GL_COLOR_BUFFER_BIT);
+    }
     mProgram->setCameraGeometry(w, h, 0, 0);
     mProgram->setPreviewGeometry(w, h, false);
     const KivFilter* effect = mProgram->getFilter();

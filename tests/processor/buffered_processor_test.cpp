@@ -283,15 +283,16 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     EXPECT_EQ(255 - 60, out[0]);
 }
 
-// Each path clears the target itself (the pbuffer is not what is read back)
-// and binds it once to draw (once more only to build it): a draw that covers
-// nothing leaves opaque black, not the zeros of a fresh buffer.
+// For an effect that draws by itself each path clears the target itself (the
+// pbuffer is not what is read back) and binds it once to draw (once more only
+// to build it): a draw that covers nothing leaves opaque black, not the zeros
+// of a fresh buffer. (The program's own quad covers every pixel: no clear.)
 TEST_F(BufferedProcessorTest, UndrawnPixelsAreTheTargetsOwnOpaqueBlack) {
     const int w = 16, h = 8;
     const std::vector<uint8_t> rgba(w * h * 4, 200), nv21(w * h * 3 / 2, 200);
     std::vector<uint8_t> black;
     for (int i = 0; i < w * h; ++i) black.insert(black.end(), {0, 0, 0, 255});
-    ASSERT_EQ(0, mProcessor->setEffect(400));
+    ASSERT_EQ(0, mProcessor->setEffect(425));
     for (int path = 0; path < 3; ++path) {
         std::vector<uint8_t> out(w * h * 4, 0x5A);
         GlFault_resetBinds();
