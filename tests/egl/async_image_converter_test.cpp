@@ -16,7 +16,7 @@
 
 #include "support/frame_collector.h"
 #include "support/log_capture.h"
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
 
@@ -51,8 +51,8 @@ struct Expected {
     std::vector<bool> defined;
 };
 Expected cpuConversion(const VCImage& source, uint32_t format) {
-    VCImageHandle zeros(VCImage_createNew(source.width, source.height, format));
-    VCImageHandle ones(VCImage_createNew(source.width, source.height, format));
+    ImagePtr zeros(VCImage_createNew(source.width, source.height, format));
+    ImagePtr ones(VCImage_createNew(source.width, source.height, format));
     memset(zeros->data, 0, zeros->size);
     memset(ones->data, 0xFF, ones->size);
     Expected e{VCImage_convert(&source, zeros.get()), {}, {}};
@@ -95,7 +95,7 @@ TEST_P(ConverterPairs, MatchTheImageCoreByteForByte) {
     int n = 0;
     for (const Size& s : kSizes) {
         SCOPED_TRACE(testing::Message() << s.width << "x" << s.height);
-        VCImageHandle source = VCImageTest_random(s.width, s.height, from, n * 131 + from);
+        ImagePtr source = VCImageTest_random(s.width, s.height, from, n * 131 + from);
         ASSERT_NE(nullptr, source);
         const std::vector<uint8_t> original = VCImageTest_bytes(*source);
         const Expected want = cpuConversion(*source, to);
@@ -231,7 +231,7 @@ TEST(AsyncImageConverter, FramesArriveInOrderOnTheWorker) {
     sp<AsyncImageConverter> converter = new AsyncImageConverter(1);
     const int kFrames = 24;
     for (int i = 0; i < kFrames; ++i) {
-        VCImageHandle image = VCImageTest_random(32, 16 + 4 * (i % 3), VC_FORMAT_NV21, i);
+        ImagePtr image = VCImageTest_random(32, 16 + 4 * (i % 3), VC_FORMAT_NV21, i);
         ASSERT_EQ(0, converter->convertAndPost(image.get(), listener, i, false));
     }
     ASSERT_TRUE(listener.waitFor(kFrames));
@@ -262,7 +262,7 @@ TEST(ImageConverters, EveryFrameIsAccountedForAndFreed) {
                 const int k = p * kPerProducer + i;
                 FrameCollector& listener = *listeners[k % 3];
                 const bool take = (k / 3) % 2 == 0;
-                VCImageHandle image =
+                ImagePtr image =
                     k % 50 == 49 ? nullptr
                                  : VCImageTest_random(16, 8 + 4 * (k % 2), VC_FORMAT_RGBA, k);
                 VCImage* given = take ? image.release() : image.get();
@@ -314,7 +314,7 @@ TEST(ExternalConverter, FallbacksKeepTheFramesExact) {
     int n = 0;
     for (const Frame& f : frames) {
         FrameCollector listener(f.to);
-        VCImageHandle source = VCImageTest_random(f.width, f.height, f.from, 40 + n);
+        ImagePtr source = VCImageTest_random(f.width, f.height, f.from, 40 + n);
         const Expected want = cpuConversion(*source, f.to);
         ASSERT_EQ(0, want.status);
         ASSERT_EQ(0, postAsync(source.get(), listener, n, false));
@@ -339,7 +339,7 @@ TEST(ExternalConverter, FallbacksKeepTheFramesExact) {
         EXPECT_EQ(1u, log.count("VCConverter: Could not create this converter."));
         // 24 wide plays a conversion that works: its output is posted as is.
         log.clear();
-        VCImageHandle source = VCImageTest_random(24, 16, VC_FORMAT_RGBA, 9);
+        ImagePtr source = VCImageTest_random(24, 16, VC_FORMAT_RGBA, 9);
         const uint8_t mark = source->data[0] ^ 0x5A;
         ASSERT_EQ(0, postAsync(source.release(), rgbaToNv21, 5, true));
         ASSERT_EQ(1u, rgbaToNv21.frames().size());

@@ -22,7 +22,7 @@
 #include "support/log_capture.h"
 #include "support/look_reference.h"
 #include "support/open_files.h"
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
 
@@ -71,7 +71,7 @@ struct Rig {
 std::vector<uint8_t> expected(const std::vector<VCImage*>& pictures, uint32_t format) {
     std::vector<lookref::Picture> rgba;
     for (VCImage* p : pictures) {
-        VCImageHandle copy(VCImage_copyAndConvert(p, VC_FORMAT_RGBA));
+        ImagePtr copy(VCImage_copyAndConvert(p, VC_FORMAT_RGBA));
         rgba.emplace_back(p->width, p->height, VCImageTest_bytes(*copy));
     }
     std::vector<uint8_t> look = rgba.size() == 1 ? lookref::render(kSepia, rgba[0], nullptr)
@@ -79,9 +79,9 @@ std::vector<uint8_t> expected(const std::vector<VCImage*>& pictures, uint32_t fo
     if (rgba.size() == 2)
         for (size_t i = 0; i < look.size(); ++i)
             look[i] = static_cast<uint8_t>((rgba[0].rgba()[i] + rgba[1].rgba()[i] + 1) / 2);
-    VCImageHandle lookImage(
+    ImagePtr lookImage(
         VCImage_createWrap(look.data(), rgba[0].width(), rgba[0].height(), VC_FORMAT_RGBA, 0, 0));
-    VCImageHandle out(VCImage_copyAndConvert(lookImage.get(), format));
+    ImagePtr out(VCImage_copyAndConvert(lookImage.get(), format));
     return VCImageTest_bytes(*out);
 }
 
@@ -110,7 +110,7 @@ TEST_P(SnapshotPictures, MatchTheLookOnTheCpu) {
     Rig rig(c.pictures == 2 ? 20 : 10, c.asyncConverter);
     ASSERT_TRUE(rig.ok);
     FrameCollector listener(c.output);
-    std::vector<VCImageHandle> owned;
+    std::vector<ImagePtr> owned;
     std::vector<VCImage*> pictures;
     for (int i = 0; i < c.pictures; ++i) {
         owned.push_back(VCImageTest_random(c.width, c.height, c.input, 7 + i));
@@ -182,9 +182,9 @@ TEST(EglSnapShot, FittingAndCroppingAroundTheLargestTexture) {
     // 100x70 on a GPU of 64: fitted to 62x44, cropped at (18, 12).
     Platform::setMaximumTextureSizeForTesting(64);
     sp<EglSnapShot> snapshot = new EglSnapShot(gl.env(), 100, 70, converter);
-    VCImageHandle big = VCImageTest_random(100, 70, VC_FORMAT_RGBA, 3);
+    ImagePtr big = VCImageTest_random(100, 70, VC_FORMAT_RGBA, 3);
     log.clear();
-    VCImageHandle cropped(snapshot->cropImageSupportedSize(big.get()));
+    ImagePtr cropped(snapshot->cropImageSupportedSize(big.get()));
     ASSERT_NE(nullptr, cropped);
     EXPECT_TRUE(log.contains(VF_LOG_DEBUG,
                              "The input image is too big for this framebuffer! "
@@ -197,15 +197,15 @@ TEST(EglSnapShot, FittingAndCroppingAroundTheLargestTexture) {
                   memcmp(cropped->data + y * 62 * 4, big->data + ((12 + y) * 100 + 18) * 4, 62 * 4))
             << y;
     // A picture that fits is wrapped, not copied.
-    VCImageHandle small = VCImageTest_random(62, 40, VC_FORMAT_NV21, 4);
-    VCImageHandle wrapped(snapshot->cropImageSupportedSize(small.get()));
+    ImagePtr small = VCImageTest_random(62, 40, VC_FORMAT_NV21, 4);
+    ImagePtr wrapped(snapshot->cropImageSupportedSize(small.get()));
     EXPECT_EQ(small->data, wrapped->data);
     EXPECT_EQ(1, wrapped->wrapped);
     EXPECT_EQ(nullptr, snapshot->cropImageSupportedSize(nullptr));
     // A picture that cannot be cropped falls back to the whole of it.
-    VCImageHandle stream(VCImage_createWrap(big->data, 100, 70, VC_FORMAT_JPEG, 1000, 0));
+    ImagePtr stream(VCImage_createWrap(big->data, 100, 70, VC_FORMAT_JPEG, 1000, 0));
     log.clear();
-    VCImageHandle whole(snapshot->cropImageSupportedSize(stream.get()));
+    ImagePtr whole(snapshot->cropImageSupportedSize(stream.get()));
     EXPECT_EQ(big->data, whole->data);
     EXPECT_EQ(100, whole->width);
     EXPECT_EQ(1u, log.countPrefix("Failed to crop the input image (-"));
@@ -366,8 +366,8 @@ TEST(EglSnapShot, LogLinesAndStatuses) {
         Rig rig(row.pictures == 2 || row.pictures < 0 ? 20 : 10, false);
         ASSERT_TRUE(rig.ok);
         FrameCollector listener(row.format);
-        VCImageHandle a = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
-        VCImageHandle b = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 2);
+        ImagePtr a = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
+        ImagePtr b = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 2);
         gEglSnapShotClientWait = row.wait;
         const EglSnapShotCreateSync realCreate = gEglSnapShotCreateSync;
         if (row.noFence) gEglSnapShotCreateSync = noFences;
@@ -444,7 +444,7 @@ TEST_F(GlContextTest, CapturesWaitForThePreviousOne) {
     LogCapture log;
     Rig rig(10, false);
     ASSERT_TRUE(rig.ok);
-    VCImageHandle picture = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
+    ImagePtr picture = VCImageTest_random(16, 8, VC_FORMAT_RGBA, 1);
     for (bool runOut : {false, true}) {
         HoldingListener listener;
         sp<EglSnapShot> snapshot = new EglSnapShot(mGl->env(), 16, 8, rig.converter);
@@ -483,7 +483,7 @@ TEST_F(GlContextTest, ThousandsOfCapturesLeaveNothingBehind) {
     Rig rig(10, true);
     ASSERT_TRUE(rig.ok);
     FrameCollector listener(VC_FORMAT_NV21);
-    VCImageHandle picture = VCImageTest_random(16, 8, VC_FORMAT_NV21, 1);
+    ImagePtr picture = VCImageTest_random(16, 8, VC_FORMAT_NV21, 1);
     // Names are not reused at once, so what counts is how many are alive.
     auto liveObjects = [] {
         GLuint last = 0;
@@ -504,7 +504,7 @@ TEST_F(GlContextTest, ThousandsOfCapturesLeaveNothingBehind) {
         ASSERT_EQ(0, lite->initialize());
         for (int i = 0; i < kEach; ++i) {
             // Every fourth picture changes size, so images are made anew too.
-            VCImageHandle other = VCImageTest_random(16, 8 - 2 * (i % 4 == 3), VC_FORMAT_NV21, i);
+            ImagePtr other = VCImageTest_random(16, 8 - 2 * (i % 4 == 3), VC_FORMAT_NV21, i);
             VCImage* p = i % 4 == 3 ? other.get() : picture.get();
             const int status =
                 kind == 0 ? snapshot->takePictureSync(p, nullptr, rig.program, listener, i)

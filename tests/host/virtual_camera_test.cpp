@@ -21,7 +21,7 @@ extern "C" {
 #include "support/log_capture.h"
 #include "support/manual_clock.h"
 #include "support/temp_dir.h"
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
@@ -203,8 +203,8 @@ TEST(VirtualCameraTest, PicturesOfAFolderComeInTurnStretchedToTheCamera) {
         // Uniform: every luma and chroma sample is the colour's, converted once.
         uint8_t rgbaPixels[2 * 2 * 4], yuvPixels[6];
         for (int p = 0; p < 4; ++p) std::copy_n(colours[i % 2], 4, rgbaPixels + p * 4);
-        VCImageHandle rgba(VCImage_createWrap(rgbaPixels, 2, 2, VC_FORMAT_RGBA, 0, 0));
-        VCImageHandle yuv(VCImage_createWrap(yuvPixels, 2, 2, VC_FORMAT_NV21, 0, 0));
+        ImagePtr rgba(VCImage_createWrap(rgbaPixels, 2, 2, VC_FORMAT_RGBA, 0, 0));
+        ImagePtr yuv(VCImage_createWrap(yuvPixels, 2, 2, VC_FORMAT_NV21, 0, 0));
         ASSERT_EQ(VCImage_convert(rgba.get(), yuv.get()), 0);
         for (size_t b = 0; b < 32 * 16; ++b) ASSERT_EQ(nv21[b], yuvPixels[0]) << "picture " << i;
         for (size_t b = 32 * 16; b < nv21.size(); ++b) ASSERT_EQ(nv21[b], yuvPixels[4 + b % 2]);

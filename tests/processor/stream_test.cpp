@@ -17,7 +17,7 @@
 #include "core/egl/Platform.h"
 #include "core/filters/sce/singleCameraEffects.h"
 #include "support/temp_dir.h"
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_picture.h"
 
@@ -46,8 +46,8 @@ std::vector<int> factoryIds() {
 
 // A photo-like picture: colour ramps, rings and hard edges (which the
 // neighbour-reading effects pick out), alpha varying for PNG.
-VCImageHandle photo(int width, int height, bool alpha) {
-    VCImageHandle image(VCImage_createNew(width, height, VC_FORMAT_RGBA));
+ImagePtr photo(int width, int height, bool alpha) {
+    ImagePtr image(VCImage_createNew(width, height, VC_FORMAT_RGBA));
     for (int y = 0; y < height; ++y) {
         for (int x = 0; x < width; ++x) {
             unsigned char* p = image->data + (static_cast<size_t>(y) * width + x) * 4;
@@ -68,7 +68,7 @@ Bytes bytesOf(unsigned char* stream, size_t length) {
 }
 
 Bytes jpegOf(int width, int height) {
-    VCImageHandle jpeg(VCImage_encodeToJpeg(photo(width, height, false).get(), 90));
+    ImagePtr jpeg(VCImage_encodeToJpeg(photo(width, height, false).get(), 90));
     return Bytes(jpeg->data, jpeg->data + jpeg->size);
 }
 
@@ -113,9 +113,9 @@ protected:
     // path gets the effect fresh: some move on from frame to frame.
     Bytes whole(const Bytes& input, uint32_t format, bool png, int quality) {
         sProcessor->setEffect(GetParam());
-        VCImageHandle in(VCImage_createEmpty(0, 0, format));
+        ImagePtr in(VCImage_createEmpty(0, 0, format));
         EXPECT_EQ(0, VCImage_decodeFromJpeg(in.get(), input.data(), (int)input.size()));
-        VCImageHandle out(VCImage_createNew(in->width, in->height, VC_FORMAT_RGBA));
+        ImagePtr out(VCImage_createNew(in->width, in->height, VC_FORMAT_RGBA));
         const int rc = format == VC_FORMAT_NV21
                            ? sProcessor->doProcessNV21(in->data, in->width, in->height, out->data)
                            : sProcessor->doProcessRGBA(in->data, in->width, in->height, out->data,
@@ -126,7 +126,7 @@ protected:
             unsigned char* stream = VCPicture_encodePng(out.get(), &length);
             return bytesOf(stream, length);
         }
-        VCImageHandle jpeg(VCImage_encodeToJpeg(out.get(), quality));
+        ImagePtr jpeg(VCImage_encodeToJpeg(out.get(), quality));
         return Bytes(jpeg->data, jpeg->data + jpeg->size);
     }
 
@@ -271,9 +271,9 @@ TEST(StreamFile, ProcessFileWritesTheWholePathsFile) {
                       return got.c_str();
                   }));
         EXPECT_EQ(1, asked) << output;
-        VCImageHandle nv21(VCImage_createEmpty(0, 0, VC_FORMAT_NV21));
+        ImagePtr nv21(VCImage_createEmpty(0, 0, VC_FORMAT_NV21));
         ASSERT_EQ(0, VCImage_loadFromFile(nv21.get(), even.c_str()));
-        VCImageHandle rgba(VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA));
+        ImagePtr rgba(VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA));
         ASSERT_EQ(0, processor.doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data));
         ASSERT_EQ(0, VCImage_saveToFile(rgba.get(), want.c_str(), 98));
         EXPECT_TRUE(kivtest::readFile(got) == kivtest::readFile(want)) << output;

@@ -6,12 +6,12 @@
 
 #include "core/egl/EglProgram.h"
 #include "kivhost/VirtualCamera.h"
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 #include "vccore/vc_convert.h"
 
 std::vector<uint8_t> CameraFrames_nv21(uint64_t index, int width, int height) {
     std::vector<uint8_t> nv21(VCImage_requiredSize(width, height, VC_FORMAT_NV21));
-    VCImageHandle frame(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
+    ImagePtr frame(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
     auto generator = kivhost::VirtualCamera_generator(width, height);
     if (generator == nullptr || !generator->render(index, frame.get())) nv21.clear();
     return nv21;
@@ -20,8 +20,8 @@ std::vector<uint8_t> CameraFrames_nv21(uint64_t index, int width, int height) {
 std::vector<uint8_t> CameraFrames_rgba(uint64_t index, int width, int height) {
     std::vector<uint8_t> nv21 = CameraFrames_nv21(index, width, height);
     std::vector<uint8_t> rgba((size_t)width * height * 4);
-    VCImageHandle in(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
-    VCImageHandle out(VCImage_createWrap(rgba.data(), width, height, VC_FORMAT_RGBA, 0, 0));
+    ImagePtr in(VCImage_createWrap(nv21.data(), width, height, VC_FORMAT_NV21, 0, 0));
+    ImagePtr out(VCImage_createWrap(rgba.data(), width, height, VC_FORMAT_RGBA, 0, 0));
     if (nv21.empty() || VCImage_convert(in.get(), out.get()) != 0) rgba.clear();
     return rgba;
 }

@@ -2,10 +2,10 @@
 
 #include <chrono>
 
-#include "support/vc_image_handle.h"
+#include "support/image_ptr.h"
 
 void FrameCollector::onFrameProcessed(const VCImage& image, long long timestamp) {
-    VCImageHandle copy(VCImage_clone(&image));
+    ImagePtr copy(VCImage_clone(&image));
     CollectedFrame frame{image.width,
                          image.height,
                          image.format,

@@ -68,6 +68,54 @@ size_t LogCapture::countPrefix(const std::string& prefix, int level) const {
     });
 }
 
+namespace {
+
+bool lineMatches(const ExpectedLine& want, const LoggedLine& got) {
+    if (want.level != got.level) return false;
+    const std::string& t = want.text;
+    if (t.size() < 2 || t.compare(t.size() - 2, 2, ":#") != 0) return t == got.text;
+    const size_t head = t.size() - 1;
+    return got.text.size() > head && got.text.compare(0, head, t, 0, head) == 0 &&
+           got.text.find_first_not_of("0123456789", head) == std::string::npos;
+}
+
+}  // namespace
+
+::testing::AssertionResult LogCapture::matches(const std::vector<ExpectedLine>& expected) const {
+    const std::vector<LoggedLine> all = lines();
+    std::vector<LoggedLine> loud;
+    for (const LoggedLine& l : all)
+        if (l.level >= 3) loud.push_back(l);
+    auto dump = [&]() {
+        std::string text = "\n  logged:";
+        for (const LoggedLine& l : all) text += "\n    " + std::to_string(l.level) + " " + l.text;
+        return text;
+    };
+    size_t next = 0;
+    for (const ExpectedLine& want : expected) {
+        if (want.level >= 3) {
+            if (next >= loud.size() || !lineMatches(want, loud[next]))
+                return ::testing::AssertionFailure()
+                       << "expected " << want.level << " " << want.text << dump();
+            ++next;
+        } else if (std::none_of(all.begin(), all.end(),
+                                [&](const LoggedLine& l) { return lineMatches(want, l); })) {
+            return ::testing::AssertionFailure()
+                   << "missing " << want.level << " " << want.text << dump();
+        }
+    }
+    if (next != loud.size())
+        return ::testing::AssertionFailure() << "unexpected " << loud[next].text << dump();
+    return ::testing::AssertionSuccess();
+}
+
+::testing::AssertionResult LogCapture::matches(const std::vector<std::string>& expected) const {
+    std::vector<ExpectedLine> lines;
+    for (const std::string& e : expected)
+        lines.push_back({static_cast<int>(std::string("VDIWE").find(e[0])), e.substr(2)});
+    return matches(lines);
+}
+
 void LogCapture::clear() {
     std::lock_guard<std::mutex> guard(gLock);
     gLines.clear();

@@ -2,10 +2,21 @@
 #ifndef KIV_TESTS_LOG_CAPTURE_H
 #define KIV_TESTS_LOG_CAPTURE_H
 
+#include <gtest/gtest.h>
+
 #include <string>
 #include <vector>
 
+#include "vccore/vc_log.h"
+
 struct LoggedLine {
+    int level;
+    std::string text;
+};
+
+// A line a test expects. A text ending in ":#" stands for any source line
+// number there, as error reports end ("VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#").
+struct ExpectedLine {
     int level;
     std::string text;
 };
@@ -25,6 +36,12 @@ public:
     // for lines that end in a source line number, which moves with edits.
     size_t countPrefix(const std::string& prefix, int level = -1) const;
     void clear();
+    // Success when the warnings and errors logged are exactly the expected
+    // ones of those levels, in order, and each expected line of a lower
+    // level was logged too.
+    ::testing::AssertionResult matches(const std::vector<ExpectedLine>& expected) const;
+    // The same with each line written "<level letter> <text>": V, D, I, W or E.
+    ::testing::AssertionResult matches(const std::vector<std::string>& expected) const;
 
     LogCapture(const LogCapture&) = delete;
     LogCapture& operator=(const LogCapture&) = delete;

@@ -10,6 +10,8 @@
 #include <string>
 #include <vector>
 
+#include "support/test_picture.h"
+
 namespace lookref {
 
 // The ids of the thirteen fixed looks.
@@ -119,9 +121,7 @@ Expectation renderBeauty(const Picture& picture, const BeautyFace& face);
 // with a fine, smooth texture inside.
 std::vector<uint8_t> makeFacePicture(int width, int height);
 
-// Deterministic test picture: smooth gradients with sharp-edged blocks and a
-// few flat patches, alpha varying unless opaque.
-std::vector<uint8_t> makeTestPicture(int width, int height, bool opaque);
+using kivtest::makeTestPicture;
 
 }  // namespace lookref
 
