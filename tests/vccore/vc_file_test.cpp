@@ -158,6 +158,7 @@ TEST(VcFile, PngSaveStoresStraightAlpha) {
     for (const auto& f : failures) {
         EXPECT_EQ(f.status, VCImage_saveToFile(f.image.get(), dir.file(f.name).c_str(), 85))
             << f.name;
+        EXPECT_FALSE(fileExists(dir.file(f.name))) << f.name;  // no broken picture left
     }
 }
 

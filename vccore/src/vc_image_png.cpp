@@ -318,6 +318,7 @@ std::unique_ptr<VCStreamEncoder> VCPngEncoder_create(int width, int height) {
 }
 
 bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int height) {
+    // No pixels: refused before the file is touched.
     if (path == nullptr || rgba == nullptr || width < 1 || height < 1) return false;
     FILE* file = fopen(path, "wb");
     if (file == nullptr) return false;
@@ -329,6 +330,8 @@ bool VCPng_writeFile(const char* path, const unsigned char* rgba, int width, int
     }
     if (ferror(file)) ok = false;
     if (fclose(file) != 0) ok = false;
+    // A picture is whole or absent: a failed write leaves no broken file.
+    if (!ok) remove(path);
     return ok;
 }
 
