@@ -25,12 +25,8 @@ using kivtest::Bytes;
 
 // Noise compresses badly: its files are large for their size.
 std::string writeNoise(const std::string& file, int side) {
-    ImagePtr image(VCImage_createNew(side, side, VC_FORMAT_RGBA));
-    uint32_t state = 12345;
-    for (uint32_t i = 0; i < image->size; ++i) {
-        state = state * 1103515245u + 12345u;
-        image->data[i] = i % 4 == 3 ? 255 : static_cast<unsigned char>(state >> 16);
-    }
+    ImagePtr image = VCImageTest_random(side, side, VC_FORMAT_RGBA, 12345);
+    for (uint32_t i = 3; i < image->size; i += 4) image->data[i] = 255;
     size_t length = 0;
     unsigned char* png = VCPicture_encodePng(image.get(), &length);
     EXPECT_TRUE(kivtest::writeFile(file, Bytes(png, png + length)));
@@ -180,48 +176,18 @@ TEST_F(CliFiles, BadInputsAreRefusedWithTheirReason) {
     EXPECT_FALSE(exists("sheet.png"));
 }
 
-TEST_F(CliFiles, UnusualInputsAreRead) {
-    const int w = 48, h = 32;
-    Bytes inks(static_cast<size_t>(w) * h * 4);
-    for (size_t i = 0; i < inks.size(); ++i) inks[i] = static_cast<unsigned char>(90 + i % 4 * 40);
-    // A FIFO is read as it streams (a process substitution is one).
-    writePng("streamed.png", w, h);
+// A FIFO is read as it streams (a process substitution is one); its writer
+// gives up after a while should the tool never read.
+TEST_F(CliFiles, StreamedInputsAreRead) {
+    writePng("streamed.png", 48, 32);
     ASSERT_EQ(0, mkfifo(path("pipe.png").c_str(), 0644));
-    struct Case {
-        const char* name;
-        Bytes data;
-        std::string before;  // shell commands run first (the FIFO's writer)
-        int rgb[3];          // every output pixel, within 4 (-1: not checked)
-    } cases[] = {
-        // Adobe's inverted inks: each channel is ink × black / 255.
-        {"inks.jpg", kivtest::makeJpeg(w, h, JCS_CMYK, 4, JCS_CMYK, inks), "", {74, 107, 140}},
-        {"ycck.jpg", kivtest::makeJpeg(w, h, JCS_CMYK, 4, JCS_YCCK, inks), "", {74, 107, 140}},
-        // The writer gives up after a while should the tool never read.
-        {"pipe.png",
-         {},
-         "timeout 20 sh -c \"cat '" + path("streamed.png") + "' >'" + path("pipe.png") +
-             "'\" </dev/null >/dev/null 2>&1 & ",
-         {-1, -1, -1}},
-    };
-    std::vector<std::string> args = {"apply", "-e", "400", "-q", "100"};
-    for (const Case& c : cases) {
-        if (!c.data.empty()) {
-            ASSERT_TRUE(kivtest::writeFile(path(c.name), c.data));
-        }
-        args.push_back(path(c.name));
-    }
-    args.insert(args.end(), {"-o", path("read")});
-    CliResult r = run(args, cases[2].before);
+    CliResult r = run({"apply", "-e", "400", path("pipe.png"), "-o", path("read.png")},
+                      "timeout 20 sh -c \"cat '" + path("streamed.png") + "' >'" +
+                          path("pipe.png") + "'\" </dev/null >/dev/null 2>&1 & ");
     ASSERT_EQ(0, r.status) << r.err;
-    for (const Case& c : cases) {
-        ImagePtr out = load(path("read/") + c.name);
-        ASSERT_NE(nullptr, out) << c.name;
-        EXPECT_EQ(w, out->width) << c.name;
-        EXPECT_EQ(h, out->height) << c.name;
-        for (int ch = 0; ch < 3 && c.rgb[0] >= 0; ++ch)
-            for (int i = 0; i < w * h; ++i)
-                ASSERT_NEAR(c.rgb[ch], out->data[i * 4 + ch], 4) << c.name << " pixel " << i;
-    }
+    ImagePtr out = load(path("read.png"));
+    ASSERT_NE(nullptr, out);
+    EXPECT_EQ(48 * 100 + 32, out->width * 100 + out->height);
 }
 
 TEST_F(CliFiles, JpegsAreTurnedUprightAsTheirExifSays) {
@@ -276,22 +242,22 @@ TEST_F(CliFiles, OutputFormatFollowsTheLastExtension) {
     }
 }
 
+// Half-transparent and nearly transparent pixels keep their colour as they
+// are, through an effect that passes pixels on.
 TEST_F(CliFiles, StraightAlphaIsKeptExactly) {
-    // Half-transparent and nearly transparent pixels keep their colour as
-    // they are, through an effect that passes pixels on.
     const Bytes pixels = {100, 100, 100, 128, 250, 3, 77, 1, 9, 200, 31, 254, 0, 0, 0, 0};
-    ImagePtr image(VCImage_createNew(4, 4, VC_FORMAT_RGBA));
-    for (int i = 0; i < 16; ++i) memcpy(image->data + i * 4, &pixels[i % 4 * 4], 4);
+    Bytes picture;
+    for (int i = 0; i < 4; ++i) picture.insert(picture.end(), pixels.begin(), pixels.end());
     size_t length = 0;
-    unsigned char* png = VCPicture_encodePng(image.get(), &length);
+    unsigned char* png =
+        VCPicture_encodePng(VCImageTest_wrap(picture.data(), 4, 4, VC_FORMAT_RGBA).get(), &length);
     ASSERT_TRUE(kivtest::writeFile(path("alpha.png"), Bytes(png, png + length)));
     free(png);
     CliResult r = run({"apply", "-e", "400", path("alpha.png"), "-o", path("kept.png")});
     ASSERT_EQ(0, r.status) << r.err;
     ImagePtr out = load(path("kept.png"));
     ASSERT_NE(nullptr, out);
-    EXPECT_EQ(kivtest::Bytes(out->data, out->data + 64),
-              kivtest::Bytes(image->data, image->data + 64));
+    EXPECT_EQ(picture, VCImageTest_bytes(*out));
 }
 
 TEST_F(CliFiles, OutputsReplaceWholeWithUsualPermissions) {

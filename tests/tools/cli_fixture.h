@@ -1,28 +1,35 @@
-// Running the kivimaging program as a subprocess from a test, in a
-// temporary folder of its own, with pictures to feed it.
+// Running the kivimaging program as a subprocess from a test, in a temporary
+// folder of its own, with pictures to feed it.
 #ifndef KIV_TESTS_TOOLS_CLI_FIXTURE_H
 #define KIV_TESTS_TOOLS_CLI_FIXTURE_H
 
+#include <android/log.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
+#include <string.h>
 #include <sys/wait.h>
 
 #include <string>
 #include <vector>
 
-#include <android/log.h>
-
 #include "support/image_ptr.h"
 #include "support/log_capture.h"
 #include "support/temp_dir.h"
+#include "support/test_picture.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_picture.h"
 
 struct CliResult {
     int status;
-    std::string out;
-    std::string err;
+    std::string out, err;
 };
+
+// A picture file decoded to straight-alpha RGBA, or null.
+inline ImagePtr loadPicture(const std::string& file) {
+    ImagePtr image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
+    if (VCImage_loadFromFile(image.get(), file.c_str()) != VC_OK) image.reset();
+    return image;
+}
 
 class CliTest : public ::testing::Test {
 protected:
@@ -46,35 +53,20 @@ protected:
                 kivtest::readText(path("stderr"))};
     }
 
-    // A w×h PNG; with `flat` null its channels vary independently, else
-    // every pixel is `flat` (RGBA).
+    // A w x h PNG of the test picture, or of every pixel `flat` (RGBA).
     std::string writePng(const std::string& name, int w, int h, const uint8_t* flat = nullptr) {
-        ImagePtr image(VCImage_createNew(w, h, VC_FORMAT_RGBA));
-        EXPECT_NE(nullptr, image);
-        for (int y = 0; y < h; y++) {
-            for (int x = 0; x < w; x++) {
-                uint8_t* p = image->data + (y * w + x) * 4;
-                p[0] = flat ? flat[0] : static_cast<uint8_t>(x * 255 / (w - 1));
-                p[1] = flat ? flat[1] : static_cast<uint8_t>(y * 255 / (h - 1));
-                p[2] = flat ? flat[2] : static_cast<uint8_t>((x * 7 + y * 13) & 0xff);
-                p[3] = flat ? flat[3] : 255;
-            }
-        }
+        kivtest::Bytes pixels = kivtest::makeTestPicture(w, h, true);
+        for (int i = 0; flat != nullptr && i < w * h; i++) memcpy(&pixels[i * 4], flat, 4);
         size_t length = 0;
-        unsigned char* png = VCPicture_encodePng(image.get(), &length);
-        EXPECT_NE(nullptr, png);
-        std::string file = path(name);
-        EXPECT_TRUE(kivtest::writeFile(file, kivtest::Bytes(png, png + length)));
+        unsigned char* png = VCPicture_encodePng(
+            VCImageTest_wrap(pixels.data(), w, h, VC_FORMAT_RGBA).get(), &length);
+        EXPECT_TRUE(png != nullptr &&
+                    kivtest::writeFile(path(name), kivtest::Bytes(png, png + length)));
         free(png);
-        return file;
+        return path(name);
     }
 
-    // A picture file decoded to straight-alpha RGBA, or null.
-    static ImagePtr load(const std::string& file) {
-        ImagePtr image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
-        if (VCImage_loadFromFile(image.get(), file.c_str()) != VC_OK) image.reset();
-        return image;
-    }
+    static ImagePtr load(const std::string& file) { return loadPicture(file); }
 
     kivtest::TempDir mDir;
     LogCapture mQuiet;

@@ -1,37 +1,40 @@
 // The kivimaging program end to end, run as a subprocess: exit codes and
-// messages, the effect list, an effect applied to a file, the gallery.
+// messages, the effect list and how -e is resolved, an effect applied to a
+// file, and golden runs of the sample picture and the gallery's cells.
 #include <gtest/gtest.h>
 #include <stdio.h>
-#include <string.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <fstream>
+#include <set>
 #include <sstream>
 #include <string>
 #include <vector>
 
 #include "cli_fixture.h"
+#include "core/KivImaging.h"
 #include "effects.h"
+#include "font.h"
 
 namespace {
 
 using Cli = CliTest;
-using Result = CliResult;
+using kivtest::Bytes;
 
 TEST_F(Cli, UsageErrorsExitTwoWithAMessage) {
-    std::string in = writePng("in.png", 16, 8);
-    struct Case {
+    std::string in = writePng("in.png", 16, 8), o = path("o.png");
+    const struct {
         std::vector<std::string> args;
         const char* message;
     } cases[] = {
         {{}, "Usage: kivimaging <command>"},
         {{"frobnicate"}, "unknown command 'frobnicate'"},
-        {{"apply", in, "-o", path("o.png")}, "kivimaging apply: no effect given (-e)"},
-        {{"apply", "-e", "403", "-o", path("o.png")}, "kivimaging apply: no input file given"},
+        {{"apply", in, "-o", o}, "kivimaging apply: no effect given (-e)"},
+        {{"apply", "-e", "403", "-o", o}, "kivimaging apply: no input file given"},
         {{"apply", "-e", "403", in}, "kivimaging apply: no output given (-o)"},
-        {{"apply", "-e", "404", in, "-o", path("o.png")}, "no effect has id 404"},
-        {{"apply", "-e", "NoSuchLook", in, "-o", path("o.png")}, "unknown effect 'NoSuchLook'"},
+        {{"apply", "-e", "404", in, "-o", o}, "no effect has id 404"},
+        {{"apply", "-e", "NoSuchLook", in, "-o", o}, "unknown effect 'NoSuchLook'"},
         {{"apply", "-e", "403", in, "-o", path("o.bmp")}, "must end in .png, .jpg or .jpeg"},
         {{"apply", "-e", "403", "-q", "0", in, "-o", path("o.jpg")}, "--quality must be"},
         {{"apply", "-e", "403", in, "-o", in}, "would be overwritten by its result"},
@@ -44,37 +47,43 @@ TEST_F(Cli, UsageErrorsExitTwoWithAMessage) {
         {{"sample", "-o", path("s.png"), "--size", "10x10"}, "--size must be"},
         {{"effects", "extra"}, "unexpected argument 'extra'"},
     };
-    for (const Case& c : cases) {
-        Result r = run(c.args);
+    for (const auto& c : cases) {
+        CliResult r = run(c.args);
         EXPECT_EQ(2, r.status) << c.message;
         EXPECT_NE(std::string::npos, r.err.find(c.message)) << "stderr: " << r.err;
         // A command's refusal points at its --help.
-        if (c.args.size() > 1) {
-            EXPECT_NE(std::string::npos, r.err.find("--help'")) << r.err;
-        }
+        EXPECT_TRUE(c.args.size() < 2 || r.err.find("--help'") != std::string::npos) << r.err;
     }
-    // Nothing was written by a refused command.
-    EXPECT_FALSE(exists("o.png"));
-}
-
-TEST_F(Cli, HelpForEveryCommand) {
+    EXPECT_FALSE(exists("o.png"));  // nothing was written by a refused command
     for (const char* command : {"effects", "apply", "gallery", "sample"}) {
-        Result r = run({command, "--help"});
+        CliResult r = run({command, "--help"});
         EXPECT_EQ(0, r.status) << command;
         EXPECT_EQ(0u, r.out.find(std::string("Usage: kivimaging ") + command)) << r.out;
-        Result h = run({"help", command});
-        EXPECT_EQ(0, h.status);
-        EXPECT_EQ(r.out, h.out);
+        EXPECT_EQ(r.out, run({"help", command}).out);
     }
-    Result r = run({"--help"});
-    EXPECT_EQ(0, r.status);
-    EXPECT_NE(std::string::npos, r.out.find("gallery"));
+    EXPECT_NE(std::string::npos, run({"--help"}).out.find("gallery"));
 }
 
-TEST_F(Cli, EffectsListsWhatTheFactoryServes) {
+// The list is the factory's, row by row in id order; -e takes an id, a class
+// name in any case, or a filter-library name the catalog maps to an effect.
+TEST_F(Cli, EffectsAreTheFactorysAndResolveByIdOrName) {
     const std::vector<kivcli::EffectInfo> served = kivcli::effectList();
     ASSERT_FALSE(served.empty());
-    Result r = run({"effects"});
+    size_t factory = 0;
+    for (int id = 0; id < 1000; id++) {
+        KivFilter* f = KivImaging_create(id, nullptr);
+        factory += f != nullptr;
+        if (f != nullptr) {
+            auto it = std::find_if(served.begin(), served.end(),
+                                   [&](const kivcli::EffectInfo& e) { return e.id == id; });
+            EXPECT_TRUE(it != served.end() && it->filterType == f->getFilterType() &&
+                        static_cast<int>(it->options.size()) == KivImaging_getOptionsCount(f))
+                << id;
+        }
+        KivImaging_destroy(f);
+    }
+    EXPECT_EQ(factory, served.size());
+    CliResult r = run({"effects"});
     ASSERT_EQ(0, r.status) << r.err;
     std::istringstream lines(r.out);
     std::string line;
@@ -86,30 +95,48 @@ TEST_F(Cli, EffectsListsWhatTheFactoryServes) {
         char name[64] = {};
         if (sscanf(line.c_str(), "%d %63s %d", &id, name, &type) != 3) continue;
         ASSERT_LT(rows, served.size()) << line;
-        // Row by row the effects the factory really serves, in id order.
-        EXPECT_EQ(served[rows].id, id) << line;
-        EXPECT_EQ(served[rows].className, name) << line;
-        EXPECT_EQ(served[rows].filterType, type) << line;
+        EXPECT_EQ(std::to_string(served[rows].id) + " " + served[rows].className + " " +
+                      std::to_string(served[rows].filterType),
+                  std::to_string(id) + " " + name + " " + std::to_string(type));
+        EXPECT_EQ(std::string::npos, served[rows].className.find("::"));
         rows++;
     }
     EXPECT_EQ(served.size(), rows);
     EXPECT_NE(std::string::npos, r.out.find(std::to_string(served.size()) + " effects"));
+
+    const std::string film = "com.morvane.android.provider.filterprovider,libfilm.so";
+    const struct {
+        std::string arg;
+        int id;
+        std::string labelOrError;
+    } resolve[] = {
+        {"403", 403, "403 Negative"},
+        {"sEpIa", 401, "401 Sepia"},
+        {film, -1, film},
+        {"404", 0, "no effect has id 404 (see 'kivimaging effects')"},
+        {"2000", 0, "no effect has id 2000 (see 'kivimaging effects')"},
+        {"Sepiaa", 0, "unknown effect 'Sepiaa' (see 'kivimaging effects')"},
+        {"", 0, "empty effect name"},
+    };
+    for (const auto& c : resolve) {
+        kivcli::EffectChoice choice;
+        std::string error;
+        EXPECT_EQ(c.id != 0, kivcli::effectResolve(c.arg, &choice, &error)) << c.arg;
+        EXPECT_EQ(c.labelOrError, c.id != 0 ? choice.label : error);
+        EXPECT_EQ(c.id != 0 ? c.id : -1, choice.id) << c.arg;
+        EXPECT_EQ(c.id == -1 ? film : "", choice.library) << c.arg;
+    }
 }
 
 TEST_F(Cli, NegativeInvertsEveryChannel) {
     const int w = 37, h = 21;
-    std::string in = writePng("in.png", w, h);
-    std::string out = path("neg.png");
-    Result r = run({"apply", "-v", "-e", "403", in, "-o", out});
+    std::string in = writePng("in.png", w, h), out = path("neg.png");
+    CliResult r = run({"apply", "-v", "-e", "403", in, "-o", out});
     ASSERT_EQ(0, r.status) << r.err;
     EXPECT_NE(std::string::npos, r.out.find("403 Negative: " + out)) << r.out;
-
-    ImagePtr src = load(in);
-    ImagePtr dst = load(out);
-    ASSERT_NE(nullptr, src);
-    ASSERT_NE(nullptr, dst);
-    ASSERT_EQ(w, dst->width);
-    ASSERT_EQ(h, dst->height);
+    ImagePtr src = load(in), dst = load(out);
+    ASSERT_TRUE(src && dst);
+    ASSERT_EQ(w * 100 + h, dst->width * 100 + dst->height);
     int worst = 0;
     for (int i = 0; i < w * h; i++) {
         for (int c = 0; c < 3; c++)
@@ -117,37 +144,66 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
         ASSERT_EQ(255, dst->data[i * 4 + 3]) << "alpha at pixel " << i;
     }
     EXPECT_LE(worst, 2) << "largest deviation from 255-x, in 1/255";
-    // Not the identity: the input has dark and bright pixels alike.
-    EXPECT_GT(abs(src->data[0] - dst->data[0]), 200);
-
-    // The class name, in any case, selects the same effect. A JPEG result
-    // replaces an existing (here larger) file instead of writing into it.
+    // The class name selects the same effect. A JPEG result replaces an
+    // existing (here larger) file instead of writing into it.
     const std::string jpeg = path("neg.jpg");
     std::ofstream(jpeg, std::ios::binary | std::ios::trunc) << std::string(1 << 20, 'x');
     r = run({"apply", "-e", "negative", "-p", "intensity=10", in, "-o", jpeg});
     ASSERT_EQ(0, r.status) << r.err;
-    // Negative has no options: the parameter string is reported as ignored.
-    EXPECT_NE(std::string::npos, r.err.find("403 Negative takes no parameters; -p is ignored"))
-        << r.err;
+    EXPECT_NE(std::string::npos, r.err.find("403 Negative takes no parameters; -p is ignored"));
     struct stat st;
     ASSERT_EQ(0, stat(jpeg.c_str(), &st));
     EXPECT_LT(st.st_size, 1 << 20) << "the old file's tail survived";
-    ImagePtr again = load(jpeg);
-    ASSERT_NE(nullptr, again);
-    EXPECT_EQ(w, again->width);
+    ASSERT_NE(nullptr, load(jpeg));
+    EXPECT_EQ(w, load(jpeg)->width);
 }
 
-TEST_F(Cli, GalleryGridAndCells) {
-    // A flat colour, so that every thumbnail is flat too.
-    const uint8_t colour[4] = {200, 100, 40, 255};
-    std::string in = writePng("flat.png", 100, 50, colour);
-    const std::vector<kivcli::EffectInfo> served = kivcli::effectList();
-    ASSERT_FALSE(served.empty());
+// Golden pictures live in tests/tools/golden; with KIV_UPDATE_GOLDEN set they
+// are written instead of compared (after a deliberate change, looked at by eye).
+::testing::AssertionResult matchesGolden(const VCImage& got, const std::string& name,
+                                         int tolerance) {
+    const std::string file = std::string(KIV_TOOLS_GOLDEN_DIR "/") + name;
+    if (getenv("KIV_UPDATE_GOLDEN") != nullptr) {
+        size_t length = 0;
+        unsigned char* png = VCPicture_encodePng(&got, &length);
+        kivtest::writeFile(file, Bytes(png, png + length));
+        free(png);
+    }
+    ImagePtr want = loadPicture(file);
+    if (want == nullptr) return ::testing::AssertionFailure() << "no golden " << file;
+    if (want->width != got.width || want->height != got.height)
+        return ::testing::AssertionFailure() << got.width << "x" << got.height << ", golden "
+                                             << want->width << "x" << want->height;
+    for (uint32_t i = 0; i < VCImage_size(&got); ++i)
+        if (abs(want->data[i] - got.data[i]) > tolerance)
+            return ::testing::AssertionFailure()
+                   << name << ": pixel " << i / 4 % got.width << "," << i / 4 / got.width
+                   << " channel " << i % 4 << " is " << int(got.data[i]) << ", golden "
+                   << int(want->data[i]);
+    return ::testing::AssertionSuccess();
+}
 
-    std::string out = path("gallery.png");
-    Result r = run({"gallery", in, "-o", out, "--thumb", "40", "--columns", "5", "-p", "x=1"});
+// The sample picture: eight colour bars, grey and hue ramps, one-pixel
+// stripes and checkerboard, skin tones and primary ramps, opaque, exactly.
+TEST_F(Cli, GoldenSamplePicture) {
+    CliResult r = run({"sample", "-o", path("sample.png"), "--size", "320x240"});
     ASSERT_EQ(0, r.status) << r.err;
-    // The parameter string reaches only the effects that take one; the rest are counted.
+    ImagePtr image = load(path("sample.png"));
+    ASSERT_NE(nullptr, image);
+    EXPECT_TRUE(matchesGolden(*image, "sample_320x240.png", 0));
+    // Below 64 pixels a side there is no sample.
+    EXPECT_EQ(2, run({"sample", "-o", path("tiny.png"), "--size", "63x100"}).status);
+}
+
+// The gallery of the built-in sample: a grid of 48-pixel thumbnails padded by
+// 8 with a 13-pixel label row, the parameter text handed only to effects that
+// take one; the cells of NoEffect and Negative (thumbnail, and label cut to
+// the cell's width) match their golden crops.
+TEST_F(Cli, GoldenGalleryCells) {
+    const std::vector<kivcli::EffectInfo> served = kivcli::effectList();
+    CliResult r =
+        run({"gallery", "-o", path("gallery.png"), "--thumb", "48", "--columns", "5", "-p", "x=1"});
+    ASSERT_EQ(0, r.status) << r.err;
     int without = 0;
     for (const kivcli::EffectInfo& e : served)
         without += std::count(e.options.begin(), e.options.end(), "parameter") == 0;
@@ -155,35 +211,40 @@ TEST_F(Cli, GalleryGridAndCells) {
               r.err.find("warning: " + std::to_string(without) + " of " +
                          std::to_string(served.size()) + " effects take no parameters"))
         << r.err;
-    ImagePtr sheet = load(out);
+    ImagePtr sheet = load(path("gallery.png"));
     ASSERT_NE(nullptr, sheet);
-    // Thumbnails 40x20; cells padded by 8 with a 13-pixel label row.
-    int n = static_cast<int>(served.size());
-    EXPECT_EQ(std::min(5, n) * (40 + 8) + 8, sheet->width);
-    EXPECT_EQ((n + 4) / 5 * (20 + 13 + 8) + 8, sheet->height);
+    const int n = static_cast<int>(served.size()), thumbH = 32, cellW = 48 + 8,
+              cellH = thumbH + 13 + 8;
+    ASSERT_EQ(std::min(5, n) * cellW + 8, sheet->width);
+    ASSERT_EQ((n + 4) / 5 * cellH + 8, sheet->height);
     for (int i = 0; i < n; i++) {
-        const uint8_t* p =
-            sheet->data + ((8 + (i / 5) * 41 + 10) * sheet->width + 8 + (i % 5) * 48 + 20) * 4;
-        if (served[i].id == 400 || served[i].id == 403) {
-            for (int c = 0; c < 3; c++) {
-                int want = served[i].id == 400 ? colour[c] : 255 - colour[c];
-                EXPECT_NEAR(want, p[c], 2) << "cell of " << served[i].id;
-            }
-        }
+        if (served[i].id != 400 && served[i].id != 403) continue;
+        // The cell with its padding on every side: nothing may spill into it.
+        Bytes crop;
+        const int x0 = (i % 5) * cellW, y0 = (i / 5) * cellH;
+        for (int y = y0; y < y0 + cellH + 8; y++)
+            crop.insert(crop.end(), sheet->data + (y * sheet->width + x0) * 4,
+                        sheet->data + (y * sheet->width + x0 + cellW + 8) * 4);
+        EXPECT_TRUE(
+            matchesGolden(*VCImageTest_wrap(crop.data(), cellW + 8, cellH + 8, VC_FORMAT_RGBA),
+                          "gallery_cell_" + std::to_string(served[i].id) + ".png", 2));
     }
 }
 
-TEST_F(Cli, SampleWritesTheTestPicture) {
-    std::string out = path("sample.png");
-    Result r = run({"sample", "-o", out, "--size", "200x120"});
-    ASSERT_EQ(0, r.status) << r.err;
-    ImagePtr image = load(out);
-    ASSERT_NE(nullptr, image);
-    EXPECT_EQ(200, image->width);
-    EXPECT_EQ(120, image->height);
-    // Top-left is the white bar, top-right the black one.
-    EXPECT_EQ(255, image->data[0]);
-    EXPECT_EQ(0, image->data[199 * 4]);
+// What a golden label cannot show of the font: every printable character has
+// a glyph of its own, none empty but the space's, none malformed.
+TEST(CliFont, EveryPrintableCharacterHasItsOwnGlyph) {
+    EXPECT_EQ(0, kivcli::fontMalformedGlyphs());
+    std::set<std::string> seen;
+    for (char c = ' '; c <= '~'; c++) {
+        std::string bits;
+        for (int i = 0; i < kivcli::kGlyphWidth * kivcli::kGlyphHeight; i++)
+            bits += kivcli::fontGlyphPixel(c, i % kivcli::kGlyphWidth, i / kivcli::kGlyphWidth)
+                        ? '#'
+                        : '.';
+        EXPECT_EQ(c == ' ', bits.find('#') == std::string::npos) << c;
+        EXPECT_TRUE(seen.insert(bits).second) << "glyph of '" << c << "' repeats another";
+    }
 }
 
 }  // namespace
