@@ -15,7 +15,7 @@ public:
     }
     ~ProbeEffect() override { --sLive; }
 
-    int doEffect() override { return ++doEffectCalls; }
+    int doEffect() override { return 0; }
     int getFilterType() const override { return mType; }
     const char* getPkgAndFileName() override { return mPkg; }
     void onInputImageSet() override { ++inputSetCalls; }
@@ -28,7 +28,6 @@ public:
         mCallback = callback;
         mCallbackContext = context;
     }
-
     // Sends an event the way a picture-in-picture effect would.
     void report(const char* message) {
         if (mCallback != nullptr) mCallback(message, mCallbackContext);
@@ -38,14 +37,8 @@ public:
     const VCImage* inputImage() const { return mInputImage; }
     const VCImage* outputImage() const { return mOutputImage; }
 
-    int doEffectCalls = 0;
-    int inputSetCalls = 0;
-    int formatChangedCalls = 0;
-    int workChangedCalls = 0;
-    int rejectedFormat = 0;
-    bool wantsWorkImage = true;
-    bool valueFlagSupported = true;
-
+    int inputSetCalls = 0, formatChangedCalls = 0, workChangedCalls = 0, rejectedFormat = 0;
+    bool wantsWorkImage = true, valueFlagSupported = true;
     static inline std::atomic<int> sLive{0};  // instances alive, to see deletions (any thread)
 
 private:
@@ -59,14 +52,36 @@ private:
 // key=value pairs and an integer "kivtest_level" limited to 0…3.
 class TwoOptionEffect : public KivFilterWithOptions<TwoOptionEffect, ProbeEffect> {
 public:
-    static KivFilterOptionTable& optionTable();
-
+    static KivFilterOptionTable& optionTable() {
+        static VCOption_t records[] = {KivOption_string("parameter"),
+                                       KivOption_int("kivtest_level", 0, 3)};
+        static KivFilterOptionTable table(records);
+        return table;
+    }
     using KivFilter::getOption;
     using KivFilter::setOption;
-    int setOption(const char* name, const char* value) override;
-    int setOption(const char* name, int value) override;
-    VCOptionValue_t getOption(const char* name) const override;
-
+    int setOption(const char* name, const char* value) override {
+        const VCOption_t* option = matchOption(name);
+        if (option == nullptr || option->type != VCOPTION_TYPE_STRING) return 0;
+        intensity = VCOption_ParseStringF(value, "intensity", 1.0f);  // missing: neutral
+        return 1;
+    }
+    int setOption(const char* name, int value) override {
+        const VCOption_t* option = matchOption(name);
+        if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER) return 0;
+        if (!VCOption_CheckValueI(option, value)) return 0;
+        level = value;
+        return 1;
+    }
+    VCOptionValue_t getOption(const char* name) const override {
+        const VCOption_t* option = matchOption(name);
+        if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER)
+            return KivFilter::getOption(name);
+        VCOptionValue_t value{};
+        value.type = VCOPTION_TYPE_INTEGER;
+        value.value.i = level;
+        return value;
+    }
     float intensity = -1.0f;
     int level = 0;
 };
@@ -74,46 +89,11 @@ public:
 // Declares a "parameter" STRING option of its own: must share the key.
 class OneOptionEffect : public KivFilterWithOptions<OneOptionEffect, ProbeEffect> {
 public:
-    static KivFilterOptionTable& optionTable();
+    static KivFilterOptionTable& optionTable() {
+        static VCOption_t records[] = {KivOption_string("parameter")};
+        static KivFilterOptionTable table(records);
+        return table;
+    }
 };
-
-inline KivFilterOptionTable& TwoOptionEffect::optionTable() {
-    static VCOption_t records[] = {KivOption_string("parameter"),
-                                   KivOption_int("kivtest_level", 0, 3)};
-    static KivFilterOptionTable table(records);
-    return table;
-}
-
-inline int TwoOptionEffect::setOption(const char* name, const char* value) {
-    const VCOption_t* option = matchOption(name);
-    if (option == nullptr || option->type != VCOPTION_TYPE_STRING) return 0;
-    // A missing key means the neutral value.
-    intensity = VCOption_ParseStringF(value, "intensity", 1.0f);
-    return 1;
-}
-
-inline int TwoOptionEffect::setOption(const char* name, int value) {
-    const VCOption_t* option = matchOption(name);
-    if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER) return 0;
-    if (!VCOption_CheckValueI(option, value)) return 0;
-    level = value;
-    return 1;
-}
-
-inline VCOptionValue_t TwoOptionEffect::getOption(const char* name) const {
-    const VCOption_t* option = matchOption(name);
-    if (option == nullptr || option->type != VCOPTION_TYPE_INTEGER)
-        return KivFilter::getOption(name);
-    VCOptionValue_t value{};
-    value.type = VCOPTION_TYPE_INTEGER;
-    value.value.i = level;
-    return value;
-}
-
-inline KivFilterOptionTable& OneOptionEffect::optionTable() {
-    static VCOption_t records[] = {KivOption_string("parameter")};
-    static KivFilterOptionTable table(records);
-    return table;
-}
 
 #endif
