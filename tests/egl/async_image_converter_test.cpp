@@ -143,14 +143,9 @@ TEST_P(ConverterPairs, MatchTheImageCoreByteForByte) {
     }
 }
 
-std::string pairName(const testing::TestParamInfo<std::tuple<uint32_t, uint32_t>>& info) {
-    return VCImageTest_fourcc(std::get<0>(info.param)) + "_" +
-           VCImageTest_fourcc(std::get<1>(info.param));
-}
-
 INSTANTIATE_TEST_SUITE_P(AllFormats, ConverterPairs,
                          testing::Combine(testing::ValuesIn(kFormats), testing::ValuesIn(kFormats)),
-                         pairName);
+                         VCImageTest_pairName);
 
 TEST(AsyncImageConverter, SliceCountFollowsTheHeight) {
     const int table[][2] = {{720, 4}, {740, 2}, {738, 0}, {3000, 4}, {1084, 2}, {8, 4},
@@ -262,9 +257,9 @@ TEST(ImageConverters, EveryFrameIsAccountedForAndFreed) {
                 const int k = p * kPerProducer + i;
                 FrameCollector& listener = *listeners[k % 3];
                 const bool take = (k / 3) % 2 == 0;
-                ImagePtr image =
-                    k % 50 == 49 ? nullptr
-                                 : VCImageTest_random(16, 8 + 4 * (k % 2), VC_FORMAT_RGBA, k);
+                ImagePtr image = k % 50 == 49
+                                     ? nullptr
+                                     : VCImageTest_random(16, 8 + 4 * (k % 2), VC_FORMAT_RGBA, k);
                 VCImage* given = take ? image.release() : image.get();
                 int status;
                 if (k % 7 == 0) {

@@ -1,7 +1,7 @@
 // EglProgram on llvmpipe: what reaches the framebuffer for each geometry and
 // effect path (checked against a CPU mapping of the same quad), the default
-// fallbacks, effect replacement and failure, geometry and texture-unit rules,
-// and that repeated programs leave no GL object alive.
+// fallbacks, effect replacement and failure, geometry and texture-unit rules;
+// the fixture sees that no GL object is left alive.
 #include <GLES2/gl2.h>
 #include <GLES2/gl2ext.h>
 #include <gtest/gtest.h>
@@ -131,27 +131,6 @@ protected:
     sp<EglProgram> mProgram;
 };
 
-TEST(EglProgramTextTest, ShaderTextsAreExact) {
-    EXPECT_STREQ(EglProgram::kBaseFragmentCode,
-                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
-                 "lowp samplerExternalOES texSampler; varying highp vec2 v_texcoord; %s void "
-                 "main() { gl_FragColor = doEffect(); }");
-    EXPECT_STREQ(EglProgram::kBaseFragmentCode2,
-                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
-                 "lowp samplerExternalOES texSampler; uniform lowp samplerExternalOES "
-                 "texSampler2; varying highp vec2 v_texcoord; %s void main() { gl_FragColor = "
-                 "doEffect2(); }");
-    EXPECT_STREQ(EglProgram::kDefaultFragmentShader,
-                 "#extension GL_OES_EGL_image_external : require\nprecision mediump float; uniform "
-                 "lowp samplerExternalOES texSampler; varying highp vec2 v_texcoord; void main() { "
-                 "gl_FragColor.rgb = texture2D(texSampler, v_texcoord).rgb; gl_FragColor.a = 1.0; "
-                 "}");
-    EXPECT_STREQ(EglProgram::kDefaultFragmentShader2D,
-                 "precision mediump float; uniform lowp sampler2D texSampler; varying highp vec2 "
-                 "v_texcoord; void main() { gl_FragColor.rgb = texture2D(texSampler, "
-                 "v_texcoord).rgb; gl_FragColor.a = 1.0; }");
-}
-
 TEST(EglProgramGeometryTest, SettersValidateAndDefault) {
     sp<EglProgram> program = new EglProgram();
     EXPECT_EQ(program->getCameraMode(), 10);
@@ -221,12 +200,7 @@ TEST_F(EglProgramTest, EffectSnippetIsWrappedCompiledAndDrawn) {
         "vec4 doEffect() { vec4 c = texture2D(texSampler, v_texcoord); return vec4(1.0 - c.rgb, "
         "c.a); }");
     mProgram->setFilter(&filter);
-    LogCapture log;
     ASSERT_EQ(mProgram->initialize(10, false), 0);
-    EXPECT_TRUE(log.contains(
-        VF_LOG_DEBUG, "Loading effect fragment shader... mCameraMode = 10, getfilterType = 403"));
-    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "Successfully linked the GL program: #" +
-                                               std::to_string(mProgram->getProgramID())));
     normal();
     Pixels out = draw();
     ASSERT_EQ(out.size(), mSrc.size());
@@ -244,7 +218,6 @@ TEST_F(EglProgramTest, BrokenSnippetFallsBackToPassThrough) {
     ASSERT_EQ(mProgram->initialize(10, false), 0);
     EXPECT_TRUE(
         log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
-    EXPECT_TRUE(log.contains("Loading default fragment shader."));
     int result = -99;
     EXPECT_EQ(draw(&result), expectedFor(mSrc, EglProgram::GEOMETRY_VFLIP));
     EXPECT_EQ(result, 0);
@@ -283,9 +256,7 @@ TEST_F(EglProgramTest, ReplacingTheEffectReleasesTheOldOneAndReloadsOnTheNextFra
     mProgram->setFilter(&green);
     EXPECT_EQ(red.releasedWith, mProgram->getRecycler().get());
     EXPECT_EQ(green.loads, 0);  // nothing happens before the next frame
-    LogCapture log;
     out = draw();
-    EXPECT_TRUE(log.contains("Switching to new Effect Filter..."));
     EXPECT_EQ(green.loads, 1);
     for (size_t i = 0; i < out.size(); i += 4) {
         ASSERT_EQ(out[i], 0);
@@ -370,30 +341,6 @@ TEST_F(EglProgramTest, TextureUnitsAreHandedOutUpToTheLimit) {
         2u);
     mProgram->resetAvailableTextures();
     EXPECT_EQ(mProgram->getNextAvailableTexture(), 2);
-}
-
-TEST_F(EglProgramTest, RepeatedProgramsLeaveNoLiveGlObject) {
-    std::vector<GLuint> programs, shaders;
-    for (int i = 0; i < 15; i++) {
-        TestFilter filter("vec4 doEffect() { return texture2D(texSampler, v_texcoord); }");
-        filter.drawResult = (i % 3 == 2) ? -1 : 0;  // some take the failure path
-        sp<EglProgram> program = new EglProgram();
-        program->setFilter(&filter);
-        program->setPreviewGeometry(W, H, false);
-        ASSERT_EQ(program->initialize(10 + (i % 2) * 10, false), 0);
-        programs.push_back(program->getProgramID());
-        shaders.push_back(program->getShader()->getVertexId());
-        shaders.push_back(program->getShader()->getFragmentId());
-        program->onDrawFrame();
-        if (program->getShader() != nullptr) {
-            programs.push_back(program->getProgramID());
-            shaders.push_back(program->getShader()->getFragmentId());
-        }
-        program->release();
-        program->release();
-    }
-    for (GLuint p : programs) EXPECT_FALSE(glIsProgram(p)) << p;
-    for (GLuint s : shaders) EXPECT_FALSE(glIsShader(s)) << s;
 }
 
 }  // namespace

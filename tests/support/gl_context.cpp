@@ -193,9 +193,14 @@ std::vector<uint8_t> GlTest_bufferPixels(EGLDisplay display,
 void GlContextTest::SetUp() {
     mGl = new GlContext();
     ASSERT_TRUE(mGl->ok()) << "no EGL context (Mesa llvmpipe, EGL_PLATFORM=surfaceless)";
+    mLiveAtStart = GlTest_liveObjects(4096);
 }
 
 void GlContextTest::TearDown() {
+    // Every GL test is a leak test too, while its context is still current.
+    if (mGl->ok() && eglGetCurrentContext() == mGl->env()->getEGLContext()) {
+        EXPECT_EQ(mLiveAtStart, GlTest_liveObjects(4096)) << "GL objects the test left alive";
+    }
     delete mGl;
     mGl = nullptr;
 }

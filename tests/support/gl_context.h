@@ -97,12 +97,14 @@ private:
 std::vector<uint8_t> GlTest_bufferPixels(EGLDisplay display,
                                          const android::sp<android::GraphicBuffer>& buffer);
 
-// Fixture: a context per test; fails the test at once when it cannot be made.
+// Fixture: a context per test; fails the test at once when it cannot be
+// made, and at its end when it left GL objects alive in the context.
 class GlContextTest : public ::testing::Test {
 protected:
     void SetUp() override;
     void TearDown() override;
     GlContext* mGl = nullptr;
+    int mLiveAtStart = 0;
 };
 
 #endif
