@@ -1,14 +1,15 @@
-// The buffered processor end to end on llvmpipe: every fixed look through the
-// RGBA, BGRA and NV21 paths compared with the CPU statement of its math, the
-// effect fallbacks, status codes, log lines (also of driver failures injected
-// into the real GL), and GL objects and memory over many calls.
-#include <gtest/gtest.h>
-
+// The buffered processor end to end on llvmpipe: every fixed look through each
+// path (RGBA, BGRA, NV21 of even and odd height, NV21 as NV12) compared with
+// the CPU statement of its math, effect fallbacks, status codes and lines
+// (also of driver failures injected into the real GL), buffers of its own per
+// call, and GL objects and memory over many calls.
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
+#include <gtest/gtest.h>
 
 #include <cstdlib>
 #include <cstring>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -18,19 +19,17 @@
 #include "core/egl/Platform.h"
 #include "support/gl_context.h"
 #include "support/gl_fault.h"
-#include "support/open_files.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
-#include "vccore/vc_convert.h"
-#include "vccore/vc_image.h"
-#include "vccore/vc_log.h"
+#include "support/open_files.h"
 
 namespace {
 
-std::vector<uint8_t> swapRB(const std::vector<uint8_t>& in) {
-    std::vector<uint8_t> out(in);
-    for (size_t i = 0; i < out.size(); i += 4) std::swap(out[i], out[i + 2]);
-    return out;
+using Bytes = std::vector<uint8_t>;
+
+Bytes swapRB(Bytes in) {
+    for (size_t i = 0; i < in.size(); i += 4) std::swap(in[i], in[i + 2]);
+    return in;
 }
 
 class BufferedProcessorTest : public ::testing::Test {
@@ -41,245 +40,205 @@ protected:
         ASSERT_EQ(0, mProcessor->initialize());
     }
     void TearDown() override {
-        if (mProcessor != nullptr) {
-            mProcessor->release();
-            BufferedProcessor_Destroy(mProcessor);
-        }
+        if (mProcessor == nullptr) return;
+        mProcessor->release();
+        BufferedProcessor_Destroy(mProcessor);
+    }
+    int rgba(const Bytes& in, int w, int h, Bytes& out, uint32_t format = VC_FORMAT_RGBA) {
+        return mProcessor->doProcessRGBA(in.data(), w, h, out.data(), format);
     }
     VFilterBufferedProcessorImpl* mProcessor = nullptr;
 };
 
-}  // namespace
-
-TEST(BufferedProcessorApi, VersionCreateDestroyAndThreadRecord) {
+TEST(BufferedProcessorApi, CreateDestroyAndEffectSelection) {
     EXPECT_EQ(3, BufferedProcessor_GetVersion());
     LogCapture log;
-    VFilterBufferedProcessor* p = BufferedProcessor_Create();
-    ASSERT_NE(nullptr, p);
-    EXPECT_NE(nullptr, dynamic_cast<VFilterBufferedProcessorImpl*>(p));
+    VFilterBufferedProcessor* created = BufferedProcessor_Create();
+    ASSERT_NE(nullptr, dynamic_cast<VFilterBufferedProcessorImpl*>(created));
     EXPECT_TRUE(pthread_equal(pthread_self(), gOpenGLManagerThread));
-    BufferedProcessor_Destroy(p);
+    BufferedProcessor_Destroy(created);
     EXPECT_EQ(0u, static_cast<unsigned long>(gOpenGLManagerThread));
     BufferedProcessor_Destroy(nullptr);
-    std::vector<std::string> want = {"EGL: BufferedProcessor_Create",
-                                     "EGL: BufferedProcessor_Destroy",
-                                     "EGL: BufferedProcessor_Destroy"};
-    EXPECT_EQ(want, log.texts());
-}
-
-TEST(BufferedProcessorApi, EffectSelectionFallsBackToPassThrough) {
+    EXPECT_EQ(
+        std::vector<std::string>({"EGL: BufferedProcessor_Create", "EGL: BufferedProcessor_Destroy",
+                                  "EGL: BufferedProcessor_Destroy"}),
+        log.texts());
     VFilterBufferedProcessorImpl p;
-    LogCapture log;
     EXPECT_EQ(0, p.setEffectParameter("intensity=3"));  // nothing held: nothing happens
     EXPECT_EQ(nullptr, p.getEffect());
-    EXPECT_EQ(0, p.setEffect(401));
-    ASSERT_NE(nullptr, p.getEffect());
-    EXPECT_EQ(401, p.getEffect()->getFilterType());
-    EXPECT_TRUE(log.contains(1, "virtual int VFilterBufferedProcessorImpl::setEffect(int) : 401"));
-    for (int unknown : {-1, 404, 509, 1999}) {
-        EXPECT_EQ(0, p.setEffect(unknown));
-        ASSERT_NE(nullptr, p.getEffect());
-        EXPECT_EQ(400, p.getEffect()->getFilterType()) << unknown;
-    }
-    // An unknown library name goes through the shared selection: a
-    // downloadable filter, which stays without a plug-in (no such library).
+    // Unknown ids fall back to the pass-through look; an unknown library name
+    // is a downloadable filter (without a plug-in here); a built-in library
+    // name tries its own id first (501 has no effect here, so 400 follows).
     auto attempts = [&log]() {
-        std::vector<std::string> ids;
+        std::string ids;
         for (const std::string& l : log.texts())
-            if (l.rfind("Trying to instantiate effect ", 0) == 0) ids.push_back(l.substr(29));
+            if (l.rfind("Trying to instantiate effect ", 0) == 0) ids += l.substr(29) + " ";
+        log.clear();
         return ids;
     };
-    log.clear();
-    EXPECT_EQ(0, p.setEffect("no.such.package,libnothing.so"));
-    EXPECT_EQ((std::vector<std::string>{"2000"}), attempts());
-    EXPECT_EQ(2000, p.getEffect()->getFilterType());
-    // A built-in library name tries its own id (not a downloadable filter);
-    // 501 has no effect here, so 400 follows.
-    log.clear();
-    EXPECT_EQ(0, p.setEffect("com.morvane.android.provider.filterprovider,libfilm.so"));
-    EXPECT_EQ((std::vector<std::string>{"501", "400"}), attempts());
-    EXPECT_EQ(400, p.getEffect()->getFilterType());
-    EXPECT_EQ(0, p.setEffect(static_cast<const char*>(nullptr)));
-    ASSERT_NE(nullptr, p.getEffect());
-    EXPECT_EQ(400, p.getEffect()->getFilterType());
-    EXPECT_EQ(0, p.setEffect(443));
-    EXPECT_EQ(0, p.setEffectParameter("intensity=3"));
-    EXPECT_EQ(443, p.getEffect()->getFilterType());
-    EXPECT_TRUE(log.contains(1,
-                             "virtual int VFilterBufferedProcessorImpl::setEffect(const char*) "
-                             ": com.morvane.android.provider.filterprovider,libfilm.so"));
-    EXPECT_TRUE(log.contains(1,
-                             "virtual int VFilterBufferedProcessorImpl::setEffectParameter("
-                             "const char*) : intensity=3"));
+    const struct {
+        std::function<int()> set;
+        std::string tried;
+        int type;
+    } rows[] = {
+        {[&] { return p.setEffect(401); }, "401 ", 401},
+        {[&] { return p.setEffect(-1); }, "-1 400 ", 400},
+        {[&] { return p.setEffect(404); }, "404 400 ", 400},
+        {[&] { return p.setEffect(1999); }, "1999 400 ", 400},
+        {[&] { return p.setEffect("no.such.package,libnothing.so"); }, "2000 ", 2000},
+        {[&] { return p.setEffect("com.morvane.android.provider.filterprovider,libfilm.so"); },
+         "501 400 ", 400},
+        {[&] { return p.setEffect(static_cast<const char*>(nullptr)); }, "400 ", 400},
+        {[&] { return p.setEffect(443) + p.setEffectParameter("intensity=3"); }, "443 ", 443},
+    };
+    for (const auto& r : rows) {
+        log.clear();
+        EXPECT_EQ(0, r.set());
+        EXPECT_EQ(r.tried, attempts());
+        ASSERT_NE(nullptr, p.getEffect());
+        EXPECT_EQ(r.type, p.getEffect()->getFilterType());
+    }
     EXPECT_EQ(0, p.release());
 }
 
+// Bad arguments and a processor never initialised: statuses, their lines
+// (bindGLEnvironment's and the caller's), and the output untouched.
 TEST(BufferedProcessorApi, StatusCodesWithoutContextOrBuffers) {
     VFilterBufferedProcessorImpl p;
-    std::vector<uint8_t> in(16 * 4, 7), out(16 * 4, 0xAB);
-    LogCapture log;
-    EXPECT_EQ(-3, p.doProcessRGBA(nullptr, 4, 4, out.data(), VC_FORMAT_RGBA));
-    EXPECT_EQ(-3, p.doProcessRGBA(in.data(), 4, 4, nullptr, VC_FORMAT_BGRA));
-    EXPECT_EQ(-3, p.doProcessNV21(nullptr, 4, 4, out.data()));
-    EXPECT_EQ(-3, p.doProcessNV21(in.data(), 4, 4, nullptr));
-    // Never initialised: no surface to bind.
-    EXPECT_EQ(-7, p.doProcessRGBA(in.data(), 4, 4, out.data(), VC_FORMAT_RGBA));
-    EXPECT_EQ(-7, p.doProcessNV21(in.data(), 4, 4, out.data()));
-    EXPECT_EQ(std::vector<uint8_t>(16 * 4, 0xAB), out);
-    // bindGLEnvironment's line and the caller's own, for each call.
-    EXPECT_EQ(4u,
-              log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
+    Bytes in(16 * 4, 7), out(16 * 4, 0xAB);
+    const std::string kState = "E VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:#";
+    const struct {
+        std::function<int()> call;
+        int status;
+        std::vector<std::string> lines;
+    } rows[] = {
+        {[&] { return p.doProcessRGBA(nullptr, 4, 4, out.data(), VC_FORMAT_RGBA); }, -3, {}},
+        {[&] { return p.doProcessRGBA(in.data(), 4, 4, nullptr, VC_FORMAT_BGRA); }, -3, {}},
+        {[&] { return p.doProcessNV21(nullptr, 4, 4, out.data()); }, -3, {}},
+        {[&] { return p.doProcessNV21(in.data(), 4, 4, nullptr); }, -3, {}},
+        {[&] { return p.doProcessRGBA(in.data(), 4, 4, out.data(), VC_FORMAT_RGBA); },
+         -7,
+         {kState, kState}},
+        {[&] { return p.doProcessNV21(in.data(), 4, 4, out.data()); }, -7, {kState, kState}},
+    };
+    for (const auto& r : rows) {
+        LogCapture log;
+        EXPECT_EQ(r.status, r.call());
+        EXPECT_TRUE(log.matches(r.lines));
+    }
+    EXPECT_EQ(Bytes(16 * 4, 0xAB), out);
 }
 
-TEST_F(BufferedProcessorTest, EveryLookThroughRgbaAndBgra) {
-    // Odd sizes on purpose: no symmetry can hide a row or column mix-up.
-    const int w = 61, h = 47;
-    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
-    std::vector<uint8_t> bgraIn = swapRB(picture.rgba());
+// Odd RGBA sizes on purpose: no symmetry can hide a row or column mix-up.
+// 64x47 NV21 is padded to 64x48: with an even width the chroma block keeps
+// its layout, so rows 0..45 see the same neighbourhood as in the full picture
+// (the looks reach one texel up at most; the last row changed).
+enum Path { RGBA, BGRA, NV21, NV21_ODD_HEIGHT, NV21_AS_NV12 };
+
+class EveryLook : public BufferedProcessorTest, public ::testing::WithParamInterface<Path> {};
+
+TEST_P(EveryLook, MatchesItsCpuStatement) {
+    const Path path = GetParam();
+    const bool nv21 = path >= NV21;
+    const int w = nv21 ? 64 : 61, h = nv21 ? 48 : 47, rows = path == NV21_ODD_HEIGHT ? 46 : -1;
+    if (path == NV21_AS_NV12) setenv("KIV_PROP_ro_board_platform", "tavrix3", 1);
+    Platform::resetForTesting();
+    lookref::Nv21Picture yuv = nv21 ? lookref::makeNv21Picture(w, h) : lookref::Nv21Picture();
+    lookref::Picture picture(w, h, nv21 ? yuv.rgba : lookref::makeTestPicture(w, h, false));
+    Bytes input = path == BGRA ? swapRB(picture.rgba()) : nv21 ? yuv.nv21 : picture.rgba();
+    if (path == NV21_ODD_HEIGHT) input.erase(input.begin() + w * 47, input.begin() + w * 48);
+    LogCapture log;
     for (int id : lookref::lookIds()) {
         ASSERT_EQ(0, mProcessor->setEffect(id));
-        std::vector<uint8_t> out(w * h * 4, 0x5A);
-        ASSERT_EQ(
-            0, mProcessor->doProcessRGBA(picture.rgba().data(), w, h, out.data(), VC_FORMAT_RGBA));
-        lookref::expectLook(id, picture, out.data(), "RGBA");
-        std::vector<uint8_t> bgraOut(w * h * 4, 0x5A);
-        ASSERT_EQ(0,
-                  mProcessor->doProcessRGBA(bgraIn.data(), w, h, bgraOut.data(), VC_FORMAT_BGRA));
-        lookref::expectLook(id, picture, swapRB(bgraOut).data(), "BGRA");
+        Bytes out(w * h * 4, 0x5A);
+        ASSERT_EQ(0, nv21 ? mProcessor->doProcessNV21(input.data(), w, h - (rows > 0), out.data())
+                          : rgba(input, w, h, out, path == BGRA ? VC_FORMAT_BGRA : VC_FORMAT_RGBA));
+        lookref::expectLook(id, picture, (path == BGRA ? swapRB(out) : out).data(),
+                            std::to_string(path), rows);
+    }
+    unsetenv("KIV_PROP_ro_board_platform");
+    Platform::resetForTesting();
+    // Without a board property the only native input is RGBA; tavrix3 prefers NV12.
+    if (nv21) {
+        EXPECT_TRUE(
+            log.contains(VF_LOG_ERROR, std::string("Input format 'NV21' is not a native format for "
+                                                   "EglImage: Conversion required to ") +
+                                           (path == NV21_AS_NV12 ? "NV12" : "NV21")));
     }
 }
 
-TEST_F(BufferedProcessorTest, EveryLookThroughNv21EvenAndOddHeight) {
-    // 64x47 is padded to 64x48: with an even width the chroma block keeps its
-    // layout, so the padded picture is exact except for the added last row.
-    for (int h : {48, 47}) {
-        const int w = 64;
-        lookref::Nv21Picture even = lookref::makeNv21Picture(w, 48);
-        // h luma rows followed by the 24 chroma rows of the 48-row picture.
-        std::vector<uint8_t> input(size_t(w) * h + size_t(w) * 24);
-        memcpy(input.data(), even.nv21.data(), size_t(w) * h);
-        memcpy(input.data() + size_t(w) * h, even.nv21.data() + w * 48, size_t(w) * 24);
-        lookref::Picture picture(w, 48, even.rgba);
-        for (int id : lookref::lookIds()) {
-            ASSERT_EQ(0, mProcessor->setEffect(id));
-            std::vector<uint8_t> out(w * 48 * 4, 0x5A);
-            ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
-            // At odd height rows 0..45 see the same neighbourhood as in the full
-            // picture (the looks reach one texel up at most; the last row changed).
-            lookref::expectLook(id, picture, out.data(), h == 48 ? "NV21" : "odd-height NV21",
-                                h == 48 ? -1 : 46);
-        }
-    }
-}
+INSTANTIATE_TEST_SUITE_P(Paths, EveryLook,
+                         ::testing::Values(RGBA, BGRA, NV21, NV21_ODD_HEIGHT, NV21_AS_NV12));
 
 TEST_F(BufferedProcessorTest, OddNv21SizesArePaddedToEven) {
     const int w = 101, h = 75, pw = 102, ph = 76;
     // Luma rows of 101 bytes, then the chroma block the processor copies as is.
-    std::vector<uint8_t> input(w * h + pw * ph / 2, 128);
+    Bytes input(w * h + pw * ph / 2, 128);
     for (int y = 0; y < h; ++y)
         for (int x = 0; x < w; ++x) input[y * w + x] = static_cast<uint8_t>(16 + (x * 2 + y) % 200);
-    // Guard bytes after the padded picture must survive.
-    std::vector<uint8_t> out(pw * ph * 4 + 64, 0xEE);
+    Bytes out(pw * ph * 4 + 64, 0xEE);  // guard bytes after the padded picture must survive
     ASSERT_EQ(0, mProcessor->setEffect(400));
-    LogCapture log;
     ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
-    for (size_t i = pw * ph * 4; i < out.size(); ++i) ASSERT_EQ(0xEE, out[i]) << i;
-    // Every padded pixel was written (opaque from the pass-through look).
+    EXPECT_EQ(Bytes(64, 0xEE), Bytes(out.end() - 64, out.end()));
+    // Every padded pixel written (opaque from the pass-through look); neutral
+    // chroma: a pixel's grey is its luma (full range) in the first row.
     for (int i = 0; i < pw * ph; ++i) ASSERT_EQ(255, out[i * 4 + 3]) << i;
-    // Neutral chroma: a pixel's grey is its luma (full range) in the first rows.
     for (int x = 0; x < w; ++x) EXPECT_NEAR(input[x], out[x * 4 + 1], 2) << x;
-    // No board property: an unknown platform, whose only native input is RGBA.
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
-                             "Input format 'NV21' is not a native format for EglImage: "
-                             "Conversion required to NV21"));
-    EXPECT_TRUE(log.contains(1,
-                             "int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned "
-                             "char*, int, int, unsigned char*)"));
 }
 
+// Wider than any texture llvmpipe can hold, empty or negative: nothing drawn
+// or written, 0 (or -7 for NV21 that cannot be padded); usable afterwards.
 TEST_F(BufferedProcessorTest, FailedDrawLeavesOutputUntouchedAndReturnsZero) {
-    // Wider than any texture llvmpipe can hold: the buffer-backed images cannot
-    // be made, so nothing is drawn or read back.
     GLint maxSize = 0;
     ASSERT_EQ(0, mProcessor->bindGLEnvironment());
     glGetIntegerv(GL_MAX_TEXTURE_SIZE, &maxSize);
     mProcessor->unbindGLEnvironment();
     ASSERT_GT(maxSize, 0);
-    const int w = maxSize * 2, h = 1;
-    std::vector<uint8_t> in(size_t(w) * 4, 9), out(size_t(w) * 4, 0xC3);
+    Bytes in(size_t(maxSize) * 8, 9), out(size_t(maxSize) * 8, 0xC3), guard(64, 0xC3);
     mProcessor->setEffect(403);
     LogCapture log;
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
-    EXPECT_EQ(std::vector<uint8_t>(size_t(w) * 4, 0xC3), out);
-    EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
-    // Empty and negative sizes: nothing drawn, nothing written, no crash.
-    std::vector<uint8_t> guard(64, 0xC3);
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), 0, 0, guard.data(), VC_FORMAT_RGBA));
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), -4, 2, guard.data(), VC_FORMAT_BGRA));
+    EXPECT_EQ(0, rgba(in, maxSize * 2, 1, out));
+    EXPECT_EQ(0, rgba(in, 0, 0, guard));
+    EXPECT_EQ(0, rgba(in, -4, 2, guard, VC_FORMAT_BGRA));
     EXPECT_EQ(-7, mProcessor->doProcessNV21(in.data(), -3, 5, guard.data()));
-    EXPECT_EQ(std::vector<uint8_t>(64, 0xC3), guard);
-    // The processor is still usable afterwards, and logs the draw and its signature.
-    std::vector<uint8_t> small(4 * 4 * 4, 10), smallOut(4 * 4 * 4);
-    log.clear();
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(small.data(), 4, 4, smallOut.data(), VC_FORMAT_RGBA));
-    EXPECT_EQ(245, smallOut[0]);
-    EXPECT_EQ(10, smallOut[3]);
-    EXPECT_TRUE(log.contains(1,
-                             "int VFilterBufferedProcessorImpl::doProcessRGBA(const unsigned "
-                             "char*, int, int, unsigned char*, int)"));
+    EXPECT_EQ(Bytes(size_t(maxSize) * 8, 0xC3), out);
+    EXPECT_EQ(Bytes(64, 0xC3), guard);
+    EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
+    Bytes small(4 * 4 * 4, 10), smallOut(4 * 4 * 4);
+    EXPECT_EQ(0, rgba(small, 4, 4, smallOut));
+    EXPECT_EQ(Bytes({245, 245, 245, 10}), Bytes(smallOut.begin(), smallOut.begin() + 4));
     EXPECT_EQ(1u, log.count("EGL: Synchronously waiting for rendering..."));
-    // No 8K switch off msm8974.
-    for (const std::string& l : log.texts()) EXPECT_EQ(std::string::npos, l.find("8K_TEXTURES"));
-}
-
-TEST_F(BufferedProcessorTest, Nv21GoesThroughNv12WhereThePlatformPrefersIt) {
-    setenv("KIV_PROP_ro_board_platform", "tavrix3", 1);
-    Platform::resetForTesting();
-    const int w = 32, h = 24;
-    lookref::Nv21Picture nv21 = lookref::makeNv21Picture(w, h);
-    std::vector<uint8_t> out(w * h * 4, 0x5A);
-    ASSERT_EQ(0, mProcessor->setEffect(401));
-    LogCapture log;
-    int result = mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data());
-    unsetenv("KIV_PROP_ro_board_platform");
-    Platform::resetForTesting();
-    ASSERT_EQ(0, result);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR,
-                             "Input format 'NV21' is not a native format for EglImage: "
-                             "Conversion required to NV12"));
-    lookref::expectLook(401, lookref::Picture(w, h, nv21.rgba), out.data(), "NV21 as NV12");
+    EXPECT_EQ(0u, log.countPrefix("EGL: Enable GL_ENABLE_8K"));  // only on msm8974
 }
 
 TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
     const int w = 8, h = 6;
-    std::vector<uint8_t> in(w * h * 4, 60), out(w * h * 4, 0xC3);
+    Bytes in(w * h * 4, 60), out(w * h * 4, 0xC3);
     lookref::Nv21Picture nv21 = lookref::makeNv21Picture(w, h);
     ASSERT_EQ(0, mProcessor->setEffect(403));
     // The picture cannot be read back: drawn, logged, output untouched, 0.
     LogCapture log;
     GlFault_failPictureReads(2);
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_BGRA));
+    EXPECT_EQ(0, rgba(in, w, h, out, VC_FORMAT_BGRA));
     EXPECT_EQ(0, mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data()));
     GlFault_failPictureReads(0);
-    EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
     EXPECT_EQ(2u, log.count("EGL: Synchronously waiting for rendering..."));
     EXPECT_EQ(2u, log.count("EGL: Can't access this FBO's pixels"));
     EXPECT_EQ(2u, log.countPrefix("VC_ERROR_UNKNOWN (-1): core/VFilterBufferedProcessorImpl:"));
-
     // No program can be made: -7 before anything is drawn.
     log.clear();
     GlFault_failProgramCreations(1);
-    EXPECT_EQ(-7, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(-7, rgba(in, w, h, out));
     GlFault_failProgramCreations(0);
-    EXPECT_EQ(std::vector<uint8_t>(w * h * 4, 0xC3), out);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: Program could not be loaded."));
-    // bindGLEnvironment's line and the caller's.
-    EXPECT_EQ(2u,
-              log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:"));
-    EXPECT_EQ(0u, log.count("EGL: Synchronously waiting for rendering..."));
-
+    EXPECT_EQ(Bytes(w * h * 4, 0xC3), out);
+    EXPECT_TRUE(log.matches(
+        {"E Could not create a new program", "E VC_ERROR_UNKNOWN (-1): core/egl/EglShader:#",
+         "E VC_ERROR_ALLOC_FAILED (-5): core/egl/EglProgram:#",
+         "E EGL: Program could not be loaded.",
+         "E VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:#",
+         "E VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:#"}));
     // Both were passing: the next call draws the negative look.
-    EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
+    EXPECT_EQ(0, rgba(in, w, h, out));
     EXPECT_EQ(255 - 60, out[0]);
 }
 
@@ -289,17 +248,16 @@ TEST_F(BufferedProcessorTest, DriverFailuresInsideTheCall) {
 // of a fresh buffer. (The program's own quad covers every pixel: no clear.)
 TEST_F(BufferedProcessorTest, UndrawnPixelsAreTheTargetsOwnOpaqueBlack) {
     const int w = 16, h = 8;
-    const std::vector<uint8_t> rgba(w * h * 4, 200), nv21(w * h * 3 / 2, 200);
-    std::vector<uint8_t> black;
+    const Bytes pixels(w * h * 4, 200), nv21(w * h * 3 / 2, 200);
+    Bytes black;
     for (int i = 0; i < w * h; ++i) black.insert(black.end(), {0, 0, 0, 255});
     ASSERT_EQ(0, mProcessor->setEffect(425));
     for (int path = 0; path < 3; ++path) {
-        std::vector<uint8_t> out(w * h * 4, 0x5A);
+        Bytes out(w * h * 4, 0x5A);
         GlFault_resetBinds();
         GlFault_skipDraws(1);
         int result = path == 2 ? mProcessor->doProcessNV21(nv21.data(), w, h, out.data())
-                               : mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(),
-                                                           path ? VC_FORMAT_BGRA : VC_FORMAT_RGBA);
+                               : rgba(pixels, w, h, out, path ? VC_FORMAT_BGRA : VC_FORMAT_RGBA);
         GlFault_skipDraws(0);
         ASSERT_EQ(0, result) << path;
         EXPECT_EQ(black, out) << path;
@@ -307,11 +265,32 @@ TEST_F(BufferedProcessorTest, UndrawnPixelsAreTheTargetsOwnOpaqueBlack) {
     }
 }
 
+// No buffers are kept between calls: each call creates its own source and
+// target (and says so) and gets its own picture back, whatever the sizes in
+// between, even where the host recycles buffer memory.
+TEST_F(BufferedProcessorTest, EveryCallHasItsOwnBuffersAndPicture) {
+    mProcessor->setEffect(400);
+    const int sizes[][2] = {{16, 8}, {16, 8}, {10, 4}, {16, 8}};
+    LogCapture log;
+    int seed = 0;
+    for (const auto& s : sizes) {
+        Bytes in(size_t(s[0]) * s[1] * 4), out(in.size(), 0);
+        for (size_t i = 0; i < in.size(); ++i) in[i] = i % 4 == 3 ? 255 : uint8_t(i * 7 + ++seed);
+        EXPECT_EQ(0, rgba(in, s[0], s[1], out));
+        EXPECT_EQ(in, out) << s[0] << "x" << s[1] << " call " << seed;
+    }
+    for (std::string size : {"16x8", "10x4"}) {
+        const size_t calls = size == "16x8" ? 3 : 1;
+        const std::string head = "EglImage: Creating GraphicBuffer " + size;
+        EXPECT_EQ(log.count(head + " RGBA (format 1, usage 0x00000133)"), calls);  // sources
+        EXPECT_EQ(log.count(head + " RGBA (format 1, usage 0x00000333)"), calls);  // targets
+    }
+}
+
 TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
     const int w = 16, h = 12;
-    std::vector<uint8_t> rgba = lookref::makeTestPicture(w, h, false);
+    Bytes pixels = lookref::makeTestPicture(w, h, false), out(w * h * 4);
     lookref::Nv21Picture nv21 = lookref::makeNv21Picture(w, h);
-    std::vector<uint8_t> out(w * h * 4);
     // The fixed looks, and the effects that hold GL objects of their own
     // (colour, geometric, Beauty with a face), with a new parameter text
     // before every draw.
@@ -328,36 +307,28 @@ TEST_F(BufferedProcessorTest, NoGlObjectOrMemoryGrowthOverAThousandCalls) {
                            "tonemin=3158064,tonemax=16777200";
         mProcessor->setEffectParameter(text.c_str());
         if (i % 3 == 0) mProcessor->setEffect("com.morvane.unknown,libnone.so");
-        int r = (i % 2) ? mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(),
-                                                    i % 4 == 1 ? VC_FORMAT_BGRA : VC_FORMAT_RGBA)
-                        : mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data());
-        ASSERT_EQ(0, r) << i;
+        return (i % 2) ? rgba(pixels, w, h, out, i % 4 == 1 ? VC_FORMAT_BGRA : VC_FORMAT_RGBA)
+                       : mProcessor->doProcessNV21(nv21.nv21.data(), w, h, out.data());
     };
-    // Quiet: a thousand draws log a great deal.
-    LogCapture quiet;
-    for (int i = 0; i < 20; ++i) run(i);
+    LogCapture quiet;  // a thousand draws log a great deal
+    for (int i = 0; i < 20; ++i) ASSERT_EQ(0, run(i)) << i;
     // Counted during a bind with the same effect loaded (Brightness, with a
-    // program and shaders of its own) before and after.
+    // program and shaders of its own) before and after: only what a bind makes.
     auto liveDuringBind = [&]() {
         mProcessor->setEffect(431);
-        mProcessor->doProcessRGBA(rgba.data(), w, h, out.data(), VC_FORMAT_RGBA);
+        rgba(pixels, w, h, out);
         EXPECT_EQ(0, mProcessor->bindGLEnvironment());
         int live = GlTest_liveObjects(4096);
         mProcessor->unbindGLEnvironment();
         return live;
     };
-    const int before = liveDuringBind();
-    const int filesBefore = Test_openFiles();
-    for (int i = 20; i < 1020; ++i) {
-        run(i);
-        if (HasFatalFailure()) return;
-    }
-    const int after = liveDuringBind();
-    // Only what a bind makes is alive each time: the program and its shaders,
-    // and the effect's own program and shaders.
-    EXPECT_EQ(before, after);
+    const int before = liveDuringBind(), filesBefore = Test_openFiles();
+    for (int i = 20; i < 1020; ++i) ASSERT_EQ(0, run(i)) << i;
+    EXPECT_EQ(before, liveDuringBind());
+    EXPECT_LE(before, 5);
     EXPECT_EQ(filesBefore, Test_openFiles());
-    EXPECT_LE(after, 5);
     // Not current after a call: the context is bound only around each draw.
     EXPECT_EQ(EGL_NO_CONTEXT, eglGetCurrentContext());
 }
+
+}  // namespace

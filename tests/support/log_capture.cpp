@@ -70,6 +70,11 @@ size_t LogCapture::countPrefix(const std::string& prefix, int level) const {
 
 namespace {
 
+struct ExpectedLine {
+    int level;
+    std::string text;
+};
+
 bool lineMatches(const ExpectedLine& want, const LoggedLine& got) {
     if (want.level != got.level) return false;
     const std::string& t = want.text;
@@ -81,8 +86,11 @@ bool lineMatches(const ExpectedLine& want, const LoggedLine& got) {
 
 }  // namespace
 
-::testing::AssertionResult LogCapture::matches(const std::vector<ExpectedLine>& expected) const {
-    const std::vector<LoggedLine> all = lines();
+::testing::AssertionResult LogCapture::matches(const std::vector<std::string>& lines) const {
+    std::vector<ExpectedLine> expected;
+    for (const std::string& e : lines)
+        expected.push_back({static_cast<int>(std::string("VDIWE").find(e[0])), e.substr(2)});
+    const std::vector<LoggedLine> all = this->lines();
     std::vector<LoggedLine> loud;
     for (const LoggedLine& l : all)
         if (l.level >= 3) loud.push_back(l);
@@ -107,13 +115,6 @@ bool lineMatches(const ExpectedLine& want, const LoggedLine& got) {
     if (next != loud.size())
         return ::testing::AssertionFailure() << "unexpected " << loud[next].text << dump();
     return ::testing::AssertionSuccess();
-}
-
-::testing::AssertionResult LogCapture::matches(const std::vector<std::string>& expected) const {
-    std::vector<ExpectedLine> lines;
-    for (const std::string& e : expected)
-        lines.push_back({static_cast<int>(std::string("VDIWE").find(e[0])), e.substr(2)});
-    return matches(lines);
 }
 
 void LogCapture::clear() {

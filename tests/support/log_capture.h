@@ -14,13 +14,6 @@ struct LoggedLine {
     std::string text;
 };
 
-// A line a test expects. A text ending in ":#" stands for any source line
-// number there, as error reports end ("VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#").
-struct ExpectedLine {
-    int level;
-    std::string text;
-};
-
 // Installs a capturing VF_LogMsg for its lifetime and restores the previous one.
 class LogCapture {
 public:
@@ -37,10 +30,10 @@ public:
     size_t countPrefix(const std::string& prefix, int level = -1) const;
     void clear();
     // Success when the warnings and errors logged are exactly the expected
-    // ones of those levels, in order, and each expected line of a lower
-    // level was logged too.
-    ::testing::AssertionResult matches(const std::vector<ExpectedLine>& expected) const;
-    // The same with each line written "<level letter> <text>": V, D, I, W or E.
+    // ones of those levels, in order, and each expected line of a lower level
+    // was logged too. Each is written "<level letter> <text>" (V, D, I, W or
+    // E); a text ending in ":#" stands for any source line number there, as
+    // error reports end ("E VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#").
     ::testing::AssertionResult matches(const std::vector<std::string>& expected) const;
 
     LogCapture(const LogCapture&) = delete;

@@ -11,6 +11,7 @@
 // jpeglib.h needs stdio.h (FILE) before it.
 #include <jpeglib.h>
 
+#include <algorithm>
 #include <vector>
 
 #include "support/temp_dir.h"
@@ -91,6 +92,31 @@ inline Bytes makeJpeg(int width, int height, J_COLOR_SPACE input, int components
     Bytes out(stream, stream + length);
     free(stream);
     return out;
+}
+
+// The JPEG quality probe: the stream's luminance quantisation table, sorted
+// (their order does not matter for telling qualities apart), and libjpeg's
+// base table scaled for a quality as its encoder does it.
+inline std::vector<int> lumaTable(const Bytes& jpeg) {
+    for (size_t i = 2; i + 5 + 64 < jpeg.size(); ++i) {
+        if (jpeg[i] != 0xFF || jpeg[i + 1] != 0xDB || (jpeg[i + 4] & 0xF0) != 0) continue;
+        std::vector<int> q(jpeg.begin() + i + 5, jpeg.begin() + i + 5 + 64);
+        std::sort(q.begin(), q.end());
+        return q;
+    }
+    return {};
+}
+inline std::vector<int> lumaTableForQuality(int quality) {
+    static const int base[64] = {16,  11,  10,  16,  24, 40, 51,  61,  12,  12,  14,  19,  26,
+                                 58,  60,  55,  14,  13, 16, 24,  40,  57,  69,  56,  14,  17,
+                                 22,  29,  51,  87,  80, 62, 18,  22,  37,  56,  68,  109, 103,
+                                 77,  24,  35,  55,  64, 81, 104, 113, 92,  49,  64,  78,  87,
+                                 103, 121, 120, 101, 72, 92, 95,  98,  112, 100, 103, 99};
+    const int scale = quality < 50 ? 5000 / quality : 200 - quality * 2;
+    std::vector<int> q(64);
+    for (int i = 0; i < 64; ++i) q[i] = std::min(std::max((base[i] * scale + 50) / 100, 1), 255);
+    std::sort(q.begin(), q.end());
+    return q;
 }
 
 // Offset of the first byte after a marker's two bytes, or 0.

@@ -69,7 +69,7 @@ TEST_F(VcJpegFastCodec, EncodeGoesThroughTheFastCodec) {
     LogCapture log;
     EXPECT_EQ(nullptr,
               VCImage_encodeToJpeg(VCImageTest_wrap(bgr.data(), 8, 6, VC_FORMAT_BGR8).get(), 90));
-    EXPECT_TRUE(log.matches({{VF_LOG_ERROR, "Encoding failed (8x6 BGR8)"}}));
+    EXPECT_TRUE(log.matches({"E Encoding failed (8x6 BGR8)"}));
 }
 
 TEST_F(VcJpegFastCodec, DecodeTakesTheFastCodecsPixels) {

@@ -81,10 +81,10 @@ TEST(VcOptions, DuplicatesShareAKeyAndClashesAreRefused) {
     intruder.key = a.key;
     log.clear();
     EXPECT_EQ(0, VCOption_RegisterNew(&intruder));
-    EXPECT_TRUE(log.matches({{VF_LOG_ERROR,
-                              "ERROR: Trying to register new option with an already existing key! "
-                              "[key = " +
-                                  hex(a.key) + "]"}}));
+    EXPECT_TRUE(
+        log.matches({"E ERROR: Trying to register new option with an already existing "
+                     "key! [key = " +
+                     hex(a.key) + "]"}));
     EXPECT_EQ(1u, log.lines().size());
     EXPECT_EQ(&a, VCOption_FindById(a.key));
     EXPECT_EQ(nullptr, VCOption_FindByName("clash.intruder"));
