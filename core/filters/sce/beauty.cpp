@@ -137,7 +137,7 @@ Beauty::Beauty()
             mState.skinToneMax[f][k] = 1.0f;
         }
     }
-    computeBlurTable_l();
+    computeBlurTable(mState);
 }
 
 Beauty::~Beauty() {
@@ -175,16 +175,16 @@ bool Beauty::hasPrograms() const {
     return true;
 }
 
-void Beauty::computeBlurTable_l() {
-    const int row = std::max(mState.intensity - 1, 0);
+void Beauty::computeBlurTable(State& state) {
+    const int row = std::max(state.intensity - 1, 0);
     for (int i = 0; i < kTaps; ++i) {
         const float distance = kBlurTable[row][1][i];
-        mState.weight[i] = kBlurTable[row][0][i];
+        state.weight[i] = kBlurTable[row][0][i];
         // No blur size before the first frame: the rebuild fills them in.
-        mState.offsetH[i][0] = mState.blurWidth > 0 ? distance / mState.blurWidth : 0.0f;
-        mState.offsetH[i][1] = 0.0f;
-        mState.offsetV[i][0] = 0.0f;
-        mState.offsetV[i][1] = mState.blurHeight > 0 ? distance / mState.blurHeight : 0.0f;
+        state.offsetH[i][0] = state.blurWidth > 0 ? distance / state.blurWidth : 0.0f;
+        state.offsetH[i][1] = 0.0f;
+        state.offsetV[i][0] = 0.0f;
+        state.offsetV[i][1] = state.blurHeight > 0 ? distance / state.blurHeight : 0.0f;
     }
 }
 
@@ -206,7 +206,7 @@ int Beauty::setOption(const char* name, const char* value) {
     std::lock_guard<std::mutex> lock(mLock);
     if (intensity != mState.intensity) {
         mState.intensity = intensity;
-        computeBlurTable_l();
+        computeBlurTable(mState);
     }
     mState.faceCount = face;
     if (width == -1 || height == -1 || face < 1) return 1;
@@ -313,7 +313,7 @@ int Beauty::rebuildTargets(EglProgram& program, int blurWidth, int blurHeight) {
     std::lock_guard<std::mutex> lock(mLock);
     mState.blurWidth = blurWidth;
     mState.blurHeight = blurHeight;
-    computeBlurTable_l();
+    computeBlurTable(mState);
     return 0;
 }
 
@@ -351,7 +351,12 @@ int Beauty::onDrawFrame(EglProgram& program) {
             }
         }
         if (smooth) {
-            const State blur = getState();  // offsets for the current size
+            // One snapshot for the whole frame: a text set meanwhile shows on the
+            // next frame whole, never half in the blur and half in the compose.
+            State blur = state;
+            blur.blurWidth = blurWidth;
+            blur.blurHeight = blurHeight;
+            computeBlurTable(blur);
             program.resetAvailableTextures();
             const int unit = program.getNextAvailableTexture();
             if (unit < 0) return unit;

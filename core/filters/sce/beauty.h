@@ -82,7 +82,7 @@ public:
     bool hasBlurTargets() const { return mBlurA != nullptr && mBlurB != nullptr; }
 
 private:
-    void computeBlurTable_l();
+    static void computeBlurTable(State& state);
     void releaseTargets();
     int drawQuad(EglShader& shader, const float* texcoords);
     int rebuildTargets(EglProgram& program, int blurWidth, int blurHeight);
