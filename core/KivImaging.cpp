@@ -1,5 +1,7 @@
 #include "core/KivImaging.h"
 
+#include "core/KivFilter.h"
+
 // A null handle never reaches the effect: each entry answers with its neutral
 // value instead, so C callers can pass a failed create's result straight on.
 

@@ -1,19 +1,20 @@
 // C API over one effect object. The handle is the KivFilter itself; every
 // function accepts a null handle and then returns the documented neutral value
 // without calling anything (except KivImaging_getPkgAndFileName, which needs a
-// valid handle). Valid C as well as C++.
+// valid handle). Valid C as well as C++; the effect stays an opaque type to
+// clients in either language.
 #ifndef KIV_CORE_KIVIMAGING_H
 #define KIV_CORE_KIVIMAGING_H
 
 #include "vccore/vc_options.h"
 
 #ifdef __cplusplus
-#include "core/KivFilter.h"
+class KivFilter;
 extern "C" {
 #else
 typedef struct KivFilter KivFilter;
-typedef void (*KivFilterCallback)(const char* message, void* context);
 #endif
+typedef void (*KivFilterCallback)(const char* message, void* context);
 
 // Null for an unknown id; arg is the downloadable filter's name for id 2000.
 KivFilter* KivImaging_create(int id, void* arg);

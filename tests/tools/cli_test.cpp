@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "cli_fixture.h"
+#include "core/KivFilter.h"
 #include "core/KivImaging.h"
 #include "effects.h"
 #include "font.h"
