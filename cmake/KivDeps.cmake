@@ -1,4 +1,10 @@
 # Platform and third-party dependencies, all from Debian packages (scripts/setup-deps).
+# A device build finds its own (Android's platform libraries, not Debian's).
+if(ANDROID)
+  include(KivDepsAndroid)
+  return()
+endif()
+
 find_package(PkgConfig REQUIRED)
 find_package(Threads REQUIRED)
 
