@@ -1,8 +1,9 @@
 # The two commands a new machine needs: `make demo` and `make test`.
 PRESET ?= release
 JOBS ?= $(shell nproc)
+PREFIX ?= /usr/local
 
-.PHONY: deps build test test-asan test-tsan test-arm64 fuzz demo bench format clean
+.PHONY: deps build install test test-asan test-tsan test-arm64 fuzz demo bench format clean
 
 deps:
 	@scripts/setup-deps
@@ -10,6 +11,11 @@ deps:
 build: deps
 	@cmake --preset $(PRESET) >/dev/null
 	@cmake --build --preset $(PRESET) -j $(JOBS)
+
+# The library, its public headers, the kivimaging program, the CMake package
+# and the pkg-config file, into PREFIX.
+install: build
+	@cmake --install build/$(PRESET) --prefix $(PREFIX)
 
 test: build
 	@ctest --preset $(PRESET) -j $(JOBS)
