@@ -7,6 +7,9 @@
 
 #include <kivimaging/KivImaging.h>
 #include <kivimaging/vccore/vccore.h>
+#ifdef __cplusplus
+#include <kivimaging/VFilterBufferedProcessor.h>
+#endif
 
 #define W 13
 #define H 7
@@ -17,6 +20,24 @@ static int check(int ok, const char* what) {
     if (!ok) fprintf(stderr, "client: %s\n", what);
     return ok ? 0 : 1;
 }
+
+#ifdef __cplusplus
+/* C++ clients also reach the offline processor, which makes its own EGL context. */
+static int checkProcessor() {
+    VFilterBufferedProcessor* processor = BufferedProcessor_Create();
+    int bad = check(BufferedProcessor_GetVersion() == 3, "processor version");
+    if (check(processor != NULL, "no processor")) return 1;
+    bad |= check(processor->initialize() == 0, "processor initialize");
+    bad |= check(processor->setEffect(400) == 0, "processor effect");
+    bad |= check(processor->release() == 0, "processor release");
+    BufferedProcessor_Destroy(processor);
+    return bad;
+}
+#else
+static int checkProcessor(void) {
+    return 0;
+}
+#endif
 
 int main(int argc, char** argv) {
     static unsigned char in[BYTES], out[BYTES], bgra[BYTES];
@@ -61,6 +82,7 @@ int main(int argc, char** argv) {
     }
     VCImage_destroy(rgbaImage);
     VCImage_destroy(bgraImage);
+    bad |= checkProcessor();
     if (!bad) printf("client: %d pixels checked\n", W * H);
     return bad;
 }
