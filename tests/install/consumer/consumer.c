@@ -1,6 +1,6 @@
-/* A client of the installed library, in C (also compiled as C++): runs a
- * plug-in effect over an RGBA buffer through the effect C API, swaps the
- * result to BGRA through the image core, and checks every byte against its
+/* A client of the installed library, in C (also compiled as C++): runs the
+ * example Solarize plug-in over an RGBA buffer through the effect C API, swaps
+ * the result to BGRA through the image core, and checks every byte against its
  * own computation. argv[1] is the effect name "<package>,<library file>". */
 #include <stdio.h>
 #include <string.h>
@@ -14,7 +14,7 @@
 #define W 13
 #define H 7
 #define BYTES (4 * W * H)
-#define KEY 90
+#define THRESHOLD 100
 
 static int check(int ok, const char* what) {
     if (!ok) fprintf(stderr, "client: %s\n", what);
@@ -53,15 +53,16 @@ int main(int argc, char** argv) {
     filter = KivImaging_create(2000, argv[1]);
     if (check(filter != NULL, "the plug-in effect was not created")) return 1;
     bad |= check(KivImaging_supportsInputFormat(filter, (int)VC_FORMAT_RGBA) == 1, "RGBA refused");
-    bad |= check(KivImaging_supportsInputFormat(filter, (int)VC_FORMAT_NV21) == 0, "NV21 accepted");
-    bad |= check(KivImaging_setOptionByNameS(filter, "parameter", "key=90") == 1, "parameter");
+    bad |= check(KivImaging_supportsInputFormat(filter, (int)VC_FORMAT_YV12) == 0, "YV12 accepted");
+    bad |=
+        check(KivImaging_setOptionByNameS(filter, "parameter", "threshold=100") == 1, "parameter");
     bad |= check(KivImaging_setInputImage(filter, in, W, H, (int)VC_FORMAT_RGBA, 0) == 0, "input");
     bad |=
         check(KivImaging_setOutputImage(filter, out, W, H, (int)VC_FORMAT_RGBA, 0) == 0, "output");
     bad |= check(KivImaging_init(filter) == 0, "init");
     bad |= check(KivImaging_doEffect(filter) == 0, "doEffect");
     for (i = 0; i < BYTES && !bad; i++) {
-        unsigned char want = (unsigned char)(i % 4 == 3 ? in[i] : in[i] ^ KEY);
+        unsigned char want = (unsigned char)(i % 4 == 3 || in[i] < THRESHOLD ? in[i] : 255 - in[i]);
         if (out[i] != want) {
             fprintf(stderr, "client: byte %d is %d, want %d\n", i, out[i], want);
             bad = 1;

@@ -15,9 +15,9 @@ set_source_files_properties(consumer.c PROPERTIES LANGUAGE CXX)
 target_link_libraries(client PRIVATE kivimaging::kivimaging)
 
 # A plug-in needs the SDK header, not the library.
-add_library(xor_filter SHARED xor_filter.cpp)
-set_target_properties(xor_filter PROPERTIES OUTPUT_NAME xor CXX_VISIBILITY_PRESET hidden)
-target_include_directories(xor_filter PRIVATE
+add_library(solarize SHARED solarize.cpp)
+set_target_properties(solarize PROPERTIES CXX_VISIBILITY_PRESET hidden)
+target_include_directories(solarize PRIVATE
   $<TARGET_PROPERTY:kivimaging::kivimaging,INTERFACE_INCLUDE_DIRECTORIES>)
 
 # Every installed header alone in a translation unit, with the package's flags
