@@ -88,8 +88,7 @@ bool writeSepiaMatrix(const std::string& path) {
 }  // namespace
 
 int main() {
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
+    quietHeadless();
     std::vector<std::pair<int, int>> sizes = {{4000, 3000}, {8000, 6000}};
     if (const char* env = getenv("KIV_APPLY_SIZES")) {
         sizes.clear();

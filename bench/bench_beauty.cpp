@@ -24,6 +24,7 @@
 #include <string>
 #include <vector>
 
+#include "bench_common.h"
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglImage.h"
 #include "core/egl/EglNativeSeam.h"
@@ -36,6 +37,8 @@
 
 namespace {
 
+using namespace kivbench;
+
 constexpr int kWidth = 1920;
 constexpr int kHeight = 1080;
 constexpr int kRounds = 9;
@@ -43,13 +46,6 @@ constexpr int kFramesPerRound = 8;
 const char kFace[] =
     "face=1,intensity=3,width=1920,height=1080,left=660,top=240,right=1260,bottom=900,"
     "tonemin=7360576,tonemax=16771288";
-
-void quietLog(int, const char*, ...) {}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
-}
 
 double now() {
     return std::chrono::duration<double>(std::chrono::steady_clock::now().time_since_epoch())
@@ -324,9 +320,7 @@ void report(const char* name, const Pair& p, const char* target) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
-    setenv("EGL_PLATFORM", "surfaceless", 0);
+    quietHeadless();
     benchmark::Initialize(&argc, argv);
     benchmark::RunSpecifiedBenchmarks();
     benchmark::Shutdown();

@@ -21,6 +21,7 @@
 #include <string>
 #include <vector>
 
+#include "bench_common.h"
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglProgram.h"
@@ -33,19 +34,14 @@
 
 namespace {
 
+using namespace kivbench;
+
 constexpr int kWidth = 1920;
 constexpr int kHeight = 1080;
 constexpr int kRuns = 40;
 
 std::vector<double> gOurs, gBare;
 bool gWrongFrame = false;
-
-void quietLog(int, const char*, ...) {}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
-}
 
 GLuint makeTarget(GLuint* texture) {
     glGenTextures(1, texture);
@@ -219,9 +215,7 @@ BENCHMARK(BM_CameraLatch_Interleaved)
 }  // namespace
 
 int main(int argc, char** argv) {
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
-    if (getenv("EGL_PLATFORM") == nullptr) setenv("EGL_PLATFORM", "surfaceless", 0);
+    quietHeadless();
     benchmark::Initialize(&argc, argv);
     benchmark::RunSpecifiedBenchmarks();
     benchmark::Shutdown();

@@ -25,6 +25,7 @@
 #include <random>
 #include <vector>
 
+#include "bench_common.h"
 #include "core/egl/AsyncImageConverter.h"
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglExtensions.h"
@@ -37,19 +38,10 @@
 
 namespace {
 
+using namespace kivbench;
+
 const int kWidth = 4000, kHeight = 3000, kRounds = 7;
 using Clock = std::chrono::steady_clock;
-
-void silentLog(int, const char*, ...) {}
-
-double seconds(Clock::time_point a, Clock::time_point b) {
-    return std::chrono::duration<double>(b - a).count();
-}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0 : v[v.size() / 2];
-}
 
 class Listener : public OnFrameListener {
 public:
@@ -123,8 +115,7 @@ struct Floor {
 }  // namespace
 
 int main() {
-    VF_LogMsg = silentLog;
-    setenv("EGL_PLATFORM", "surfaceless", 0);
+    quietHeadless();
     android::sp<EglEnvironment> env = new EglEnvironment();
     android::sp<EglWindowSurface> surface = new EglWindowSurface(env);
     if (env->initialize() != 0 || surface->initialize() != 0 || surface->bindSurface() != 0) {

@@ -31,6 +31,7 @@
 #include <string>
 #include <vector>
 
+#include "bench_common.h"
 #include "vc_image_convert_fast.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
@@ -41,7 +42,7 @@
 
 namespace {
 
-void silentLog(int, const char*, ...) {}
+using namespace kivbench;
 
 struct Case {
     const char* name;
@@ -160,12 +161,6 @@ void registerAll() {
     }
 }
 
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    const size_t n = v.size();
-    return n == 0 ? 0.0 : (n % 2 ? v[n / 2] : (v[n / 2 - 1] + v[n / 2]) / 2);
-}
-
 // Paired rounds of one case and size (see the header comment).
 struct Paired {
     double oursMin = 0, peerMin = 0, copyMin = 0, pairedMedian = 0;
@@ -225,7 +220,7 @@ Paired measure(const Case& c, Size s) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    VF_LogMsg = silentLog;  // the per-call debug line is not what is measured
+    VF_LogMsg = quietLog;  // the per-call debug line is not what is measured
     // KIV_BENCH_CONVERT_LEVEL caps the vector level (0 scalar, 1 SSE2 or
     // NEON, 2 AVX2).
     const char* cap = getenv("KIV_BENCH_CONVERT_LEVEL");

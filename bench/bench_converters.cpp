@@ -31,6 +31,7 @@
 #include <thread>
 #include <vector>
 
+#include "bench_common.h"
 #include "core/egl/AsyncImageConverter.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
@@ -41,13 +42,9 @@
 
 namespace {
 
-void silentLog(int, const char*, ...) {}
+using namespace kivbench;
 
 using Clock = std::chrono::steady_clock;
-
-double seconds(Clock::time_point a, Clock::time_point b) {
-    return std::chrono::duration<double>(b - a).count();
-}
 
 // Counts the frames it is handed and lets the bench wait for the next one.
 class WaitingListener : public OnFrameListener {
@@ -137,20 +134,6 @@ struct Setup {
     bool ok = true;
 };
 
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    const size_t n = v.size();
-    return n == 0 ? 0.0 : (n % 2 ? v[n / 2] : (v[n / 2 - 1] + v[n / 2]) / 2);
-}
-
-struct Spread {
-    double median, low, high;
-};
-Spread spread(const std::vector<double>& v) {
-    return {median(v), *std::min_element(v.begin(), v.end()),
-            *std::max_element(v.begin(), v.end())};
-}
-
 // Rounds of blocks of runs, sides in a rotating order; per side the block
 // minima of every round.
 std::vector<std::vector<double>> pairedRounds(const std::vector<std::function<double()>>& sides,
@@ -214,7 +197,7 @@ void registerAll() {
 }  // namespace
 
 int main(int argc, char** argv) {
-    VF_LogMsg = silentLog;  // the converters' per-frame lines are not what is measured
+    VF_LogMsg = quietLog;  // the converters' per-frame lines are not what is measured
     if (argc > 1) {
         registerAll();
         benchmark::Initialize(&argc, argv);

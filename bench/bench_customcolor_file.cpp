@@ -167,8 +167,7 @@ BENCHMARK(BM_CustomColorFile_VipsStartup)
 
 int main(int argc, char** argv) {
     // Per-call debug lines would be timed too; errors still show.
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
+    quietHeadless();
     gDir = makeTempDir("bench_customcolor_file");
     // The intermediates are large: keep them in memory where there is a tmpfs.
     struct stat st;

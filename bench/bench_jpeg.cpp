@@ -12,17 +12,18 @@
 #include <string>
 #include <vector>
 
+#include "bench_common.h"
 #include "vc_image_codec.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 
 namespace {
 
+using namespace kivbench;
+
 const int kWidth = 4000;
 const int kHeight = 3000;
 const int kQuality = 90;
-
-void quietLog(int, const char*, ...) {}
 
 // Smooth gradients with sensor-like noise, so the entropy coder has real work.
 VCImage* cameraPicture() {
@@ -51,10 +52,6 @@ struct Totals {
 std::map<std::string, Totals> gTotals;
 
 using Clock = std::chrono::steady_clock;
-
-double seconds(Clock::time_point a, Clock::time_point b) {
-    return std::chrono::duration<double>(b - a).count();
-}
 
 void report(benchmark::State& state, const char* name, double ours, double peer) {
     state.counters["ours_ms"] = benchmark::Counter(ours * 1e3 / state.iterations());

@@ -17,11 +17,14 @@
 #include <chrono>
 #include <vector>
 
+#include "bench_common.h"
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"
 
 namespace {
+
+using namespace kivbench;
 
 constexpr int kWidth = 1920;
 constexpr int kHeight = 1080;
@@ -33,18 +36,11 @@ std::vector<double> gOurs, gBare;
 std::vector<double> gProgram;
 bool gWrongOutput = false;
 
-void quietLog(int, const char*, ...) {}
-
 // Largest byte difference; the pass-through must give back what went in.
 int maxDifference(const std::vector<unsigned char>& a, const std::vector<unsigned char>& b) {
     int worst = a.size() == b.size() ? 0 : 256;
     for (size_t i = 0; i < a.size() && i < b.size(); i++) worst = std::max(worst, abs(a[i] - b[i]));
     return worst;
-}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
 }
 
 // The same GPU pass, with nothing around it.
@@ -233,9 +229,7 @@ BENCHMARK(BM_NoEffectRgba_Interleaved)
 
 int main(int argc, char** argv) {
     // Per-call debug lines would be timed too; errors still show.
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
-    if (getenv("EGL_PLATFORM") == nullptr) setenv("EGL_PLATFORM", "surfaceless", 0);
+    quietHeadless();
 
     gInput.resize(static_cast<size_t>(kWidth) * kHeight * 4);
     gOutput.assign(gInput.size(), 0);

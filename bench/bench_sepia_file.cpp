@@ -150,8 +150,7 @@ BENCHMARK(BM_SepiaFile_VipsStartup)
 
 int main(int argc, char** argv) {
     // Per-call debug lines would be timed too; errors still show.
-    VF_LogMsg = quietLog;
-    __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
+    quietHeadless();
     gDir = makeTempDir("bench_sepia_file");
     if (gDir.empty()) return 1;
     if (!writeInput(gDir + "/input.jpg", kWidth, kHeight) ||

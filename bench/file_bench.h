@@ -15,25 +15,17 @@
 #include <string>
 #include <vector>
 
+#include "bench_common.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_image.h"
 
 namespace filebench {
 
-inline void quietLog(int, const char*, ...) {}
-
-inline double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
-}
+using namespace kivbench;
 
 inline long fileSize(const std::string& path) {
     struct stat st;
     return stat(path.c_str(), &st) == 0 ? static_cast<long>(st.st_size) : -1;
-}
-
-inline double seconds(std::chrono::steady_clock::duration d) {
-    return std::chrono::duration<double>(d).count();
 }
 
 // Runs a shell command; its wall time in seconds when it succeeded and wrote
