@@ -17,6 +17,7 @@
 #include "core/egl/Platform.h"
 #include "core/filters/sce/singleCameraEffects.h"
 #include "support/temp_dir.h"
+#include "support/test_picture.h"
 #include "support/image_ptr.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_picture.h"
@@ -44,20 +45,12 @@ std::vector<int> factoryIds() {
     return ids;
 }
 
-// A photo-like picture: colour ramps, rings and hard edges (which the
-// neighbour-reading effects pick out), alpha varying for PNG.
+// The test picture (gradients, hard-edged blocks the neighbour-reading
+// effects pick out), alpha varying for PNG.
 ImagePtr photo(int width, int height, bool alpha) {
+    std::vector<uint8_t> rgba = kivtest::makeTestPicture(width, height, !alpha);
     ImagePtr image(VCImage_createNew(width, height, VC_FORMAT_RGBA));
-    for (int y = 0; y < height; ++y) {
-        for (int x = 0; x < width; ++x) {
-            unsigned char* p = image->data + (static_cast<size_t>(y) * width + x) * 4;
-            double ring = 0.5 + 0.5 * std::sin(std::hypot(x - width * 0.4, y - height * 0.6) / 3.0);
-            p[0] = static_cast<unsigned char>(255.0 * x / width);
-            p[1] = static_cast<unsigned char>(255.0 * ring);
-            p[2] = ((x / 9 + y / 13) & 1) ? 230 : 20;
-            p[3] = alpha ? static_cast<unsigned char>(128 + (x * 7 + y) % 128) : 255;
-        }
-    }
+    std::copy(rgba.begin(), rgba.end(), image->data);
     return image;
 }
 
