@@ -22,6 +22,7 @@
 #include "plugin_standin/standin.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
+#include "support/open_files.h"
 #include "support/look_reference.h"
 #include "support/plugin_sysroot.h"
 #include "vccore/vc_image.h"
@@ -124,6 +125,7 @@ TEST_F(ExternalFilter, LoadOutcomesAndTheirLogLines) {
         // clang-format on
     };
     std::ofstream(junk) << "not a library";
+    const int files = Test_openFiles();
     for (const Case& c : cases) {
         if (c.library != nullptr) {
             const size_t comma = c.name.find(',');
@@ -145,6 +147,7 @@ TEST_F(ExternalFilter, LoadOutcomesAndTheirLogLines) {
         EXPECT_EQ(loads ? 3 : 0, effect->getCapabilities()) << c.name;
         EXPECT_EQ(loads ? 5 : 0, effect->getSupportedFormats()) << c.name;
     }
+    EXPECT_EQ(files, Test_openFiles());  // no library's descriptor outlives its effect
     // No name at all.
     LogCapture log;
     KivFilterExternal none(nullptr);

@@ -181,9 +181,11 @@ TEST_F(BufferedProcessorTest, OddNv21SizesArePaddedToEven) {
     ASSERT_EQ(0, mProcessor->doProcessNV21(input.data(), w, h, out.data()));
     EXPECT_EQ(Bytes(64, 0xEE), Bytes(out.end() - 64, out.end()));
     // Every padded pixel written (opaque from the pass-through look); neutral
-    // chroma: a pixel's grey is its luma (full range) in the first row.
+    // chroma: every pixel's grey is its luma (full range), up to the last row.
     for (int i = 0; i < pw * ph; ++i) ASSERT_EQ(255, out[i * 4 + 3]) << i;
-    for (int x = 0; x < w; ++x) EXPECT_NEAR(input[x], out[x * 4 + 1], 2) << x;
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x)
+            ASSERT_NEAR(input[y * w + x], out[(y * pw + x) * 4 + 1], 2) << x << "," << y;
 }
 
 // Wider than any texture llvmpipe can hold, empty or negative: nothing drawn
