@@ -149,7 +149,6 @@ TEST_F(EglImageTest, GraphicBufferFramebufferRendersIntoCpuVisibleMemory) {
     sp<EglImage> target = external(EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, w, h, VC_FORMAT_RGBA);
     LogCapture log;
     ASSERT_EQ(target->initialize(), 0);
-    EXPECT_TRUE(log.contains("Successfully created texture for input: 16x8 RGBA"));
     EXPECT_TRUE(
         log.contains("EglImage: Creating GraphicBuffer 16x8 RGBA (format 1, usage 0x00000333)"));
     EXPECT_NE(target->getRenderBufferID(), 0u);
@@ -349,17 +348,14 @@ TEST_F(EglImageTest, Nv21DrawnThroughTheDefaultShaderMatchesTheCpuConversion) {
     // for the shader's float output rounding (llvmpipe: exact).
     ImagePtr expected(VCImage_createNew(w, h, VC_FORMAT_RGBA));
     ASSERT_EQ(VCImage_convert(picture.get(), expected.get()), 0);
-    int worst = 0;
     for (int i = 0; i < w * h; ++i) {
         const uint8_t* p = result->data + i * 4;
         const uint8_t* want = expected->data + i * 4;
         for (int c = 0; c < 3; ++c) {
-            worst = std::max(worst, abs(p[c] - want[c]));
             ASSERT_NEAR(p[c], want[c], 1) << "pixel " << i % w << "," << i / w << " channel " << c;
         }
         ASSERT_EQ(p[3], 255);
     }
-    RecordProperty("worst_difference", worst);
     program->release();
     source->release();
     target->release();

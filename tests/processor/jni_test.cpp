@@ -133,7 +133,6 @@ TEST_F(JniProcessorTest, ProcessBitmapReturnsANewArgb8888Bitmap) {
     ASSERT_EQ("", KivTestJvm_takeException(mEnv));
     ASSERT_NE(nullptr, result);
     EXPECT_FALSE(mEnv->IsSameObject(result, bitmap));
-    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "process_bitmap: width:20, height:10, stride:80"));
     EXPECT_FALSE(log.contains("Bitmap format is not RGBA_8888!"));
     EXPECT_EQ(0, intCall(bitmap, "getLockCount") + intCall(result, "getLockCount"));
     AndroidBitmapInfo info;

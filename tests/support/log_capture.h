@@ -33,7 +33,8 @@ public:
     // ones of those levels, in order, and each expected line of a lower level
     // was logged too. Each is written "<level letter> <text>" (V, D, I, W or
     // E); a text ending in ":#" stands for any source line number there, as
-    // error reports end ("E VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#").
+    // error reports end ("E VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#"); a
+    // text ending in '*' is a prefix (for a system's own error text at the end).
     ::testing::AssertionResult matches(const std::vector<std::string>& expected) const;
 
     LogCapture(const LogCapture&) = delete;
