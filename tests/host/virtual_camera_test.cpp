@@ -12,16 +12,12 @@
 #include <chrono>
 #include <thread>
 
-extern "C" {
-#include <libavcodec/avcodec.h>
-#include <libavformat/avformat.h>
-}
-
 #include "support/camera_frames.h"
 #include "support/log_capture.h"
 #include "support/manual_clock.h"
 #include "support/temp_dir.h"
 #include "support/image_ptr.h"
+#include "support/video_files.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
@@ -94,73 +90,10 @@ TEST(VirtualCameraTest, GeneratedFramesCarryTheirNumberAndTheBootClock) {
     EXPECT_EQ(camera.framesNotQueued(), 1u);
 }
 
-// Writes `frames` generator frames as a lossless full-range FFV1 video.
-bool writeVideo(const std::string& path, int w, int h, int frames) {
-    AVFormatContext* format = nullptr;
-    if (avformat_alloc_output_context2(&format, nullptr, "matroska", path.c_str()) < 0)
-        return false;
-    const AVCodec* codec = avcodec_find_encoder(AV_CODEC_ID_FFV1);
-    AVStream* stream = avformat_new_stream(format, nullptr);
-    AVCodecContext* encoder = avcodec_alloc_context3(codec);
-    AVFrame* frame = av_frame_alloc();
-    AVPacket* packet = av_packet_alloc();
-    bool ok = codec != nullptr && stream != nullptr && encoder != nullptr;
-    if (ok) {
-        encoder->width = w;
-        encoder->height = h;
-        encoder->pix_fmt = AV_PIX_FMT_YUV420P;
-        encoder->color_range = AVCOL_RANGE_JPEG;
-        encoder->time_base = {1, 30};
-        ok = avcodec_open2(encoder, codec, nullptr) >= 0 &&
-             avcodec_parameters_from_context(stream->codecpar, encoder) >= 0 &&
-             avio_open(&format->pb, path.c_str(), AVIO_FLAG_WRITE) >= 0 &&
-             avformat_write_header(format, nullptr) >= 0;
-        stream->time_base = encoder->time_base;
-    }
-    frame->width = w;
-    frame->height = h;
-    frame->format = AV_PIX_FMT_YUV420P;
-    frame->color_range = AVCOL_RANGE_JPEG;
-    ok = ok && av_frame_get_buffer(frame, 0) >= 0;
-    auto drain = [&] {
-        while (avcodec_receive_packet(encoder, packet) == 0) {
-            av_packet_rescale_ts(packet, encoder->time_base, stream->time_base);
-            packet->stream_index = stream->index;
-            av_interleaved_write_frame(format, packet);
-        }
-    };
-    for (int i = 0; ok && i < frames; ++i) {
-        std::vector<uint8_t> nv21 = CameraFrames_nv21(i, w, h);
-        ok = av_frame_make_writable(frame) >= 0;
-        for (int y = 0; ok && y < h; ++y)
-            std::copy_n(&nv21[y * w], w, frame->data[0] + y * frame->linesize[0]);
-        for (int y = 0; ok && y < h / 2; ++y) {
-            for (int x = 0; x < w / 2; ++x) {
-                frame->data[2][y * frame->linesize[2] + x] = nv21[w * h + y * w + 2 * x];  // V
-                frame->data[1][y * frame->linesize[1] + x] = nv21[w * h + y * w + 2 * x + 1];
-            }
-        }
-        frame->pts = i;
-        ok = ok && avcodec_send_frame(encoder, frame) >= 0;
-        drain();
-    }
-    if (ok) {
-        avcodec_send_frame(encoder, nullptr);
-        drain();
-        ok = av_write_trailer(format) >= 0;
-    }
-    if (format != nullptr && format->pb != nullptr) avio_closep(&format->pb);
-    av_packet_free(&packet);
-    av_frame_free(&frame);
-    avcodec_free_context(&encoder);
-    avformat_free_context(format);
-    return ok;
-}
-
 TEST(VirtualCameraTest, AVideoFilePlaysThroughFrameByFrameThenEndsOrLoops) {
     kivtest::TempDir dir;
     const std::string path = dir.file("clip.mkv");
-    ASSERT_TRUE(writeVideo(path, 96, 64, 10));
+    ASSERT_TRUE(VideoFiles_writeGenerated(path, 96, 64, 10));
     for (bool loop : {false, true}) {
         sp<HostWindow> window = new HostWindow(96, 64);
         VirtualCamera camera(kivhost::VirtualCamera_video(path, 96, 64, loop), 96, 64);
