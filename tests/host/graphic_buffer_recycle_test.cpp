@@ -66,7 +66,8 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
         ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
         std::vector<uint8_t> expected;
         for (int i = 0; i < w * h; ++i) expected.insert(expected.end(), c.zero, c.zero + 4);
-        EXPECT_EQ(GlTest_bufferPixels(display(), buffer), expected) << c.format;  // ...and its mirror
+        EXPECT_EQ(GlTest_bufferPixels(display(), buffer), expected)
+            << c.format;  // ...and its mirror
     }
     // GPU side first: a render target's first lock reads the zeroed mirror
     // back; a texture-only buffer's memory is not handed to it.

@@ -19,6 +19,7 @@
 #include "host/media/VideoEncoderTestSeam.h"
 #include "kivhost/VirtualCamera.h"
 #include "support/camera_frames.h"
+#include "support/eventually.h"
 #include "support/log_capture.h"
 #include "support/temp_dir.h"
 #include "support/video_files.h"
@@ -72,16 +73,6 @@ struct Producer {
     }
     sp<Surface> surface;
 };
-
-// Waits (for real, bounded) for the encoder's own threads.
-bool eventually(const std::function<bool()>& done) {
-    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(20);
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > end) return false;
-        std::this_thread::yield();
-    }
-    return true;
-}
 
 // Noise compresses badly, so a file grows fast.
 std::vector<uint8_t> noise(int seed, int width, int height) {

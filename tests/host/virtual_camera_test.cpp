@@ -13,6 +13,7 @@
 #include <thread>
 
 #include "support/camera_frames.h"
+#include "support/eventually.h"
 #include "support/log_capture.h"
 #include "support/manual_clock.h"
 #include "support/temp_dir.h"
@@ -41,16 +42,6 @@ std::vector<uint8_t> takeFrame(const sp<HostWindow>& window, int64_t* timestamp 
     }
     window->releaseFrame(buffer);
     return bytes;
-}
-
-// Waits (for real, bounded) until `done`: for the camera's own thread.
-bool eventually(const std::function<bool()>& done) {
-    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(20);
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > end) return false;
-        std::this_thread::yield();
-    }
-    return true;
 }
 
 TEST(VirtualCameraTest, GeneratedFramesCarryTheirNumberAndTheBootClock) {
