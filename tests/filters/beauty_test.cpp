@@ -25,175 +25,105 @@ namespace {
 // pixels much further.
 constexpr int kTolerance = 2;
 
-struct TextCase {
-    const char* text;
-    int intensity;
-    int faceCount;
-    int slot;            // the face slot to check, -1 for none
-    float facecoord[4];  // expected in that slot
-    float toneMin[3];
-    float toneMax[3];
-    std::vector<std::string> warnings;
-};
+// The skin range of the face pictures.
+const int kToneMin = 0x705040, kToneMax = 0xFFE8D8;
 
-// Neutral tones: what a slot holds before any text sets them.
-#define NO_TONES \
-    {0, 0, 0}, { \
-        1, 1, 1  \
-    }
+std::string faceText(int intensity, int l, int t, int r, int b, int width = 1000,
+                     int height = 1000) {
+    return "face=1,intensity=" + std::to_string(intensity) + ",width=" + std::to_string(width) +
+           ",height=" + std::to_string(height) + ",left=" + std::to_string(l) +
+           ",top=" + std::to_string(t) + ",right=" + std::to_string(r) +
+           ",bottom=" + std::to_string(b) + ",tonemin=" + std::to_string(kToneMin) +
+           ",tonemax=" + std::to_string(kToneMax);
+}
 
 TEST(Beauty, FaceTextsSetTheStateTheyDescribe) {
+    struct Row {
+        const char* text;
+        int intensity, faceCount, slot;  // the face slot to check, -1 for none
+        float facecoord[4];
+        int toneMin, toneMax;  // 0xRRGGBB
+        std::vector<std::string> warnings = {};
+    };
     // Applied one after the other to the same effect.
-    const std::vector<TextCase> cases = {
+    // clang-format off
+    const Row rows[] = {
         // The intensity is clamped; without tones the upper bound drops to 0.
         {"face=1,intensity=9,width=1000,height=1000,left=250,top=250,right=750,bottom=750",
-         4,
-         1,
-         0,
-         {0.55f, 0.57f, 3.0f, 3.0f},
-         {0, 0, 0},
-         {0, 0, 0},
-         {}},
+         4, 1, 0, {0.55f, 0.57f, 3, 3}, 0, 0},
         // A range covering (nearly) every colour is ignored.
         {"face=1,width=1000,height=1000,left=250,top=250,right=750,bottom=750,tonemin=0,"
-         "tonemax=16777215",
-         1,
-         1,
-         0,
-         {0.55f, 0.57f, 3.0f, 3.0f},
-         {0, 0, 0},
-         {0, 0, 0},
-         {}},
-        // 0x604030 .. 0xF0E0D0
+         "tonemax=16777215", 1, 1, 0, {0.55f, 0.57f, 3, 3}, 0, 0},
         {"face=1,intensity=2,width=200,height=100,left=20,top=10,right=120,bottom=90,"
-         "tonemin=6307888,tonemax=15786192",
-         2,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
-         {}},
+         "tonemin=6307888,tonemax=15786192", 2, 1, 0, {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0},
         // 0x708000: a minimum within 0.1 in one channel (red) keeps the stored one.
         {"face=1,intensity=2,width=200,height=100,left=20,top=10,right=120,bottom=90,"
-         "tonemin=7372800,tonemax=15786192",
-         2,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
-         {}},
+         "tonemin=7372800,tonemax=15786192", 2, 1, 0, {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0},
         // The second face goes to its own slot; a face partly outside the frame is kept.
         {"face=2,intensity=3,width=100,height=100,left=-20,top=60,right=30,bottom=140",
-         3,
-         2,
-         1,
-         {0.1f, 1.07f, 3.0f, 1.875f},
-         {0, 0, 0},
-         {0, 0, 0},
-         {}},
-        // 0x303030 .. 0xC0C0C0
+         3, 2, 1, {0.1f, 1.07f, 3, 1.875f}, 0, 0},
         {"face=3,width=100,height=100,left=10,top=10,right=90,bottom=90,tonemin=3158064,"
-         "tonemax=12632256",
-         1,
-         3,
-         2,
-         {0.55f, 0.57f, 1.875f, 1.875f},
-         {0x30 / 255.f, 0x30 / 255.f, 0x30 / 255.f},
-         {0xC0 / 255.f, 0xC0 / 255.f, 0xC0 / 255.f},
-         {}},
+         "tonemax=12632256", 1, 3, 2, {0.55f, 0.57f, 1.875f, 1.875f}, 0x303030, 0xC0C0C0},
         // Without a rectangle only the intensity and the count change.
-        {"face=1,intensity=0",
-         0,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
-         {}},
-        {"face=0", 1, 0, -1, {}, NO_TONES, {}},
+        {"face=1,intensity=0", 0, 1, 0, {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0},
+        {"face=0", 1, 0, -1, {}, 0, 0},
         // Refused rectangles change no slot, and say why.
-        {"face=1,width=100,height=100,left=40,top=10,right=40,bottom=90",
-         1,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
+        {"face=1,width=100,height=100,left=40,top=10,right=40,bottom=90", 1, 1, 0,
+         {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0,
          {"Beauty: face 1 ignored: its rectangle (40,10)-(40,90) in 100x100 has no area"}},
-        {"face=1,width=0,height=100,left=1,top=10,right=40,bottom=90",
-         1,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
+        {"face=1,width=0,height=100,left=1,top=10,right=40,bottom=90", 1, 1, 0,
+         {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0,
          {"Beauty: face 1 ignored: its rectangle (1,10)-(40,90) in 0x100 has no area"}},
-        {"face=4,width=100,height=100,left=10,top=10,right=40,bottom=90",
-         1,
-         4,
-         -1,
-         {},
-         NO_TONES,
+        {"face=4,width=100,height=100,left=10,top=10,right=40,bottom=90", 1, 4, -1, {}, 0, 0,
          {"Beauty: face 4 ignored: faces 1 to 3 are kept"}},
         // Unreadable parts are reported; an unreadable width keeps the rectangle.
         {"face=1,intensity=2,width=wide,height=100,left=0,top=0,right=50,bottom=50,smile=1",
-         2,
-         1,
-         0,
-         {0.4f, 0.57f, 3.0f, 1.875f},
-         {0x60 / 255.f, 0x40 / 255.f, 0x30 / 255.f},
-         {0xF0 / 255.f, 0xE0 / 255.f, 0xD0 / 255.f},
+         2, 1, 0, {0.4f, 0.57f, 3, 1.875f}, 0x604030, 0xF0E0D0,
          {"Beauty: 'width=wide' could not be read; the neutral value is used",
           "Beauty: unknown parameter 'smile' ignored"}},
     };
+    // clang-format on
     Beauty beauty;
-    Beauty::State initial = beauty.getState();
-    EXPECT_EQ(1, initial.intensity);
-    EXPECT_EQ(0, initial.faceCount);
-    for (const TextCase& c : cases) {
-        SCOPED_TRACE(c.text);
+    EXPECT_EQ(1, beauty.getState().intensity);
+    EXPECT_EQ(0, beauty.getState().faceCount);
+    for (const Row& r : rows) {
+        SCOPED_TRACE(r.text);
         LogCapture log;
-        EXPECT_EQ(1, beauty.setOption("parameter", c.text));
-        EXPECT_TRUE(log.contains(VF_LOG_INFO, std::string("EGL: Beauty::setOption = ") + c.text));
+        EXPECT_EQ(1, beauty.setOption("parameter", r.text));
+        EXPECT_TRUE(log.contains(VF_LOG_INFO, std::string("EGL: Beauty::setOption = ") + r.text));
         std::vector<std::string> warnings;
         for (const LoggedLine& l : log.lines())
             if (l.level == VF_LOG_WARNING) warnings.push_back(l.text);
-        EXPECT_EQ(c.warnings, warnings);
+        EXPECT_EQ(r.warnings, warnings);
         Beauty::State s = beauty.getState();
-        EXPECT_EQ(c.intensity, s.intensity);
-        EXPECT_EQ(c.faceCount, s.faceCount);
-        if (c.slot < 0) continue;
-        for (int k = 0; k < 4; ++k) EXPECT_NEAR(c.facecoord[k], s.facecoord[c.slot][k], 1e-5) << k;
+        EXPECT_EQ(r.intensity, s.intensity);
+        EXPECT_EQ(r.faceCount, s.faceCount);
+        if (r.slot < 0) continue;
+        for (int k = 0; k < 4; ++k) EXPECT_NEAR(r.facecoord[k], s.facecoord[r.slot][k], 1e-5) << k;
         for (int k = 0; k < 3; ++k) {
-            EXPECT_NEAR(c.toneMin[k], s.skinToneMin[c.slot][k], 1e-6) << k;
-            EXPECT_NEAR(c.toneMax[k], s.skinToneMax[c.slot][k], 1e-6) << k;
+            int shift = 16 - 8 * k;
+            EXPECT_NEAR((r.toneMin >> shift & 255) / 255.f, s.skinToneMin[r.slot][k], 1e-6) << k;
+            EXPECT_NEAR((r.toneMax >> shift & 255) / 255.f, s.skinToneMax[r.slot][k], 1e-6) << k;
         }
     }
     // Any other name: logged, taken (1), nothing changed.
-    Beauty::State before = beauty.getState();
     LogCapture log;
     EXPECT_EQ(1, beauty.setOption("face", "face=1,intensity=4"));
     EXPECT_TRUE(log.contains(VF_LOG_INFO, "EGL: Beauty::setOption = face=1,intensity=4"));
-    EXPECT_EQ(before.intensity, beauty.getState().intensity);
-    EXPECT_EQ(before.faceCount, beauty.getState().faceCount);
+    EXPECT_EQ(2, beauty.getState().intensity);
+    EXPECT_EQ(1, beauty.getState().faceCount);
     EXPECT_EQ(1, beauty.getOptionsCount());
 }
 
 struct Draw {
-    int width, height;
-    int intensity;
+    int width, height, intensity;
     float face[4];      // left, top, right, bottom as fractions of the frame
     const char* extra;  // appended to the text
 };
 
 void PrintTo(const Draw& d, std::ostream* os) {
-    *os << d.width << "x" << d.height << " intensity " << d.intensity;
+    *os << d.width << "x" << d.height << " intensity " << d.intensity << d.extra;
 }
-
-// The skin range of the face pictures, 0x705040 .. 0xFFE8D8.
-const int kToneMin = 0x705040, kToneMax = 0xFFE8D8;
 
 class BeautyThroughProcessor : public ::testing::TestWithParam<Draw> {};
 
@@ -201,14 +131,10 @@ TEST_P(BeautyThroughProcessor, MatchesTheCpuBlurMaskAndMix) {
     const Draw& d = GetParam();
     const int w = d.width, h = d.height;
     lookref::Picture picture(w, h, lookref::makeFacePicture(w, h));
-    const int frame = 1000;  // face rectangles in a 1000x1000 frame
-    int l = int(d.face[0] * frame), t = int(d.face[1] * frame), r = int(d.face[2] * frame),
-        b = int(d.face[3] * frame);
-    std::string text = "face=1,intensity=" + std::to_string(d.intensity) +
-                       ",width=1000,height=1000,left=" + std::to_string(l) +
-                       ",top=" + std::to_string(t) + ",right=" + std::to_string(r) +
-                       ",bottom=" + std::to_string(b) + ",tonemin=" + std::to_string(kToneMin) +
-                       ",tonemax=" + std::to_string(kToneMax) + d.extra;
+    // Face rectangles in a 1000x1000 frame.
+    std::string text = faceText(d.intensity, int(d.face[0] * 1000), int(d.face[1] * 1000),
+                                int(d.face[2] * 1000), int(d.face[3] * 1000)) +
+                       d.extra;
     LogCapture quiet;
     auto* processor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
     processor->initialize();
@@ -221,8 +147,7 @@ TEST_P(BeautyThroughProcessor, MatchesTheCpuBlurMaskAndMix) {
     BufferedProcessor_Destroy(processor);
 
     if (s.intensity == 0 || s.faceCount == 0) {
-        // The copy pass: the picture itself, opaque.
-        EXPECT_EQ(picture.rgba(), out);
+        EXPECT_EQ(picture.rgba(), out);  // the copy pass: the picture itself, opaque
         return;
     }
     lookref::BeautyFace face{s.intensity, {}, {}, {}};
@@ -234,34 +159,26 @@ TEST_P(BeautyThroughProcessor, MatchesTheCpuBlurMaskAndMix) {
     // The state read back is the one the texts set: the ellipse from the rectangle.
     EXPECT_NEAR(0.05f + (d.face[0] + d.face[2]) / 2, face.facecoord[0], 1e-3);
     EXPECT_NEAR(0.07f + (d.face[1] + d.face[3]) / 2, face.facecoord[1], 1e-3);
-    lookref::Expectation e = lookref::renderBeauty(picture, face);
-    lookref::expectWithin(e, out.data(), kTolerance, "beauty");
+    lookref::expectWithin(lookref::renderBeauty(picture, face), out.data(), kTolerance, "beauty");
     // And the smoothing did something: skin inside the face moved.
     size_t changed = 0;
     for (size_t i = 0; i < out.size(); ++i) changed += out[i] != picture.rgba()[i];
     EXPECT_GT(changed, out.size() / 50);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Faces, BeautyThroughProcessor,
-    ::testing::Values(Draw{128, 96, 1, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
-                      Draw{121, 95, 2, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
-                      Draw{96, 72, 3, {0.15f, 0.1f, 0.75f, 0.8f}, ""},
-                      Draw{123, 89, 4, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
-                      // Partly outside the picture.
-                      Draw{64, 48, 4, {-0.2f, 0.4f, 0.5f, 1.3f}, ""},
-                      // Larger than the picture: every skin pixel smoothed.
-                      Draw{64, 48, 2, {-1.0f, -1.0f, 2.0f, 2.0f}, ""},
-                      // Faces 2 and 3 described too: only the first is used.
-                      Draw{64,
-                           48,
-                           3,
-                           {0.2f, 0.2f, 0.7f, 0.75f},
-                           ",face=3,width=10,height=10,left=0,top=0,right=1,bottom=1"},
-                      // No face, or intensity 0: the picture as it is.
-                      Draw{61, 47, 0, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
-                      Draw{61, 47, 3, {0.2f, 0.2f, 0.7f, 0.75f}, ",face=0"}),
-    [](const ::testing::TestParamInfo<Draw>& info) { return std::to_string(info.index); });
+// clang-format off
+INSTANTIATE_TEST_SUITE_P(Faces, BeautyThroughProcessor, ::testing::Values(
+    Draw{128, 96, 1, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
+    Draw{121, 95, 2, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
+    Draw{123, 89, 4, {0.2f, 0.2f, 0.7f, 0.75f}, ""},
+    Draw{64, 48, 4, {-0.2f, 0.4f, 0.5f, 1.3f}, ""},    // partly outside the picture
+    Draw{64, 48, 2, {-1.0f, -1.0f, 2.0f, 2.0f}, ""},   // larger: every skin pixel smoothed
+    // Faces 2 and 3 described too: only the first is used.
+    Draw{64, 48, 3, {0.2f, 0.2f, 0.7f, 0.75f},
+         ",face=3,width=10,height=10,left=0,top=0,right=1,bottom=1"},
+    Draw{61, 47, 0, {0.2f, 0.2f, 0.7f, 0.75f}, ""},    // intensity 0: the picture as it is
+    Draw{61, 47, 3, {0.2f, 0.2f, 0.7f, 0.75f}, ",face=0"}));
+// clang-format on
 
 TEST_F(GlContextTest, EveryCameraOrientationSmoothsTheSameFace) {
     // The same frame through the four camera geometries: each is the normal
@@ -269,11 +186,7 @@ TEST_F(GlContextTest, EveryCameraOrientationSmoothsTheSameFace) {
     const int w = 64, h = 48;
     lookref::Picture picture(w, h, lookref::makeFacePicture(w, h));
     Beauty beauty;
-    beauty.setOption("parameter",
-                     ("face=1,intensity=3,width=64,height=48,left=14,top=8,right=44,bottom=40,"
-                      "tonemin=" +
-                      std::to_string(kToneMin) + ",tonemax=" + std::to_string(kToneMax))
-                         .c_str());
+    beauty.setOption("parameter", faceText(3, 14, 8, 44, 40, w, h).c_str());
     LogCapture quiet;
     std::vector<uint8_t> frames[4];
     for (int type = 0; type < 4; ++type) {
@@ -289,13 +202,12 @@ TEST_F(GlContextTest, EveryCameraOrientationSmoothsTheSameFace) {
         return size_t((flipY ? h - 1 - y : y) * w + (flipX ? w - 1 - x : x)) * 4;
     };
     int worst = 0;
-    for (int type : {0, 2, 3}) {
+    for (int type : {0, 2, 3})
         for (int y = 0; y < h; ++y)
             for (int x = 0; x < w; ++x)
                 for (int k = 0; k < 4; ++k)
                     worst = std::max(worst, std::abs(frames[1][at(1, x, y) + k] -
                                                      frames[type][at(type, x, y) + k]));
-    }
     EXPECT_LE(worst, 1);
     EXPECT_NE(frames[1], picture.rgba());
 }

@@ -1,7 +1,7 @@
 // The effects that own GL objects (the colour effects, DistortionCorrection,
 // Beauty) and the position snippets, on one long-lived program as a live
 // pipeline keeps it: load failures logged under each effect's own source with
-// the pass-through taking over, and no GL object left over a thousand
+// the pass-through taking over (opaque), and no GL object left over a thousand
 // switches with parameter changes and Beauty's size changes between draws.
 #include <gtest/gtest.h>
 
@@ -14,6 +14,7 @@
 #include "core/filters/sce/beauty.h"
 #include "core/filters/sce/colorEffects.h"
 #include "core/filters/sce/geometricEffects.h"
+#include "core/filters/sce/singleCameraEffects.h"
 #include "support/effect_renderer.h"
 #include "support/gl_context.h"
 #include "support/gl_fault.h"
@@ -30,6 +31,17 @@ public:
     const char* getFragmentShader() const override { return "void main() { broken"; }
 };
 
+// A single-pass look with a snippet of its own.
+class Snippet : public SingleCameraEffects {
+public:
+    explicit Snippet(const char* code) : mCode(code) {}
+    int getFilterType() const override { return 390; }
+    const char* getFragmentShader() const override { return mCode; }
+
+private:
+    const char* mCode;
+};
+
 // Whether an effect holds GL objects of its own now.
 bool holdsGl(KivFilter* f) {
     if (auto* full = dynamic_cast<FullShaderEffects*>(f)) return full->hasShader();
@@ -40,12 +52,18 @@ bool holdsGl(KivFilter* f) {
 
 TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) {
     const int w = 8, h = 6;
-    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, true));
+    lookref::Picture picture(w, h, lookref::makeTestPicture(w, h, false));
+    std::vector<uint8_t> opaque = picture.rgba();
+    for (size_t i = 3; i < opaque.size(); i += 4) opaque[i] = 255;
     Uncompilable<CustomColor> custom;
     Uncompilable<Serene> serene;
     Uncompilable<DistortionCorrection> distortion;
     Brightness brightness;
     Beauty beauty;
+    Snippet undefined("vec4 doEffect() { return undefined_thing; }");
+    // Compiles alone, but reads a varying the vertex shader never writes.
+    Snippet unlinked(
+        "varying highp vec2 v_missing; vec4 doEffect() { return vec4(v_missing, 0.0, 1.0); }");
     struct Row {
         KivFilter* effect;
         int programFaults;                  // program creations that fail
@@ -59,6 +77,11 @@ TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) 
          {"Could not create a new program",
           "VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/brightness:"}},
         {&beauty, 1, {"VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/beauty:"}},
+        {&undefined,
+         0,
+         {"SingleEffect: could not load this shader",
+          "VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:"}},
+        {&unlinked, 0, {"SingleEffect: failed to link this shader: "}},
     };
     for (Row& r : rows) {
         SCOPED_TRACE(r.prefixes.back());
@@ -75,7 +98,7 @@ TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) 
             log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
         EXPECT_FALSE(holdsGl(r.effect));
         // The pass-through took over: the picture, opaque.
-        EXPECT_EQ(picture.rgba(), renderer.pixels());
+        EXPECT_EQ(opaque, renderer.pixels());
     }
     // The same effects load once the driver has programs again.
     EffectRenderer renderer(picture);
