@@ -21,6 +21,7 @@
 #include "core/egl/EglRecycler.h"
 #include "plugin_standin/standin.h"
 #include "support/gl_context.h"
+#include "support/image_ptr.h"
 #include "support/log_capture.h"
 #include "support/open_files.h"
 #include "support/look_reference.h"
@@ -445,9 +446,7 @@ TEST_P(DuotoneThroughProcessor, MatchesItsCpuStatement) {
     if (bgra) want = swap(want);
     // Tolerance 3: a luma on a texel boundary may pick the neighbouring
     // gradient entry (at most 1.4 levels away), plus rounding on both sides.
-    int worst = 0;
-    for (size_t i = 0; i < want.size(); ++i) worst = std::max(worst, std::abs(want[i] - out[i]));
-    EXPECT_LE(worst, 3);
+    EXPECT_LE(VCImageTest_maxDifference(want, out), 3);
 }
 
 INSTANTIATE_TEST_SUITE_P(Pictures, DuotoneThroughProcessor,

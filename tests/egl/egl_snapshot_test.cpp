@@ -85,17 +85,6 @@ std::vector<uint8_t> expected(const std::vector<VCImage*>& pictures, uint32_t fo
     return VCImageTest_bytes(*out);
 }
 
-testing::AssertionResult near(const std::vector<uint8_t>& want, const std::vector<uint8_t>& got,
-                              int tolerance) {
-    if (want.size() != got.size())
-        return testing::AssertionFailure() << got.size() << " bytes, want " << want.size();
-    for (size_t i = 0; i < want.size(); ++i)
-        if (std::abs(int(want[i]) - int(got[i])) > tolerance)
-            return testing::AssertionFailure()
-                   << "byte " << i << ": " << int(got[i]) << ", want " << int(want[i]);
-    return testing::AssertionSuccess();
-}
-
 struct Case {
     bool async, asyncConverter;
     uint32_t input, output;
@@ -137,7 +126,7 @@ TEST_P(SnapshotPictures, MatchTheLookOnTheCpu) {
     for (int round = 0; round < 2; ++round) {
         EXPECT_EQ(100 + round, frames[round].timestamp);
         EXPECT_EQ(c.output, frames[round].format);
-        EXPECT_TRUE(near(want, frames[round].bytes, tolerance)) << "round " << round;
+        EXPECT_LE(VCImageTest_maxDifference(want, frames[round].bytes), tolerance) << round;
         // Asynchronous captures and converters post from a worker, never the caller.
         EXPECT_EQ(c.async || c.asyncConverter,
                   !pthread_equal(pthread_self(), frames[round].thread));
@@ -288,6 +277,9 @@ TEST(EglSnapShot, LogLinesAndStatuses) {
         gEglSnapShotClientWait = row.wait;
         const EglSnapShotCreateSync realCreate = gEglSnapShotCreateSync;
         if (row.noFence) gEglSnapShotCreateSync = noFences;
+        // A real fence gets all the time a loaded machine needs; the forced
+        // timeout keeps the 5000 its line names.
+        const EGLTimeKHR wait = row.wait == neverSignals ? 5000 : kPatient;
         int status;
         if (row.kind == 's') {
             sp<EglSnapShot> snapshot = new EglSnapShot(gl.env(), 16, 8, rig.converter);
@@ -295,7 +287,7 @@ TEST(EglSnapShot, LogLinesAndStatuses) {
             VCImage* base = row.pictures != 0 ? a.get() : nullptr;
             VCImage* pip = row.pictures == 2 ? b.get() : nullptr;
             status = row.async
-                         ? snapshot->takePictureAsync(base, pip, rig.program, listener, 1, 5000)
+                         ? snapshot->takePictureAsync(base, pip, rig.program, listener, 1, wait)
                          : snapshot->takePictureSync(base, pip, rig.program, listener, 1);
             snapshot->release();
         } else {
@@ -303,7 +295,7 @@ TEST(EglSnapShot, LogLinesAndStatuses) {
             ASSERT_EQ(0, lite->initialize());
             if (row.kind == 'R') GlFault_failPictureReads(1);
             status = row.kind != 'l' ? lite->takePictureReadPixels(rig.program, listener, 1)
-                     : row.async     ? lite->takePictureAsync(rig.program, listener, 1, 5000)
+                     : row.async     ? lite->takePictureAsync(rig.program, listener, 1, wait)
                                      : lite->takePictureSync(rig.program, listener, 1);
             lite->release();
         }
@@ -393,25 +385,14 @@ TEST_F(GlContextTest, CapturesWaitForThePreviousOne) {
     }
 }
 
-// A thousand captures of each kind leave no GL object, buffer or memory
-// behind (ASan sees the memory; GL names and memory files are counted here).
+// A thousand captures of each kind leave no GL object (the fixture counts
+// them), buffer or memory file behind (ASan sees the memory).
 TEST_F(GlContextTest, ThousandsOfCapturesLeaveNothingBehind) {
     LogCapture quiet;
     Rig rig(10, true);
     ASSERT_TRUE(rig.ok);
     FrameCollector listener(VC_FORMAT_NV21);
     ImagePtr picture = VCImageTest_random(16, 8, VC_FORMAT_NV21, 1);
-    // Names are not reused at once, so what counts is how many are alive.
-    auto liveObjects = [] {
-        GLuint last = 0;
-        glGenTextures(1, &last);
-        glDeleteTextures(1, &last);
-        int n = 0;
-        for (GLuint name = 1; name < last + 8; ++name)
-            n += glIsTexture(name) + glIsFramebuffer(name) + glIsRenderbuffer(name);
-        return n;
-    };
-    const int live = liveObjects();
     int files = -1;
     const int kEach = 250;
     for (int kind = 0; kind < 4; ++kind) {
@@ -442,7 +423,6 @@ TEST_F(GlContextTest, ThousandsOfCapturesLeaveNothingBehind) {
     ASSERT_TRUE(all) << listener.frames().size() << " frames; " << quiet.countPrefix("EGL: Timeout")
                      << " timeouts, " << quiet.countPrefix("EGL: Picture failed") << " failures";
     EXPECT_EQ(4u * kEach, listener.frames().size());
-    EXPECT_EQ(live, liveObjects());
     EXPECT_EQ(files, Test_openFiles());
 }
 

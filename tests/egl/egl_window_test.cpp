@@ -16,6 +16,7 @@
 
 #include "kivhost/VirtualCamera.h"
 #include "support/camera_frames.h"
+#include "support/eventually.h"
 #include "support/gl_context.h"
 #include "support/image_ptr.h"
 #include "support/log_capture.h"
@@ -80,7 +81,7 @@ TEST_P(LatchSizeTest, EachLatchedFrameShowsItsNumberAndColours) {
         std::vector<uint8_t> pixels = mDrawer->draw(mWindow->getTexture());
         // The texture samples the frame as the image core converts it; one
         // step of GPU rounding at most.
-        EXPECT_LE(CameraFrames_maxDifference(pixels, CameraFrames_rgba(i, w, h)), 1)
+        EXPECT_LE(VCImageTest_maxDifference(pixels, CameraFrames_rgba(i, w, h)), 1)
             << "frame " << i;
         EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(pixels.data(), w, h, false), (int64_t)i);
     }
@@ -309,9 +310,8 @@ TEST_F(GlContextTest, AThousandWindowsLeaveNoGlObjectOrMemoryFileBehind) {
         EXPECT_EQ(camera.queueFrame(), NO_INIT);  // the consumer is gone with the window
     };
     for (int i = 0; i < 3; ++i) ASSERT_NO_FATAL_FAILURE(cycle());  // pools fill up
-    const int objects = GlTest_liveObjects(64), files = Test_openFiles();
+    const int files = Test_openFiles();  // GL objects: the fixture counts them
     for (int i = 0; i < 1000; ++i) ASSERT_NO_FATAL_FAILURE(cycle());
-    EXPECT_EQ(GlTest_liveObjects(64), objects);
     EXPECT_EQ(Test_openFiles(), files);
 }
 
@@ -331,6 +331,9 @@ TEST_F(CameraWindowTest, CameraCallbacksLatchAndClientRunOnThreeThreads) {
     });
     int64_t last = -1;
     ASSERT_EQ(mWindow->updateTexImage(0), 0);
+    // The camera keeps real time: on a loaded machine its first frame may
+    // come after the 200 latches, so they start once it has come.
+    EXPECT_TRUE(eventually([&] { return mCamera->framesQueued() > 0; }));
     for (int i = 0; i < 200; ++i) {
         mClock.advance(41 * kMs);
         ASSERT_EQ(mWindow->updateTexImage(), 0);

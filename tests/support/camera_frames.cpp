@@ -52,10 +52,3 @@ std::vector<uint8_t> ExternalTextureDrawer::draw(GLuint texture) {
     if (mProgram->onDrawFrame() != 0) return {};
     return GlTest_readPixels(mWidth, mHeight);
 }
-
-int CameraFrames_maxDifference(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b) {
-    if (a.size() != b.size() || a.empty()) return 256;
-    int worst = 0;
-    for (size_t i = 0; i < a.size(); ++i) worst = std::max(worst, abs((int)a[i] - (int)b[i]));
-    return worst;
-}

@@ -39,8 +39,4 @@ private:
     bool mOk = false;
 };
 
-// The largest difference of one channel between two RGBA pictures (256 when
-// their sizes differ).
-int CameraFrames_maxDifference(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b);
-
 #endif

@@ -9,6 +9,8 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cstdlib>
 #include <memory>
 #include <random>
 #include <string>
@@ -62,6 +64,14 @@ inline std::vector<uint8_t> VCImageTest_bytes(const VCImage& image) {
 
 inline std::string VCImageTest_fourcc(uint32_t format) {
     return std::string(reinterpret_cast<const char*>(&format), 4);
+}
+
+// The largest difference between two byte vectors, 256 when their sizes differ.
+inline int VCImageTest_maxDifference(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b) {
+    if (a.size() != b.size() || a.empty()) return 256;
+    int worst = 0;
+    for (size_t i = 0; i < a.size(); ++i) worst = std::max(worst, std::abs(a[i] - b[i]));
+    return worst;
 }
 
 // The name of a generated check for a (source, target) format pair: "RGBA_NV21".
