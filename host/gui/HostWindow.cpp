@@ -55,6 +55,10 @@ status_t HostWindow::releaseFrame(const sp<GraphicBuffer>& buffer) {
     return mConsumer->releaseBuffer(item);
 }
 
+void HostWindow::abandon() {
+    mConsumer->abandon();
+}
+
 size_t HostWindow::queuedFrameCount() {
     return mConsumer->getQueueStats().pending;
 }

@@ -17,6 +17,7 @@ namespace {
 std::atomic<int> gProgramFaults{0};
 std::atomic<int> gReadFaults{0};
 std::atomic<int> gDrawFaults{0};
+std::atomic<int> gMakeCurrentFaults{0};
 
 std::mutex gBindsLock;
 std::vector<std::pair<EGLContext, GLuint>> gBinds;
@@ -51,6 +52,10 @@ void GlFault_failPictureReads(int count) {
 
 void GlFault_skipDraws(int count) {
     gDrawFaults = count;
+}
+
+void GlFault_failMakeCurrents(int count) {
+    gMakeCurrentFaults = count;
 }
 
 void GlFault_resetBinds() {
@@ -96,4 +101,19 @@ extern "C" void glBindFramebuffer(GLenum target, GLuint framebuffer) {
         gBinds.emplace_back(eglGetCurrentContext(), framebuffer);
     }
     next(target, framebuffer);
+}
+
+extern "C" EGLBoolean eglMakeCurrent(EGLDisplay display, EGLSurface draw, EGLSurface read,
+                                     EGLContext context) {
+    static const auto next =
+        driver<EGLBoolean (*)(EGLDisplay, EGLSurface, EGLSurface, EGLContext)>("eglMakeCurrent");
+    if (context != EGL_NO_CONTEXT && draw != EGL_NO_SURFACE && takeFault(gMakeCurrentFaults)) {
+        // The error eglGetError() reports next, as the driver would set it.
+        static const auto bad =
+            driver<EGLBoolean (*)(EGLDisplay, EGLSurface, EGLSurface, EGLContext)>(
+                "eglMakeCurrent");
+        bad(display, (EGLSurface)(intptr_t)-1, (EGLSurface)(intptr_t)-1, context);
+        return EGL_FALSE;
+    }
+    return next(display, draw, read, context);
 }

@@ -9,7 +9,8 @@
 //    (how a failed read-back of a whole picture looks to its caller); while
 //    armed, host buffers made from then on copy through GL instead of sharing
 //    their storage with the GPU, so that there is a read-back to fail;
-//  - glDrawArrays draws nothing, as a draw that covers no pixel.
+//  - glDrawArrays draws nothing, as a draw that covers no pixel;
+//  - eglMakeCurrent onto a surface fails.
 // Counts are per process; arming replaces the previous count.
 #ifndef KIV_TESTS_GL_FAULT_H
 #define KIV_TESTS_GL_FAULT_H
@@ -17,6 +18,9 @@
 void GlFault_failProgramCreations(int count);
 void GlFault_failPictureReads(int count);
 void GlFault_skipDraws(int count);
+// eglMakeCurrent of a context on a surface fails (EGL_BAD_SURFACE), as when
+// a window has gone; unbinding (no context) is passed on.
+void GlFault_failMakeCurrents(int count);
 
 // Binds of a framebuffer other than 0, since the last reset, by the context
 // that made the last draw call (whether or not the draw was skipped).

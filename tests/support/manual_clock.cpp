@@ -55,6 +55,16 @@ bool ManualClock::waitForWaiters(size_t count) {
                              [&] { return mWaiters.size() >= count; });
 }
 
+size_t ManualClock::waitsBegun() {
+    std::lock_guard<std::mutex> guard(mLock);
+    return mWaitsBegun;
+}
+
+bool ManualClock::waitForWaitsBegun(size_t count) {
+    std::unique_lock<std::mutex> lock(mLock);
+    return mChanged.wait_for(lock, std::chrono::seconds(20), [&] { return mWaitsBegun >= count; });
+}
+
 size_t ManualClock::waiters() {
     std::lock_guard<std::mutex> guard(mLock);
     return mWaiters.size();
@@ -81,6 +91,7 @@ android::status_t ManualClock::block(android::Condition& condition, android::Mut
     {
         std::lock_guard<std::mutex> guard(mLock);
         mWaiters.push_back(&self);
+        ++mWaitsBegun;
         mChanged.notify_all();
     }
     condition.wait(mutex);

@@ -26,6 +26,11 @@ public:
     // 20 s of real time (the test is broken, not slow).
     bool waitForWaiters(size_t count);
     size_t waiters();
+    // Waits begun on this clock since it was made, and a wait (20 s of real
+    // time at most) until they reach `count`: how a test tells that a thread
+    // has gone round its loop once more.
+    size_t waitsBegun();
+    bool waitForWaitsBegun(size_t count);
 
     nsecs_t bootTime() override;
     int64_t uptimeMillis() override;
@@ -49,6 +54,7 @@ private:
     std::condition_variable mChanged;
     std::list<Waiter*> mWaiters;
     nsecs_t mNow = 0;
+    size_t mWaitsBegun = 0;
     const nsecs_t mBootStart;
     const int64_t mUptimeStart;
 };

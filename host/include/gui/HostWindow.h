@@ -30,6 +30,10 @@ public:
     status_t acquireFrame(sp<GraphicBuffer>* buffer, uint64_t* frameNumber, int64_t* timestamp);
     status_t releaseFrame(const sp<GraphicBuffer>& buffer);
 
+    // The consumer goes away, as a display that dropped the window: the
+    // producer gets NO_INIT from then on.
+    void abandon();
+
     size_t queuedFrameCount();
     // Frames queued since creation, and frames dropped because the producer
     // needed their slot before the consumer took them.

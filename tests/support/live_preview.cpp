@@ -1,0 +1,86 @@
+#include "support/live_preview.h"
+
+#include <ui/GraphicBuffer.h>
+
+#include <cstring>
+
+using android::sp;
+
+LivePreview::LivePreview(const LivePreviewSetup& s)
+    : setup(s),
+      manager(new OpenGLManager(s.mode, s.display)),
+      preview(new android::HostWindow(s.width, s.height)) {
+    const int cameras = s.layout == CAMERA_LAYOUT_DUAL ? 2 : 1;
+    for (int i = 0; i < cameras; ++i) {
+        camera[i].reset(new kivhost::VirtualCamera(
+            kivhost::VirtualCamera_generator(s.width, s.height), s.width, s.height));
+    }
+}
+
+LivePreview::~LivePreview() {
+    release();
+}
+
+bool LivePreview::start(bool firstFrame) {
+    manager->setCameraSize(setup.width, setup.height, camera[1] ? setup.width : 0,
+                           camera[1] ? setup.height : 0);
+    manager->setPreviewWindow(setup.previewWindow ? sp<ANativeWindow>(preview.get()) : nullptr,
+                              setup.layout);
+    manager->startRenderThread();
+    for (int i = 0; i < 2 && camera[i]; ++i) {
+        sp<ANativeWindow> window = manager->getNewPreviewWindowForOpenGL(i);
+        if (window == nullptr || camera[i]->connect(window) != 0) return false;
+        if (firstFrame && camera[i]->queueFrame() != 0) return false;
+    }
+    manager->notifyGLSurfaceConnectionComplete();
+    return true;
+}
+
+std::vector<uint8_t> LivePreview::latestFrame() {
+    sp<android::GraphicBuffer> frame, next;
+    while (preview->acquireFrame(&next, nullptr, nullptr) == android::NO_ERROR) {
+        if (frame != nullptr) preview->releaseFrame(frame);
+        frame = next;
+    }
+    if (frame == nullptr) return {};
+    std::vector<uint8_t> rgba((size_t)frame->getWidth() * frame->getHeight() * 4);
+    void* address = nullptr;
+    if (frame->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &address) == android::NO_ERROR) {
+        const size_t row = (size_t)frame->getWidth() * 4;
+        for (uint32_t y = 0; y < frame->getHeight(); ++y) {
+            memcpy(&rgba[y * row], (uint8_t*)address + (size_t)y * frame->getStride() * 4, row);
+        }
+        frame->unlock();
+    } else {
+        rgba.clear();
+    }
+    preview->releaseFrame(frame);
+    return rgba;
+}
+
+void LivePreview::release() {
+    if (mReleased) return;
+    mReleased = true;
+    manager->release();
+    for (auto& c : camera) {
+        if (c) c->disconnect();
+    }
+}
+
+std::vector<uint8_t> LivePreview_flipRows(const std::vector<uint8_t>& rgba, int width, int height) {
+    std::vector<uint8_t> out(rgba.size());
+    const size_t row = (size_t)width * 4;
+    for (int y = 0; y < height; ++y) memcpy(&out[y * row], &rgba[(height - 1 - y) * row], row);
+    return out;
+}
+
+std::vector<uint8_t> LivePreview_mirror(const std::vector<uint8_t>& rgba, int width, int height) {
+    std::vector<uint8_t> out(rgba.size());
+    for (int y = 0; y < height; ++y) {
+        for (int x = 0; x < width; ++x) {
+            memcpy(&out[((size_t)y * width + x) * 4],
+                   &rgba[((size_t)y * width + width - 1 - x) * 4], 4);
+        }
+    }
+    return out;
+}
