@@ -1,10 +1,10 @@
-// The effects that own GL objects (the colour effects, DistortionCorrection,
-// Beauty) and the position snippets, on one long-lived program as a live
-// pipeline keeps it: load failures logged under each effect's own source with
-// the pass-through taking over (opaque), and no GL object left over a thousand
-// switches with parameter changes and Beauty's size changes between draws.
+// Effects drawn through EglProgram on llvmpipe: load failures logged under
+// each effect's own source with the pass-through taking over (opaque); no GL
+// object left over a thousand switches on one long-lived program, as a live
+// pipeline keeps it; the quantising looks' band edges and the base snippet.
 #include <gtest/gtest.h>
 
+#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -13,6 +13,7 @@
 #include "core/egl/EglProgram.h"
 #include "core/filters/sce/beauty.h"
 #include "core/filters/sce/colorEffects.h"
+#include "core/filters/sce/fixedLooks.h"
 #include "core/filters/sce/geometricEffects.h"
 #include "core/filters/sce/singleCameraEffects.h"
 #include "support/effect_renderer.h"
@@ -64,27 +65,37 @@ TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) 
     // Compiles alone, but reads a varying the vertex shader never writes.
     Snippet unlinked(
         "varying highp vec2 v_missing; vec4 doEffect() { return vec4(v_missing, 0.0, 1.0); }");
+    const std::string compile = "E Failed to compile shader: *",
+                      noProgram = "E Could not create a new program";
     struct Row {
         KivFilter* effect;
-        int programFaults;                  // program creations that fail
-        std::vector<std::string> prefixes;  // each logged exactly once, at error level
+        int programFaults;               // program creations that fail
+        std::vector<std::string> lines;  // every warning and error, before the fall-back's
     } rows[] = {
-        {&custom, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/customColor:"}},
-        {&serene, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/colorPresets:"}},
-        {&distortion, 0, {"VC_ERROR_UNKNOWN (-1): core/filters/sce/distortionCorrection:"}},
+        {&custom, 0, {compile, "E VC_ERROR_UNKNOWN (-1): core/filters/sce/customColor:#"}},
+        {&serene, 0, {compile, "E VC_ERROR_UNKNOWN (-1): core/filters/sce/colorPresets:#"}},
+        {&distortion,
+         0,
+         {compile, "E VC_ERROR_UNKNOWN (-1): core/filters/sce/distortionCorrection:#"}},
         {&brightness,
          1,
-         {"Could not create a new program",
-          "VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/brightness:"}},
-        {&beauty, 1, {"VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/beauty:"}},
+         {noProgram, "E VC_ERROR_UNKNOWN (-1): core/egl/EglShader:#",
+          "E VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/brightness:#"}},
+        {&beauty,
+         1,
+         {noProgram, "E VC_ERROR_UNKNOWN (-1): core/egl/EglShader:#",
+          "E VC_ERROR_ALLOC_FAILED (-5): core/filters/sce/beauty:#"}},
         {&undefined,
          0,
-         {"SingleEffect: could not load this shader",
-          "VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:"}},
-        {&unlinked, 0, {"SingleEffect: failed to link this shader: "}},
+         {compile, "E SingleEffect: could not load this shader",
+          "E VC_ERROR_UNKNOWN (-1): core/filters/sce/singleCameraEffects:#"}},
+        {&unlinked,
+         0,
+         {"E GL Error: Program failed to link.", "E VC_ERROR_UNKNOWN (-1): core/egl/EglShader:#",
+          "E SingleEffect: failed to link this shader: -1"}},
     };
     for (Row& r : rows) {
-        SCOPED_TRACE(r.prefixes.back());
+        SCOPED_TRACE(r.lines.back());
         EffectRenderer renderer(picture);
         ASSERT_TRUE(renderer.ok());
         LogCapture log;
@@ -92,10 +103,8 @@ TEST_F(GlContextTest, LoadFailuresAreLoggedUnderTheEffectsOwnSourceAndFallBack) 
         int result = renderer.draw(r.effect);
         GlFault_failProgramCreations(0);
         EXPECT_EQ(0, result);
-        for (const std::string& p : r.prefixes)
-            EXPECT_EQ(1u, log.countPrefix(p, VF_LOG_ERROR)) << p;
-        EXPECT_TRUE(
-            log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
+        r.lines.push_back("E GL Error: failed to load effect shader. Loading default.");
+        EXPECT_TRUE(log.matches(r.lines));
         EXPECT_FALSE(holdsGl(r.effect));
         // The pass-through took over: the picture, opaque.
         EXPECT_EQ(opaque, renderer.pixels());
@@ -159,6 +168,58 @@ TEST_F(GlContextTest, AThousandSwitchesOnOneProgramLeaveNoGlObject) {
     }
     for (auto& f : effects) EXPECT_FALSE(holdsGl(f.get())) << f->getFilterType();
     EXPECT_FALSE(holdsGl(beauty.get()));
+}
+
+// The band edges of the quantising looks: the whole-picture comparison in
+// tests/processor skips pixels near a threshold.
+TEST_F(GlContextTest, EdgeValuesOfTheQuantisingLooks) {
+    // White, black, and greys around the band limits.
+    lookref::Picture picture(6, 1, {255, 255, 255, 255, 0,   0,   0,   255, 76,  77,  76,  255,
+                                    77,  77,  77,  255, 204, 204, 205, 255, 127, 127, 128, 255});
+    Posterize posterize;
+    BW bw;
+    ThermalVision thermal;
+    struct Row {
+        KivFilter* look;
+        int pixel, channel, value;
+    } rows[] = {
+        // clang-format off
+        // floor(1.0 * 4) / 3 = 4/3, clamped by the target.
+        {&posterize, 0, 0, 255}, {&posterize, 0, 2, 255}, {&posterize, 1, 0, 0},
+        // 229/765 < 0.3 <= 231/765
+        {&bw, 0, 0, 0}, {&bw, 2, 0, 0}, {&bw, 3, 0, 255}, {&bw, 4, 0, 0}, {&bw, 5, 0, 255},
+        {&bw, 2, 3, 255},
+        // White is the red end, black the blue end; mean 382/765, just below
+        // the middle, is nearly pure yellow from the blue side.
+        {&thermal, 0, 0, 255}, {&thermal, 0, 1, 0}, {&thermal, 0, 2, 0}, {&thermal, 1, 0, 0},
+        {&thermal, 1, 2, 255}, {&thermal, 5, 0, 254}, {&thermal, 5, 1, 254}, {&thermal, 5, 2, 1},
+        // clang-format on
+    };
+    std::map<KivFilter*, std::vector<uint8_t>> drawn;
+    for (KivFilter* look : {(KivFilter*)&posterize, (KivFilter*)&bw, (KivFilter*)&thermal}) {
+        drawn[look] = EffectRenderer_renderOnce(look, picture);
+        ASSERT_EQ(24u, drawn[look].size());
+    }
+    for (const Row& r : rows) {
+        const std::vector<uint8_t>& pixels = drawn[r.look];
+        EXPECT_NEAR(r.value, pixels[r.pixel * 4 + r.channel], r.look == &thermal ? 1 : 0)
+            << r.look->getFilterType() << " pixel " << r.pixel << " channel " << r.channel;
+    }
+}
+
+TEST_F(GlContextTest, TheBaseSnippetKeepsAlpha) {
+    // A member with the base snippet.
+    struct Base : SingleCameraEffects {
+        int getFilterType() const override { return 390; }
+    } base;
+    lookref::Picture picture(16, 8, lookref::makeTestPicture(16, 8, false));
+    int result = -100;
+    // The program's default shader would force alpha to 1.
+    EXPECT_EQ(picture.rgba(), EffectRenderer_renderOnce(&base, picture, &result));
+    EXPECT_EQ(0, result);
+    EXPECT_EQ(0, base.onDrawFrame(*android::sp<EglProgram>(new EglProgram())));
+    EXPECT_EQ(VC_ERROR_UNSUPPORTED, base.doEffect());
+    EXPECT_TRUE(base.isGLPreviewSupported() && base.isGLPictureSupported());
 }
 
 }  // namespace

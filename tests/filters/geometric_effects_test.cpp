@@ -1,7 +1,7 @@
 // The geometric effects: their pictures through the buffered processor at odd
 // and even sizes against the CPU statement of their sampling (Ripple and
-// DistortionCorrection at several frames), and DistortionCorrection's option,
-// animation and per-frame uniforms. Load failures and GL objects: effect_gl_test.
+// DistortionCorrection at several frames), DistortionCorrection's option and
+// animation, and every camera orientation. Load failures and GL objects: effect_gl_test.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -10,7 +10,6 @@
 #include <vector>
 
 #include "core/KivImaging.h"
-#include "core/KivPixelReach.h"
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/EglProgram.h"
 #include "core/filters/sce/geometricEffects.h"
@@ -132,72 +131,64 @@ TEST(DistortionCorrection, TextsSetTheTargetLevel) {
     EXPECT_EQ(0.0f, effect.getCurrentLevel());  // options never move the drawn level
 }
 
-TEST_F(GlContextTest, DistortionEasesInAndOutAndFollowsThePreviewShape) {
+TEST_F(GlContextTest, DistortionEasesInAndOut) {
     lookref::Picture picture(12, 10, lookref::makeTestPicture(12, 10, true));
     DistortionCorrection effect;
     EffectRenderer renderer(picture);
-    ASSERT_TRUE(renderer.ok());
     LogCapture quiet;
-    effect.setOption("parameter", kRightSide);
-    for (int frame = 1; frame <= 14; ++frame) {
-        ASSERT_EQ(0, renderer.draw(&effect));
-        // The 13th step, 0.975, is within a step of 1 and goes all the way.
-        EXPECT_NEAR(frame < 13 ? 0.075f * frame : 1.0f, effect.getCurrentLevel(), 1e-5) << frame;
+    for (const char* text : {kRightSide, "FA=0"}) {
+        effect.setOption("parameter", text);
+        const bool in = text == kRightSide;
+        for (int frame = 1; frame <= 14; ++frame) {
+            ASSERT_EQ(0, renderer.draw(&effect));
+            // The 13th step, 0.975 (or 0.025), is within a step and goes all the way.
+            float moved = frame < 13 ? 0.075f * frame : 1.0f;
+            EXPECT_NEAR(in ? moved : 1.0f - moved, effect.getCurrentLevel(), 1e-5) << frame;
+        }
     }
-    // The four coordinate sets, zoomed 7.5% per side at level 1.
-    const float lo = 0.075f, hi = 0.925f;
-    // clang-format off
-    const float sets[4][8] = {{lo, hi, hi, hi, lo, lo, hi, lo}, {lo, lo, hi, lo, lo, hi, hi, hi},
-                              {hi, hi, lo, hi, hi, lo, lo, lo}, {hi, lo, lo, lo, hi, hi, lo, hi}};
-    // clang-format on
-    const float* actual[4] = {DistortionCorrection::DISTORTION_TEXCOORD,
-                              DistortionCorrection::DISTORTION_TEXCOORD_V_FLIP,
-                              DistortionCorrection::DISTORTION_TEXCOORD_H_FLIP,
-                              DistortionCorrection::DISTORTION_TEXCOORD_HV_FLIP};
-    for (int k = 0; k < 4; ++k)
-        for (int v = 0; v < 8; ++v) EXPECT_NEAR(sets[k][v], actual[k][v], 1e-6) << k << "," << v;
-    // u_distortion is the level for frames at least 1.7 wide, stronger below.
     float u[4];
-    for (auto shape : {std::make_pair(1920, 1080), std::make_pair(1440, 1080)}) {
-        renderer.program().setPreviewGeometry(shape.first, shape.second, false);
-        ASSERT_EQ(0, renderer.draw(&effect));
-        ASSERT_EQ(1, effect.getUniform("u_distortion", u));
-        EXPECT_FLOAT_EQ(shape.first == 1920 ? 1.0f : 1.2238373f, u[0]);
-        ASSERT_EQ(1, effect.getUniform("u_ratio", u));
-        EXPECT_FLOAT_EQ(float(shape.first) / shape.second, u[0]);
-    }
-    // Switched off: back to nothing in 13 frames.
-    effect.setOption("parameter", "FA=0");
-    for (int frame = 1; frame <= 13; ++frame) ASSERT_EQ(0, renderer.draw(&effect));
-    EXPECT_EQ(0.0f, effect.getCurrentLevel());
     ASSERT_EQ(1, effect.getUniform("u_distortion", u));
     EXPECT_EQ(0.0f, u[0]);
 }
 
-TEST(GeometricEffects, IdentityAndReach) {
-    struct Row {
-        int id;
-        bool singlePass;      // draws through the program's own quad
-        KivPixelReach reach;  // at 640x480
-    } rows[] = {
-        {445, true, {KivPixelReach::NEIGHBOURS, 25}},  // 32 px cells: 24 rows, +1 filtering
-        {444, true, {KivPixelReach::NEIGHBOURS, 21}},  // 0.04 of 480 rows, +1
-        {441, true, {KivPixelReach::NEIGHBOURS, 2}},
-        {417, true, {KivPixelReach::WHOLE_PICTURE, 0}},
-        {447, false, {KivPixelReach::WHOLE_PICTURE, 0}},
-        {446, false, {KivPixelReach::WHOLE_PICTURE, 0}},
-    };
-    for (const Row& r : rows) {
-        SCOPED_TRACE(r.id);
-        std::unique_ptr<KivFilter> f(KivImaging_create(r.id, nullptr));
-        ASSERT_NE(nullptr, f);
-        EXPECT_EQ(r.id, f->getFilterType());
-        EXPECT_EQ(r.singlePass, dynamic_cast<SingleCameraEffects*>(f.get()) != nullptr);
-        KivPixelReach reach = KivFilter_pixelReach(f.get(), 640, 480);
-        EXPECT_EQ(r.reach.kind, reach.kind);
-        EXPECT_EQ(r.reach.haloRows, reach.haloRows);
-        EXPECT_EQ(VC_ERROR_UNSUPPORTED, f->doEffect());
+// The same frame through the four camera geometries: each is the normal one
+// mirrored accordingly (Beauty's face and DistortionCorrection's zoom included).
+class CameraOrientation : public GlContextTest, public ::testing::WithParamInterface<int> {};
+
+TEST_P(CameraOrientation, MirrorsTheNormalFrame) {
+    const int w = 64, h = 48;
+    lookref::Picture picture(w, h, lookref::makeFacePicture(w, h));
+    std::unique_ptr<KivFilter> effect(KivImaging_create(GetParam(), nullptr));
+    effect->setOption("parameter", GetParam() == 447
+                                       ? kRightSide
+                                       : "face=1,intensity=3,width=64,height=48,left=14,top=8,"
+                                         "right=44,bottom=40,tonemin=7360576,tonemax=16771288");
+    LogCapture quiet;
+    std::vector<uint8_t> frames[4];
+    for (int type = 0; type < 4; ++type) {
+        EffectRenderer renderer(picture);
+        renderer.program().setCameraGeometryType(static_cast<EglProgram::GeometryType>(type), 0);
+        // DistortionCorrection reaches level 1 on the 13th frame and stays.
+        for (int frame = 0; frame < (type == 0 ? 13 : 1); ++frame)
+            ASSERT_EQ(0, renderer.draw(effect.get()));
+        frames[type] = renderer.pixels();
     }
+    // Where pixel (x, y) of the normal frame lands in each orientation.
+    auto at = [&](int type, int x, int y) {
+        bool flipX = type == 2 || type == 3, flipY = type == 0 || type == 2;
+        return size_t((flipY ? h - 1 - y : y) * w + (flipX ? w - 1 - x : x)) * 4;
+    };
+    int worst = 0;
+    for (int type : {0, 2, 3})
+        for (int y = 0; y < h; ++y)
+            for (int x = 0; x < w; ++x)
+                for (int k = 0; k < 4; ++k)
+                    worst = std::max(worst, std::abs(frames[1][at(1, x, y) + k] -
+                                                     frames[type][at(type, x, y) + k]));
+    EXPECT_LE(worst, 1);
+    EXPECT_NE(frames[1], picture.rgba());
 }
+
+INSTANTIATE_TEST_SUITE_P(BeautyAndDistortion, CameraOrientation, ::testing::Values(446, 447));
 
 }  // namespace
