@@ -23,17 +23,6 @@ namespace {
 
 using kivtest::Bytes;
 
-// Noise compresses badly: its files are large for their size.
-std::string writeNoise(const std::string& file, int side) {
-    ImagePtr image = VCImageTest_random(side, side, VC_FORMAT_RGBA, 12345);
-    for (uint32_t i = 3; i < image->size; i += 4) image->data[i] = 255;
-    size_t length = 0;
-    unsigned char* png = VCPicture_encodePng(image.get(), &length);
-    EXPECT_TRUE(kivtest::writeFile(file, Bytes(png, png + length)));
-    free(png);
-    return file;
-}
-
 // The file names in a folder, but for the fixture's own.
 std::set<std::string> namesIn(const std::string& folder) {
     std::set<std::string> names;
@@ -248,12 +237,9 @@ TEST_F(CliFiles, StraightAlphaIsKeptExactly) {
     const Bytes pixels = {100, 100, 100, 128, 250, 3, 77, 1, 9, 200, 31, 254, 0, 0, 0, 0};
     Bytes picture;
     for (int i = 0; i < 4; ++i) picture.insert(picture.end(), pixels.begin(), pixels.end());
-    size_t length = 0;
-    unsigned char* png =
-        VCPicture_encodePng(VCImageTest_wrap(picture.data(), 4, 4, VC_FORMAT_RGBA).get(), &length);
-    ASSERT_TRUE(kivtest::writeFile(path("alpha.png"), Bytes(png, png + length)));
-    free(png);
-    CliResult r = run({"apply", "-e", "400", path("alpha.png"), "-o", path("kept.png")});
+    const std::string in =
+        writePng("alpha.png", *VCImageTest_wrap(picture.data(), 4, 4, VC_FORMAT_RGBA));
+    CliResult r = run({"apply", "-e", "400", in, "-o", path("kept.png")});
     ASSERT_EQ(0, r.status) << r.err;
     ImagePtr out = load(path("kept.png"));
     ASSERT_NE(nullptr, out);
@@ -352,7 +338,10 @@ protected:
 };
 
 TEST_F(CliSmallDisk, FullOrReadOnlyDiskFailsCleanly) {
-    const std::string noise = writeNoise(path("noise.png"), 256);  // > 64 KB as JPEG or PNG
+    // Noise compresses badly: > 64 KB as JPEG or PNG.
+    ImagePtr random = VCImageTest_random(256, 256, VC_FORMAT_RGBA, 12345);
+    for (uint32_t i = 3; i < random->size; i += 4) random->data[i] = 255;
+    const std::string noise = writePng("noise.png", *random);
     const uint8_t grey[4] = {128, 128, 128, 255};
     const std::string flat = writePng("flat.png", 64, 64, grey);  // a few KB
     const Bytes old = kivtest::readFile(flat);

@@ -53,17 +53,20 @@ protected:
                 kivtest::readText(path("stderr"))};
     }
 
-    // A w x h PNG of the test picture, or of every pixel `flat` (RGBA).
-    std::string writePng(const std::string& name, int w, int h, const uint8_t* flat = nullptr) {
-        kivtest::Bytes pixels = kivtest::makeTestPicture(w, h, true);
-        for (int i = 0; flat != nullptr && i < w * h; i++) memcpy(&pixels[i * 4], flat, 4);
+    // `image` as a PNG in the folder; its path.
+    std::string writePng(const std::string& name, const VCImage& image) {
         size_t length = 0;
-        unsigned char* png = VCPicture_encodePng(
-            VCImageTest_wrap(pixels.data(), w, h, VC_FORMAT_RGBA).get(), &length);
+        unsigned char* png = VCPicture_encodePng(&image, &length);
         EXPECT_TRUE(png != nullptr &&
                     kivtest::writeFile(path(name), kivtest::Bytes(png, png + length)));
         free(png);
         return path(name);
+    }
+    // A w x h PNG of the test picture, or of every pixel `flat` (RGBA).
+    std::string writePng(const std::string& name, int w, int h, const uint8_t* flat = nullptr) {
+        kivtest::Bytes pixels = kivtest::makeTestPicture(w, h, true);
+        for (int i = 0; flat != nullptr && i < w * h; i++) memcpy(&pixels[i * 4], flat, 4);
+        return writePng(name, *VCImageTest_wrap(pixels.data(), w, h, VC_FORMAT_RGBA));
     }
 
     static ImagePtr load(const std::string& file) { return loadPicture(file); }
