@@ -190,24 +190,16 @@ TEST(BufferQueueTest, MisuseGetsItsStatus) {
         std::function<int()> call;
         int status;
     } cases[] = {
+        // clang-format off
         {"queue a slot never dequeued", [&] { return q.producer->queueBuffer(2, {}, nullptr); },
          BAD_VALUE},
         {"cancel a slot never dequeued", [&] { return q.producer->cancelBuffer(0); }, BAD_VALUE},
         {"request a slot out of range",
-         [&] {
-             sp<GraphicBuffer> b;
-             return q.producer->requestBuffer(9, &b);
-         },
-         BAD_VALUE},
+         [&] { sp<GraphicBuffer> b; return q.producer->requestBuffer(9, &b); }, BAD_VALUE},
         {"nine slots", [&] { return native_window_set_buffer_count(w, 9); }, BAD_VALUE},
         {"odd geometry", [&] { return native_window_set_buffers_geometry(w, 4, 0, 1); }, BAD_VALUE},
         {"unknown perform", [&] { return w->perform(w, 99); }, NAME_NOT_FOUND},
-        {"unknown query",
-         [&] {
-             int v;
-             return w->query(w, 99, &v);
-         },
-         BAD_VALUE},
+        {"unknown query", [&] { int v; return w->query(w, 99, &v); }, BAD_VALUE},
         {"connect no API", [&] { return native_window_api_connect(w, 0); }, BAD_VALUE},
         {"connect", [&] { return native_window_api_connect(w, NATIVE_WINDOW_API_EGL); }, NO_ERROR},
         {"connect twice", [&] { return native_window_api_connect(w, NATIVE_WINDOW_API_CPU); },
@@ -217,12 +209,8 @@ TEST(BufferQueueTest, MisuseGetsItsStatus) {
         {"acquire from an empty queue", [&] { return q.consumer->acquireBuffer(&item, 0); },
          IGraphicBufferConsumer::NO_BUFFER_AVAILABLE},
         {"zero default size", [&] { return q.raw->setDefaultBufferSize(0, 4); }, BAD_VALUE},
-        {"dequeue",
-         [&] {
-             return q.producer->dequeueBuffer(&slot, 0, 0, 0, 0) &
-                    ~IGraphicBufferProducer::BUFFER_NEEDS_REALLOCATION;
-         },
-         NO_ERROR},
+        {"dequeue", [&] { return q.producer->dequeueBuffer(&slot, 0, 0, 0, 0) &
+                                 ~IGraphicBufferProducer::BUFFER_NEEDS_REALLOCATION; }, NO_ERROR},
         {"buffer count with a buffer out", [&] { return native_window_set_buffer_count(w, 4); },
          INVALID_OPERATION},
         {"queue", [&] { return q.producer->queueBuffer(slot, {}, nullptr); }, NO_ERROR},
@@ -232,12 +220,10 @@ TEST(BufferQueueTest, MisuseGetsItsStatus) {
          IGraphicBufferConsumer::STALE_BUFFER_SLOT},
         {"release", [&] { return q.consumer->releaseBuffer(item); }, NO_ERROR},
         {"release twice", [&] { return q.consumer->releaseBuffer(item); }, BAD_VALUE},
-        {"every slot with the producer, one more",
-         [&] {
+        {"every slot with the producer, one more", [&] {
              for (int i = 0; i < 3; ++i) q.producer->dequeueBuffer(&slot, 0, 0, 0, 0);
-             return q.producer->dequeueBuffer(&slot, 0, 0, 0, 0);
-         },
-         INVALID_OPERATION},
+             return q.producer->dequeueBuffer(&slot, 0, 0, 0, 0); }, INVALID_OPERATION},
+        // clang-format on
     };
     for (const auto& c : cases) EXPECT_EQ(c.call(), c.status) << c.what;
     EXPECT_EQ(log.texts(),
