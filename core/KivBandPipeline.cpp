@@ -2,6 +2,8 @@
 
 #include <pthread.h>
 #include <string.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
@@ -39,12 +41,14 @@ ImageHandle wrap(unsigned char* data, int width, int height, uint32_t format) {
 }  // namespace
 
 KivBandPipeline::KivBandPipeline(EglProgram& program, EglSharedPicture& source,
-                                 EglSharedPicture& target, const Picture& picture)
+                                 EglSharedPicture& target, const Picture& picture,
+                                 const Tiles* tiles)
     : mProgram(program),
       mSource(source),
       mTarget(target),
       mPicture(picture),
-      mBandRows(bandRows(picture.width)) {}
+      mBandRows(picture.bandRows > 0 ? picture.bandRows : bandRows(picture.width)),
+      mTiles(tiles != nullptr ? *tiles : Tiles{nullptr, nullptr, 0, 0, 0}) {}
 
 namespace {
 std::atomic<int> gBandRowsForTesting{0};
@@ -140,7 +144,8 @@ int KivBandPipeline::draw() {
     // The quad covers every pixel where the program draws it; an effect that
     // draws by itself finds opaque black, as in a whole-picture draw.
     const bool clear = !mProgram.getDrawFlag();
-    glEnable(GL_SCISSOR_TEST);
+    const bool tiled = mTiles.source != nullptr;
+    if (!tiled) glEnable(GL_SCISSOR_TEST);
     for (int y0 = 0; y0 < h; y0 += mBandRows) {
         const int y1 = std::min(h, y0 + mBandRows);
         {
@@ -151,15 +156,20 @@ int KivBandPipeline::draw() {
             });
             if (mStatus != 0) break;
         }
-        glScissor(0, y0, w, y1 - y0);
-        if (clear) {
-            glClearColor(0, 0, 0, 1);
-            glClear(GL_COLOR_BUFFER_BIT);
+        int drawn = 0;
+        if (tiled) {
+            drawn = drawTiles(y0, y1, y0 == 0);
+        } else {
+            glScissor(0, y0, w, y1 - y0);
+            if (clear) {
+                glClearColor(0, 0, 0, 1);
+                glClear(GL_COLOR_BUFFER_BIT);
+            }
+            // One frame in parts: the effect's per-frame hook runs once, for
+            // the first band; effects that draw by themselves draw every band.
+            drawn = y0 == 0 || clear ? mProgram.onDrawFrame() : mProgram.redrawFrame();
+            glFinish();
         }
-        // One frame in parts: the effect's per-frame hook runs once, for the
-        // first band; effects that draw by themselves draw every band.
-        int drawn = y0 == 0 || clear ? mProgram.onDrawFrame() : mProgram.redrawFrame();
-        glFinish();
         if (drawn != 0) {
             fail(VC_REPORT(VC_ERROR_UNKNOWN));
             break;
@@ -170,9 +180,64 @@ int KivBandPipeline::draw() {
         mDrawn = y1;
         mChanged.notify_all();
     }
-    glDisable(GL_SCISSOR_TEST);
+    if (!tiled) glDisable(GL_SCISSOR_TEST);
     std::lock_guard<std::mutex> guard(mLock);
     return mStatus;
+}
+
+int KivBandPipeline::drawTiles(int y0, int y1, bool first) {
+    const int w = mPicture.width, h = mPicture.height;
+    const int haloRows = mPicture.haloRows, haloColumns = mTiles.haloColumns;
+    EglSharedPicture& from = *mTiles.source;
+    EglSharedPicture& to = *mTiles.target;
+    const int sourceWidth = mTiles.sourceWidth, sourceRows = mTiles.sourceRows;
+    // A side that fits keeps the picture's own positions; a side that does
+    // not is read through the window's mapping.
+    const bool allColumns = sourceWidth == w, allRows = sourceRows == h;
+    const int tileWidth = allColumns ? w : sourceWidth - 2 * haloColumns;
+    const int sy0 = std::max(0, y0 - haloRows), sy1 = std::min(h, y1 + haloRows);
+    const int firstRow = allRows ? sy0 : 0, endRow = allRows ? sy1 : sourceRows;
+    const bool clear = !mProgram.getDrawFlag();
+    for (int x0 = 0; x0 < w; x0 += tileWidth) {
+        const int x1 = std::min(w, x0 + tileWidth);
+        const int sx0 = std::max(0, x0 - haloColumns), sx1 = std::min(w, x1 + haloColumns);
+        const int columns = sx1 - sx0;
+        // Past the picture's edges a mapped tile repeats the edge pixels, as
+        // clamping does at the edges of the whole picture.
+        for (int r = firstRow; r < endRow; ++r) {
+            const int y = allRows ? r : std::min(sy0 + r, sy1 - 1);
+            uint32_t* row = reinterpret_cast<uint32_t*>(from.row(r));
+            memcpy(row, mSource.row(y) + (size_t)sx0 * 4, (size_t)columns * 4);
+            std::fill(row + columns, row + sourceWidth, row[columns - 1]);
+        }
+        // Read positions as texels of the whole picture less the tile's
+        // origin, over the tile picture's size: a side that fits a texture
+        // keeps its own positions, a mapped side is a power of two (exact).
+        const float u0 = (float)x0 / w, u1 = (float)x1 / w;
+        const float v0 = (float)y0 / h, v1 = (float)y1 / h;
+        const EglProgram::Window window = {
+            x1 - x0,
+            y1 - y0,
+            {u0, v0, u1, v0, u0, v1, u1, v1},
+            {allColumns ? 1.0f : (float)w, allRows ? 1.0f : (float)h,
+             allColumns ? 0.0f : (float)sx0, allRows ? 0.0f : (float)sy0},
+            {allColumns ? 1.0f : 1.0f / sourceWidth, allRows ? 1.0f : 1.0f / sourceRows}};
+        mProgram.setWindow(&window);
+        if (clear) {
+            glClearColor(0, 0, 0, 1);
+            glClear(GL_COLOR_BUFFER_BIT);
+        }
+        // As for bands: the per-frame hook runs for the first tile only.
+        const int drawn =
+            (first && x0 == 0) || clear ? mProgram.onDrawFrame() : mProgram.redrawFrame();
+        glFinish();
+        if (drawn != 0) return drawn;
+        for (int y = y0; y < y1; ++y)
+            memcpy(mTarget.row(y) + (size_t)x0 * 4, to.row(y - y0), (size_t)(x1 - x0) * 4);
+    }
+    // Rows no later band reads.
+    if (allRows && y1 - haloRows > 0) from.discardRowsBelow(y1 - haloRows);
+    return 0;
 }
 
 int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
@@ -189,4 +254,26 @@ int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
     encoder.join();
     std::lock_guard<std::mutex> guard(mLock);
     return rc != 0 ? rc : mStatus;
+}
+
+bool KivRowStore::make(int width, int height) {
+    mPitch = (size_t)width * 4;
+    mSize = mPitch * (size_t)height;
+    void* rows = mmap(nullptr, mSize, PROT_READ | PROT_WRITE,
+                      MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
+    if (rows == MAP_FAILED) return false;
+    mRows = static_cast<unsigned char*>(rows);
+    return true;
+}
+
+KivRowStore::~KivRowStore() {
+    if (mRows != nullptr) munmap(mRows, mSize);
+}
+
+void KivRowStore::discardRowsBelow(int y) {
+    const size_t page = (size_t)sysconf(_SC_PAGESIZE);
+    const size_t end = (size_t)y * mPitch / page * page;
+    if (end <= mDiscarded) return;
+    madvise(mRows + mDiscarded, end - mDiscarded, MADV_DONTNEED);
+    mDiscarded = end;
 }

@@ -15,6 +15,12 @@
 //                    asked, as a picture decoded to NV21 reaches the GPU)
 //   GL thread:       per band, once its source rows are there: draw, finish
 //   encoder thread:  rows of the target -> writer, then their memory goes
+//
+// A picture wider or taller than a texture keeps its rows in CPU memory
+// (KivRowStore) and each band is drawn in column tiles: the tile and the rows
+// and columns it reads around it are copied into a tile-sized source, drawn
+// as a window of the whole picture (EglProgram::Window: the picture's own
+// coordinates and steps) into a tile-sized target, and copied back.
 #ifndef KIV_CORE_KIVBANDPIPELINE_H
 #define KIV_CORE_KIVBANDPIPELINE_H
 
@@ -24,10 +30,10 @@
 #include <mutex>
 #include <vector>
 
+#include "core/egl/EglNativeSeam.h"
 #include "vccore/vc_stream.h"
 
 class EglProgram;
-class EglSharedPicture;
 
 class KivBandPipeline {
 public:
@@ -39,12 +45,29 @@ public:
         int haloRows;
         // Source rows cross RGBA -> NV21 -> RGBA (even sizes only).
         bool throughNv21;
+        // Rows per band; 0 for bandRows(width).
+        int bandRows;
+    };
+
+    // For pictures drawn in tiles: the GL side of one tile.
+    struct Tiles {
+        // Bound as the current external texture: a tile, its reach around
+        // it and, past the picture's edges, copies of the edge pixels.
+        EglSharedPicture* source;
+        // The framebuffer's colour buffer, a band's rows high.
+        EglSharedPicture* target;
+        int sourceWidth;
+        int sourceRows;
+        // Columns a pixel reads to either side.
+        int haloColumns;
     };
 
     // `program` draws the effect from the source (bound as the current
-    // external texture) into `framebuffer`, whose colour buffer is `target`.
+    // external texture) into the bound framebuffer, whose colour buffer is
+    // `target`; with `tiles`, source and target are CPU rows and the tiles'
+    // pictures are what GL draws from and into.
     KivBandPipeline(EglProgram& program, EglSharedPicture& source, EglSharedPicture& target,
-                    const Picture& picture);
+                    const Picture& picture, const Tiles* tiles = nullptr);
 
     // On the thread whose context holds the GL objects. 0; or
     // VC_ERROR_CODEC_FAILED when the picture did not decode (the reader says
@@ -68,6 +91,8 @@ private:
     void decode(VCStreamReader* reader);
     void encode(VCStreamWriter* writer);
     int draw();
+    // Draws rows [y0, y1) tile by tile; 0 or the failure.
+    int drawTiles(int y0, int y1, bool first);
     // Records the first failure and wakes every stage.
     void fail(int status);
 
@@ -76,6 +101,7 @@ private:
     EglSharedPicture& mTarget;
     const Picture mPicture;
     const int mBandRows;
+    const Tiles mTiles;  // all null without tiles
 
     // The decoder thread's band scratch (NV21, and RGBA where the source's
     // rows are padded).
@@ -88,6 +114,25 @@ private:
     int mDrawn = 0;    // target rows finished
     int mEncoded = 0;  // target rows encoded
     int mStatus = 0;   // the first failure
+};
+
+// Picture-sized RGBA rows in CPU memory of which only the rows written and
+// not yet discarded hold pages: the source and target of tiled pictures.
+class KivRowStore : public EglSharedPicture {
+public:
+    // Reserves the address space; false when it cannot.
+    bool make(int width, int height);
+    ~KivRowStore() override;
+    GLuint texture() const override { return 0; }
+    unsigned char* row(int y) const override { return mRows + (size_t)y * mPitch; }
+    size_t pitch() const override { return mPitch; }
+    void discardRowsBelow(int y) override;
+
+private:
+    unsigned char* mRows = nullptr;
+    size_t mPitch = 0;
+    size_t mSize = 0;
+    size_t mDiscarded = 0;
 };
 
 #endif

@@ -9,13 +9,15 @@ struct KivPixelReach {
     enum Kind {
         // The same input pixel (and the pixel's position in the picture).
         SAME_PIXEL = 0,
-        // Input rows up to haloRows above and below the output row.
+        // Input rows up to haloRows above and below the output row, and
+        // columns up to haloColumns to either side.
         NEIGHBOURS = 1,
         // Anywhere in the picture.
         WHOLE_PICTURE = 2,
     };
     Kind kind;
     int haloRows;
+    int haloColumns = 0;
 };
 
 // Effects that know their reach say so by also deriving from this.

@@ -56,10 +56,12 @@ public:
         if (mImage != EGL_NO_IMAGE_KHR) EglExtensions::get().eglDestroyImageKHR(mDisplay, mImage);
     }
 
-    bool make(int width, int height) {
+    // The GPU's source and target pictures: the whole picture's, or a
+    // tile's.
+    bool make(int sourceWidth, int sourceHeight, int targetWidth, int targetHeight) {
         EglNativeSeam& seam = EglNativeSeam::get();
-        source = seam.createSharedPicture(width, height);
-        target = seam.createSharedPicture(width, height);
+        source = seam.createSharedPicture(sourceWidth, sourceHeight);
+        target = seam.createSharedPicture(targetWidth, targetHeight);
         return source != nullptr && target != nullptr;
     }
 
@@ -102,6 +104,11 @@ private:
     GLuint mFramebuffer = 0;
 };
 
+// Columns beyond a tile's own that its pixels read, as haloRows() for rows.
+int haloColumns(const KivPixelReach& reach) {
+    return reach.kind == KivPixelReach::NEIGHBOURS ? reach.haloColumns + 2 : 2;
+}
+
 // Says why a picture takes the whole-picture path.
 int unstreamable(const char* why) {
     EglLog(VF_LOG_DEBUG, "EGL: picture not streamed: %s", why);
@@ -141,10 +148,50 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         VFilterBufferedProcessorImpl* self;
         ~Unbind() { self->unbindGLEnvironment(); }
     } unbind{this};
+    // Effects that do not say what they read (downloadable ones) may do
+    // anything with the picture; one that draws by itself in several passes
+    // reads rows its band's passes did not draw.
+    const KivPixelReach reach = KivFilter_pixelReach(mFilter, width, height);
+    if (dynamic_cast<const KivPixelReachSource*>(mFilter) == nullptr)
+        return unstreamable("the effect does not say which pixels it reads");
+    if (!mProgram->getDrawFlag() && reach.kind != KivPixelReach::SAME_PIXEL)
+        return unstreamable("the effect draws neighbour-reading passes by itself");
+    const int halo = haloRows(reach, height);
+    // Larger than a texture: tiles, each with the rows and columns it reads
+    // around it, for effects whose reach leaves room in a texture.
     const int maxSize = Platform::getMaximumTextureSize();
-    if (width > maxSize || height > maxSize) return unstreamable("larger than a texture");
+    const bool tiled = width > maxSize || height > maxSize;
+    KivBandPipeline::Picture picture = {width, height, halo, throughNv21, 0};
+    KivBandPipeline::Tiles tiles = {nullptr, nullptr, 0, 0, 0};
+    if (tiled) {
+        if (reach.kind == KivPixelReach::WHOLE_PICTURE)
+            return unstreamable("larger than a texture");
+        // A side larger than a texture is read in parts of a power-of-two
+        // size (see KivBandPipeline::drawTiles); a side that fits, whole.
+        int part = 1;
+        while (part * 2 <= maxSize) part *= 2;
+        tiles.haloColumns = haloColumns(reach);
+        picture.bandRows = KivBandPipeline::bandRows(width);
+        if (height > maxSize) picture.bandRows = std::min(picture.bandRows, part - 2 * halo);
+        if (picture.bandRows < 1 || (width > maxSize && part - 2 * tiles.haloColumns < 1))
+            return unstreamable("the effect reads too far for tiles of a texture");
+        tiles.sourceWidth = width > maxSize ? part : width;
+        tiles.sourceRows = height;
+        if (height > maxSize) {
+            tiles.sourceRows = 1;
+            while (tiles.sourceRows < picture.bandRows + 2 * halo) tiles.sourceRows *= 2;
+        }
+    }
+    const int tileWidth = width <= maxSize ? width : tiles.sourceWidth - 2 * tiles.haloColumns;
     StreamObjects gl(mEglEnv->getEGLDisplay());
-    if (!gl.make(width, height)) return unstreamable("no GPU memory the CPU reaches");
+    KivRowStore sourceRows, targetRows;
+    if (tiled ? !gl.make(tiles.sourceWidth, tiles.sourceRows, tileWidth, picture.bandRows)
+              : !gl.make(width, height, width, height))
+        return unstreamable("no GPU memory the CPU reaches");
+    if (tiled && (!sourceRows.make(width, height) || !targetRows.make(width, height))) {
+        EglLog(VF_LOG_ERROR, "EGL: no memory for the rows of a %dx%d picture", width, height);
+        return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    }
     if (!gl.bind()) {
         EglLog(VF_LOG_ERROR, "EGL: cannot stream a %dx%d picture through GL", width, height);
         return VC_REPORT(VC_ERROR_INVALID_STATE);
@@ -155,14 +202,6 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
     if (writer == nullptr) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     if (output.sink != nullptr) VCStreamWriter_setSink(writer.get(), output.sink, output.sinkUser);
 
-    // Effects that do not say what they read (downloadable ones) may do
-    // anything with the picture; one that draws by itself in several passes
-    // reads rows its band's passes did not draw.
-    const KivPixelReach reach = KivFilter_pixelReach(mFilter, width, height);
-    if (dynamic_cast<const KivPixelReachSource*>(mFilter) == nullptr)
-        return unstreamable("the effect does not say which pixels it reads");
-    if (!mProgram->getDrawFlag() && reach.kind != KivPixelReach::SAME_PIXEL)
-        return unstreamable("the effect draws neighbour-reading passes by itself");
     // The whole picture's trace, as its draw would leave it.
     EglLog(VF_LOG_DEBUG, "%s",
            throughNv21 ? "int VFilterBufferedProcessorImpl::doProcessNV21(const unsigned char*, "
@@ -178,9 +217,18 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
     }
     mProgram->setCameraGeometry(width, height, 0, 0);
     mProgram->setPreviewGeometry(width, height, false);
-    KivBandPipeline pipeline(*mProgram, *gl.source, *gl.target,
-                             {width, height, haloRows(reach, height), throughNv21});
-    int rc = pipeline.run(reader.get(), writer.get());
+    int rc;
+    if (tiled) {
+        tiles.source = gl.source.get();
+        tiles.target = gl.target.get();
+        KivBandPipeline pipeline(*mProgram, sourceRows, targetRows, picture, &tiles);
+        rc = pipeline.run(reader.get(), writer.get());
+        // The next picture is drawn whole again.
+        mProgram->setWindow(nullptr);
+    } else {
+        KivBandPipeline pipeline(*mProgram, *gl.source, *gl.target, picture);
+        rc = pipeline.run(reader.get(), writer.get());
+    }
     if (rc != 0) {
         *why = VCStreamReader_failure(reader.get());
         return rc;

@@ -3,6 +3,7 @@
 #include <GLES2/gl2.h>
 #include <stdio.h>
 #include <stdlib.h>
+#include <string.h>
 
 #include "core/KivFilter.h"
 #include "core/egl/EglCheck.h"
@@ -171,7 +172,9 @@ unsigned int EglProgram::loadFragmentShader(const char* code, bool complete) {
         VC_REPORT(VC_ERROR_UNKNOWN);
         return 0;
     }
-    if (complete) return mShader->loadShader(GL_FRAGMENT_SHADER, code);
+    std::string windowed;
+    if (complete)
+        return mShader->loadShader(GL_FRAGMENT_SHADER, windowedFragmentText(code, &windowed));
 
     char* source = nullptr;
 #pragma GCC diagnostic push
@@ -182,7 +185,8 @@ unsigned int EglProgram::loadFragmentShader(const char* code, bool complete) {
         VC_REPORT(VC_ERROR_ALLOC_FAILED);
         return 0;
     }
-    unsigned int id = mShader->loadShader(GL_FRAGMENT_SHADER, source);
+    unsigned int id =
+        mShader->loadShader(GL_FRAGMENT_SHADER, windowedFragmentText(source, &windowed));
     free(source);
     return id;
 }
@@ -306,6 +310,62 @@ int EglProgram::initShaderIndexer() {
     return 0;
 }
 
+namespace {
+// Every read through texture2D goes to the part of the picture the texture
+// holds; the effect's own text stays as it is.
+const char kWindowPrelude[] =
+    "uniform highp vec4 kivWindowMap; uniform highp vec2 kivWindowScale;\n"
+    "#define texture2D(s, c) texture2D(s, ((c) * kivWindowMap.xy - kivWindowMap.zw) * "
+    "kivWindowScale)\n";
+}  // namespace
+
+void EglProgram::setWindow(const Window* window) {
+    Mutex::Autolock lock(mLock);
+    if ((window != nullptr) != mWindowOn) mReloadNeeded = true;
+    mWindowOn = window != nullptr;
+    if (window != nullptr) mWindow = *window;
+}
+
+const char* EglProgram::windowedFragmentText(const char* text, std::string* storage) const {
+    if (!mWindowOn || text == nullptr) return text;
+    // After the directives that must come first.
+    const char* at = text;
+    while (strncmp(at, "#version", 8) == 0 || strncmp(at, "#extension", 10) == 0) {
+        const char* end = strchr(at, '\n');
+        if (end == nullptr) break;
+        at = end + 1;
+    }
+    storage->assign(text, at);
+    storage->append(kWindowPrelude);
+    storage->append(at);
+    return storage->c_str();
+}
+
+void EglProgram::setWindowUniform(unsigned int programId) const {
+    if (!mWindowOn) return;
+    GLint map = -1, scale = -1;
+    GL_CHECK(map = glGetUniformLocation(programId, "kivWindowMap"));
+    GL_CHECK(scale = glGetUniformLocation(programId, "kivWindowScale"));
+    // A shader that reads no texture has no mapping to set.
+    if (map >= 0) GL_CHECK(glUniform4fv(map, 1, mWindow.sampleMap));
+    if (scale >= 0) GL_CHECK(glUniform2fv(scale, 1, mWindow.sampleScale));
+}
+
+void EglProgram::viewport_l() {
+    if (mWindowOn) {
+        GL_CHECK(glViewport(0, 0, mWindow.width, mWindow.height));
+    } else {
+        GL_CHECK(glViewport(0, 0, mPreviewWidth, mPreviewHeight));
+    }
+}
+
+const float* EglProgram::quadTexCoords() const {
+    if (mWindowOn) return mWindow.texCoords;
+    if (mCamera0GeometryType >= GEOMETRY_VFLIP && mCamera0GeometryType <= GEOMETRY_HFLIP)
+        return kTexCoords[mCamera0GeometryType];
+    return nullptr;
+}
+
 void EglProgram::bindQuad_l() {
     mShader->bindProgram(EglShader::SHADER_PRECISION_HIGH);
     if (!mNameIndexReady) initShaderIndexer();
@@ -313,16 +373,17 @@ void EglProgram::bindQuad_l() {
     const float* texcoord = nullptr;
     if (isDualCamera()) {
         texcoord = kTexCoords[mPreviewFlip ? GEOMETRY_VFLIP : GEOMETRY_NORMAL];
-    } else if (mCamera0GeometryType >= GEOMETRY_VFLIP && mCamera0GeometryType <= GEOMETRY_HFLIP) {
-        texcoord = kTexCoords[mCamera0GeometryType];
+    } else {
+        texcoord = quadTexCoords();
     }
     if (texcoord != nullptr) mShader->bindVertexAttrib("a_texcoord", 2, texcoord);
+    setWindowUniform(getProgramID());
 }
 
 int EglProgram::redrawFrame() {
     Mutex::Autolock lock(mLock);
     if (mShader == nullptr || !mDrawFlag || mReloadNeeded) return VC_REPORT(VC_ERROR_INVALID_STATE);
-    GL_CHECK(glViewport(0, 0, mPreviewWidth, mPreviewHeight));
+    viewport_l();
     bindQuad_l();
     if (!GL_CHECK(glDrawArrays(GL_TRIANGLE_STRIP, 0, 4))) return VC_REPORT(VC_ERROR_UNKNOWN);
     mShader->unBindVertexAttrib("a_position");
@@ -354,7 +415,7 @@ int EglProgram::onDrawFrame() {
         if (result != 0) return result;
     }
 
-    GL_CHECK(glViewport(0, 0, mPreviewWidth, mPreviewHeight));
+    viewport_l();
 
     if (mDrawFlag) bindQuad_l();
 

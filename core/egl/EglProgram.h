@@ -14,6 +14,8 @@
 #include <utils/Mutex.h>
 #include <utils/RefBase.h>
 
+#include <string>
+
 #include "core/egl/EglRecycler.h"
 #include "core/egl/EglShader.h"
 
@@ -78,6 +80,33 @@ public:
     // quad (the draw flag); -7 otherwise.
     int redrawFrame();
 
+    // One window of a picture larger than a texture, drawn into a
+    // framebuffer of the window's size: the quad carries the whole picture's
+    // texture coordinates of the window's corners (so effects see the
+    // picture's own positions and steps), and every texture read maps them
+    // into the part of the picture the source texture holds:
+    // held = (whole * sampleMap.xy - sampleMap.zw) * sampleScale.
+    struct Window {
+        int width;
+        int height;
+        float texCoords[8];  // as kTexCoords, camera 0
+        float sampleMap[4];
+        float sampleScale[2];
+    };
+    // nullptr goes back to whole pictures. Turning windows on or off
+    // rebuilds the effect's shaders at the next onDrawFrame().
+    void setWindow(const Window* window);
+    // nullptr while drawing whole pictures.
+    const Window* getWindow() const { return mWindowOn ? &mWindow : nullptr; }
+    // A fragment shader's text as it must be compiled now: as given, or with
+    // the window's read mapping in front. Uses *storage when it changes it.
+    const char* windowedFragmentText(const char* text, std::string* storage) const;
+    // On `programId`, in use: the window's read mapping (nothing without one).
+    void setWindowUniform(unsigned int programId) const;
+    // The quad's texture coordinates for camera 0: the window's, or those of
+    // the geometry type (nullptr for a type that binds none).
+    const float* quadTexCoords() const;
+
     // For effects: whether the program binds the quad and draws itself.
     void setDrawFlag(bool draw) { mDrawFlag = draw; }
     bool getDrawFlag() const { return mDrawFlag; }
@@ -102,6 +131,7 @@ private:
     int initialize_l(int cameraMode, bool defaultOnly);
     // Uses the program and binds the quad's vertices and texture coordinates.
     void bindQuad_l();
+    void viewport_l();
     void release_l();
     int loadEffectShader();
     int loadDefaultShader();
@@ -127,6 +157,8 @@ private:
     bool mReloadNeeded;
     bool mNameIndexReady;
     bool mDrawFlag;
+    bool mWindowOn = false;
+    Window mWindow = {};
     android::Mutex mLock;
 };
 

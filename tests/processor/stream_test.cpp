@@ -5,7 +5,9 @@
 #include <stdlib.h>
 
 #include <cmath>
+#include <functional>
 #include <memory>
+#include <numeric>
 #include <string>
 #include <vector>
 
@@ -177,6 +179,51 @@ TEST_P(StreamTest, NeighbourReadingEffectsKeepTheirReach) {
     EXPECT_TRUE(band == whole(input, VC_FORMAT_RGBA, false, 90));
 }
 
+// Pictures larger than a texture (128 here) go in tiles, each drawn as a
+// window of the whole picture, for every effect whose reach leaves room in a
+// tile; the others keep to the whole-picture path, which refuses them. Reads
+// map exactly (sides that fit keep their positions, mapped sides are powers
+// of two), but GL interpolates a tile's coordinates from the tile's corners:
+// effects that use the position (Vignette, Rainbow, Ripple) may round the
+// odd pixel to the next level.
+TEST_P(StreamTest, TilesGiveTheUntiledPixels) {
+    struct Size {
+        int width, height;
+    } sizes[] = {{256, 64}, {64, 256}, {200, 150}};
+    for (const Size& size : sizes) {
+        const Bytes input = jpegOf(size.width, size.height);
+        ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
+        const KivPixelReach reach =
+            KivFilter_pixelReach(sProcessor->getEffect(), size.width, size.height);
+        const int rows = reach.kind == KivPixelReach::NEIGHBOURS ? reach.haloRows + 2 : 2;
+        const int columns = reach.kind == KivPixelReach::NEIGHBOURS ? reach.haloColumns + 2 : 2;
+        const bool tiles = !declines(sProcessor->getEffect()) &&
+                           reach.kind != KivPixelReach::WHOLE_PICTURE && 2 * rows < 128 &&
+                           (size.width <= 128 || 2 * columns < 128);
+        for (bool nv21 : {false, true}) {
+            SCOPED_TRACE(testing::Message()
+                         << size.width << "x" << size.height << " nv21 " << nv21);
+            int rc = -1;
+            const Bytes untiled = streamed(input, nv21, true, 0, &rc);
+            Platform::setMaximumTextureSizeForTesting(128);
+            const Bytes tiled = streamed(input, nv21, true, 0, &rc);
+            Platform::resetForTesting();
+            ASSERT_EQ(tiles ? 0 : VC_ERROR_UNSUPPORTED, rc);
+            if (!tiles) continue;
+            if (tiled == untiled) continue;
+            ImagePtr a(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
+            ImagePtr b(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
+            ASSERT_EQ(0, VCImage_decodeFromJpeg(a.get(), tiled.data(), (int)tiled.size()));
+            ASSERT_EQ(0, VCImage_decodeFromJpeg(b.get(), untiled.data(), (int)untiled.size()));
+            const std::vector<uint8_t> pa = VCImageTest_bytes(*a), pb = VCImageTest_bytes(*b);
+            EXPECT_LE(VCImageTest_maxDifference(pa, pb), 1);
+            EXPECT_LE(std::inner_product(pa.begin(), pa.end(), pb.begin(), size_t(0),
+                                         std::plus<size_t>(), std::not_equal_to<uint8_t>()),
+                      pa.size() / 1000);
+        }
+    }
+}
+
 INSTANTIATE_TEST_SUITE_P(Factory, StreamTest, ::testing::ValuesIn(factoryIds()),
                          [](const ::testing::TestParamInfo<int>& info) {
                              return std::to_string(info.param);
@@ -207,7 +254,7 @@ TEST(StreamRefusal, StatusAndReason) {
     } table[] = {
         {"odd size through NV21", odd, true, 0, VC_ERROR_UNSUPPORTED, VC_DECODE_OK},
         {"odd size as RGBA", odd, false, 0, 0, VC_DECODE_OK},
-        {"taller than a texture", jpeg, false, 128, VC_ERROR_UNSUPPORTED, VC_DECODE_OK},
+        {"taller than a texture: tiles", jpeg, false, 128, 0, VC_DECODE_OK},
         {"not a picture", text, false, 0, VC_ERROR_CODEC_FAILED, VC_DECODE_NOT_A_PICTURE},
         {"cut short", truncated, false, 0, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
     };

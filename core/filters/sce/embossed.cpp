@@ -46,5 +46,5 @@ int Embossed::onDrawFrame(EglProgram& program) {
 
 KivPixelReach Embossed::pixelReach(int width, int height) const {
     int sideways = static_cast<int>(std::ceil(static_cast<double>(height) / std::max(width, 1)));
-    return {KivPixelReach::NEIGHBOURS, std::max(1, sideways + 1)};
+    return {KivPixelReach::NEIGHBOURS, std::max(1, sideways + 1), 1 + 1};
 }

@@ -15,10 +15,10 @@ public:
 };
 
 // Comic and GothicNoir compare each texel with neighbours 0.002 of the
-// picture up and to the left: that many rows, and one more that linear
-// filtering blends in.
-inline KivPixelReach KivEdgeLookReach(int height) {
-    return {KivPixelReach::NEIGHBOURS, (int)ceil(0.002 * height) + 1};
+// picture up and to the left: that many rows and columns, and one more that
+// linear filtering blends in.
+inline KivPixelReach KivEdgeLookReach(int width, int height) {
+    return {KivPixelReach::NEIGHBOURS, (int)ceil(0.002 * height) + 1, (int)ceil(0.002 * width) + 1};
 }
 
 // Pass-through: copies the texel. The fallback of every processor.
@@ -68,7 +68,9 @@ public:
     static const int kType = 410;
     int getFilterType() const override { return kType; }
     const char* getFragmentShader() const override;
-    KivPixelReach pixelReach(int, int height) const override { return KivEdgeLookReach(height); }
+    KivPixelReach pixelReach(int width, int height) const override {
+        return KivEdgeLookReach(width, height);
+    }
 };
 
 // Grey only: 5 luma levels, black edges, lowered contrast and a radial darkening.
@@ -77,7 +79,9 @@ public:
     static const int kType = 412;
     int getFilterType() const override { return kType; }
     const char* getFragmentShader() const override;
-    KivPixelReach pixelReach(int, int height) const override { return KivEdgeLookReach(height); }
+    KivPixelReach pixelReach(int width, int height) const override {
+        return KivEdgeLookReach(width, height);
+    }
 };
 
 // Three corner tints (red, yellow, blue) weighted by closeness; the sum may exceed 1 and

@@ -3,6 +3,8 @@
 #include <GLES2/gl2.h>
 #include <string.h>
 
+#include <string>
+
 #include "core/egl/EglCheck.h"
 #include "core/egl/EglProgram.h"
 #include "core/egl/EglRecycler.h"
@@ -73,7 +75,9 @@ int FullShaderEffects::loadFullShader(EglProgram& program, unsigned int& shaderI
     for (const Uniform& u : mUniforms) names.push_back(u.name);
     names.push_back(nullptr);
     int status = 0;
-    mShader = KivEffectShader_build(getFragmentShader(), names.data(), source, line, &status);
+    std::string windowed;
+    mShader = KivEffectShader_build(program.windowedFragmentText(getFragmentShader(), &windowed),
+                                    names.data(), source, line, &status);
     return status;
 }
 
@@ -93,13 +97,9 @@ int FullShaderEffects::drawFullShader(EglProgram& program, const float* texcoord
         }
     }
     mShader->bindVertexAttrib("a_position", 3, EglProgram::kVertices);
-    if (texcoords == nullptr) {
-        int type = program.getCameraGeometryType(0);
-        if (type >= EglProgram::GEOMETRY_VFLIP && type <= EglProgram::GEOMETRY_HFLIP) {
-            texcoords = EglProgram::kTexCoords[type];
-        }
-    }
+    if (texcoords == nullptr) texcoords = program.quadTexCoords();
     if (texcoords != nullptr) mShader->bindVertexAttrib("a_texcoord", 2, texcoords);
+    program.setWindowUniform(mShader->getProgramId());
     glDrawArrays(GL_TRIANGLE_STRIP, 0, 4);
     // Logged, not returned: a failed draw must not make the program drop the effect.
     EglCheck_gl("glDrawArrays(GL_TRIANGLE_STRIP, 0, 4)", source, line);

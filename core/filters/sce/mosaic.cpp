@@ -26,5 +26,5 @@ int Mosaic::onDrawFrame(EglProgram& program) {
 
 KivPixelReach Mosaic::pixelReach(int width, int height) const {
     int cellRows = static_cast<int>(std::ceil(32.0 * height / std::max(width, 1)));
-    return {KivPixelReach::NEIGHBOURS, cellRows + 1};
+    return {KivPixelReach::NEIGHBOURS, cellRows + 1, 32 + 1};
 }

@@ -24,6 +24,7 @@ int Ripple::onDrawFrame(EglProgram& program) {
     return 0;
 }
 
-KivPixelReach Ripple::pixelReach(int, int height) const {
-    return {KivPixelReach::NEIGHBOURS, static_cast<int>(std::ceil(0.04 * height)) + 1};
+KivPixelReach Ripple::pixelReach(int width, int height) const {
+    return {KivPixelReach::NEIGHBOURS, static_cast<int>(std::ceil(0.04 * height)) + 1,
+            static_cast<int>(std::ceil(0.04 * width)) + 1};
 }
