@@ -1,0 +1,284 @@
+// Recording in the render manager on real GL: the encoder's input is the
+// host video encoder, whose MP4 is decoded back here and compared with the
+// effect computed on the CPU over each camera frame; frame selection and
+// its interval clock run on a clock the test moves.
+// kiv-test-labels: threads
+#include <gtest/gtest.h>
+
+#include <memory>
+
+#include "core/KivImaging.h"
+#include "host/media/VideoEncoderTestSeam.h"
+#include "kivhost/VideoEncoder.h"
+#include "kivhost/VirtualCamera.h"
+#include "kivimaging/OpenGLManager.h"
+#include "support/camera_frames.h"
+#include "support/eventually.h"
+#include "support/live_preview.h"
+#include "support/log_capture.h"
+#include "support/look_reference.h"
+#include "support/manual_clock.h"
+#include "support/temp_dir.h"
+#include "support/video_files.h"
+#include "vccore/vc_log.h"
+
+namespace {
+
+const int kW = 64, kH = 48;
+const int kSepia = 401;
+// What 4:2:0 and libx264 (crf 20) keep of an effect frame, as PSNR of the
+// colour channels against the CPU's effect: the chroma of each 2x2 block is
+// one sample, so the bars' coloured edges cost most.
+const double kMinPsnr = 28.0;
+
+using kivhost::VideoEncoder;
+
+struct Effect {
+    explicit Effect(int id) : imaging(KivImaging_create(id, nullptr)) {}
+    ~Effect() { KivImaging_destroy(imaging.getFilter()); }
+    KivImaging imaging;
+};
+
+class RecordingTest : public ::testing::Test {
+public:
+    void start(LivePreview& live) {
+        ASSERT_TRUE(live.start(true));
+        ASSERT_TRUE(clock.waitForWaitsBegun(1));
+    }
+    // One frame period: the camera queues its next frame, the clock moves
+    // `ms` and the render thread goes round once more; then the encoder has
+    // taken every frame recorded (so the render thread never waits for it).
+    void step(LivePreview& live, int ms = 41) {
+        const size_t waits = clock.waitsBegun();
+        ASSERT_EQ(live.camera[0]->queueFrame(), 0);
+        clock.advanceMs(ms);
+        ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
+        if (encoder != nullptr) {
+            ASSERT_TRUE(eventually(
+                [&] { return kivhost::VideoEncoderTestSeam::taken(*encoder) >= recorded(); }));
+        }
+    }
+    // Stopping asks the render thread for a frame at once (no camera frame
+    // is needed): wait until it has drawn it and waits again.
+    void stopRecording(LivePreview& live) {
+        const size_t waits = clock.waitsBegun();
+        ASSERT_EQ(live.manager->setRecordingSurface(nullptr), 0);
+        ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
+    }
+    void openEncoder(int width = kW, int height = kH) {
+        kivhost::VideoEncoderSettings settings;
+        settings.width = width;
+        settings.height = height;
+        settings.threads = 1;
+        settings.backlog = 256;
+        encoder = VideoEncoder::open(dir.file("rec.mp4"), settings);
+        ASSERT_NE(encoder, nullptr);
+    }
+    // Frames the manager queued into the encoder.
+    uint64_t recorded() { return encoder != nullptr ? encoder->stats().queued : 0; }
+    DecodedVideo closeAndDecode() {
+        DecodedVideo video;
+        EXPECT_EQ(encoder->close(), 0);
+        EXPECT_TRUE(VideoFiles_decode(encoder->path(), &video));
+        return video;
+    }
+
+    LogCapture log;
+    ManualClock clock;
+    kivtest::TempDir dir;
+    std::unique_ptr<VideoEncoder> encoder;
+};
+
+// Every frame is recorded by default, in both drawing modes, and each
+// recorded frame is the effect over the camera frame of its render.
+class RecordingModeTest : public RecordingTest,
+                          public ::testing::WithParamInterface<OpenGLManagerMode> {};
+
+TEST_P(RecordingModeTest, EveryFrameIsRecordedAsTheEffectOverItsCameraFrame) {
+    LivePreviewSetup setup;
+    setup.mode = GetParam();
+    LivePreview live(setup);
+    Effect sepia(kSepia);
+    live.manager->setFilter(&sepia.imaging);
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    // The GL side is built on the next frame (camera frame 1), which is not
+    // recorded; frames 2 to 7 are.
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 0u);
+    for (int i = 0; i < 6; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 6u);
+    ASSERT_NO_FATAL_FAILURE(stopRecording(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 6u);
+    // The preview went on all along, showing the newest frame.
+    const std::vector<uint8_t> shown = live.latestFrame();
+    ASSERT_FALSE(shown.empty());
+    lookref::expectLook(kSepia, lookref::Picture(kW, kH, CameraFrames_rgba(9, kW, kH)),
+                        shown.data(), "preview after recording");
+    live.release();
+
+    const DecodedVideo video = closeAndDecode();
+    ASSERT_EQ(video.rgba.size(), 6u);
+    for (int i = 0; i < 6; ++i) {
+        const lookref::Picture camera(kW, kH, CameraFrames_rgba(i + 2, kW, kH));
+        const std::vector<uint8_t> expected = lookref::render(kSepia, camera, nullptr);
+        EXPECT_GE(VideoFiles_psnr(video.rgba[i], expected, 4), kMinPsnr) << "recorded frame " << i;
+        // Against the neighbouring camera frame it must do worse.
+        const lookref::Picture other(kW, kH, CameraFrames_rgba(i + 3, kW, kH));
+        EXPECT_GT(VideoFiles_psnr(video.rgba[i], expected, 4),
+                  VideoFiles_psnr(video.rgba[i], lookref::render(kSepia, other, nullptr), 4))
+            << "recorded frame " << i;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Modes, RecordingModeTest,
+                         ::testing::Values(OPENGL_MANAGER_DIRECT, OPENGL_MANAGER_INTERMEDIATE));
+
+TEST_F(RecordingTest, MotionRecordsOneFrameForEachRequestThenNone) {
+    LivePreview live;
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    for (int i = 0; i < 3; ++i) live.manager->setRecordingMotion(1);
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    for (int i = 0; i < 8; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 3u);
+    // Another request records one more; zero cancels what is pending.
+    live.manager->setRecordingMotion(1);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 4u);
+    live.manager->setRecordingMotion(1);
+    live.manager->setRecordingMotion(0);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 4u);
+    live.release();
+    const DecodedVideo video = closeAndDecode();
+    ASSERT_EQ(video.rgba.size(), 4u);
+    // Frames 2, 3 and 4 (the first after the GL side was built), then 9.
+    const int64_t frames[] = {2, 3, 4, 9};
+    for (int i = 0; i < 4; ++i) {
+        EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[i].data(), kW, kH, false),
+                  frames[i]);
+    }
+}
+
+TEST_F(RecordingTest, AnIntervalFrameComesOnlyAfterMoreThanTheInterval) {
+    LivePreview live;
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    live.manager->setRecordingInterval(1000);
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));  // built at t0: the interval starts here
+    for (int i = 0; i < 23; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 0u);  // t0 + 943
+    // A period overslept by 16 ms: this frame is exactly 1000 ms after t0.
+    ASSERT_NO_FATAL_FAILURE(step(live, 57));
+    EXPECT_EQ(recorded(), 0u);
+    EXPECT_EQ(log.count("EGL: interval recording"), 0u);
+    ASSERT_NO_FATAL_FAILURE(step(live, 25));  // t0 + 1025
+    EXPECT_EQ(recorded(), 1u);
+    EXPECT_EQ(log.count("EGL: interval recording"), 1u);
+    // The next one counts from there.
+    for (int i = 0; i < 24; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 1u);  // t0 + 1025 + 984
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 2u);
+    live.release();
+}
+
+TEST_F(RecordingTest, AClosedEncoderEndsTheRecordingAndThePreviewGoesOn) {
+    LivePreview live;
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    for (int i = 0; i < 4; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(encoder->close(), 0);
+    const uint64_t shown = live.framesShown();
+    ASSERT_NO_FATAL_FAILURE(step(live));  // the consumer is found gone
+    ASSERT_NO_FATAL_FAILURE(step(live));  // the GL side goes
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(log.count("EGL: The recording surface has most likely been deleted (NO_INIT). "
+                        "Stopping record."),
+              1u);
+    EXPECT_EQ(live.framesShown(), shown + 3);
+    const std::vector<uint8_t> frame = live.latestFrame();
+    ASSERT_FALSE(frame.empty());
+    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(frame.data(), kW, kH, false), 7);
+    // Recording again, into a new encoder, works.
+    encoder.reset();
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 1u);
+    live.release();
+    DecodedVideo video = closeAndDecode();
+    ASSERT_EQ(video.rgba.size(), 1u);
+    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[0].data(), kW, kH, false), 9);
+}
+
+// Start and stop many times with the pipeline running: nothing leaks (the
+// sanitizer builds check) and each recording holds its own frames.
+TEST_F(RecordingTest, StartAndStopCycles) {
+    const int kCycles = 200;
+    LivePreview live;
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    for (int i = 0; i < kCycles; ++i) {
+        ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+        ASSERT_NO_FATAL_FAILURE(step(live));
+        ASSERT_NO_FATAL_FAILURE(step(live));
+        ASSERT_NO_FATAL_FAILURE(stopRecording(live));
+        ASSERT_NO_FATAL_FAILURE(step(live));
+    }
+    EXPECT_EQ(recorded(), (uint64_t)kCycles);
+    live.release();
+    EXPECT_EQ(encoder->close(), 0);
+    EXPECT_EQ(encoder->stats().encoded, (uint64_t)kCycles);
+}
+
+// The lines and statuses of recording, in order.
+TEST_F(RecordingTest, LogLinesAndStatuses) {
+    LivePreviewSetup setup;
+    setup.mode = OPENGL_MANAGER_INTERMEDIATE;
+    setup.width = 1080;
+    setup.height = 1440;
+    LivePreview live(setup);
+    ASSERT_NO_FATAL_FAILURE(openEncoder(1080, 1440));
+    // No program before the render thread has drawn.
+    EXPECT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), VC_ERROR_INVALID_STATE);
+    EXPECT_TRUE(log.matches({
+        "D EGL: Called setRecordingSurface: *",
+        "E EGL: Can't start recording now: preview window is *",
+        "E VC_ERROR_INVALID_STATE (-7): core/egl/OpenGLManager:#",
+    }));
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    // A tall preview: the intermediate image is clamped to 1080 rows.
+    EXPECT_EQ(log.count("bool OpenGLManager::initializeRecordingFBO() : 810 x 1080"), 1u);
+    log.clear();
+    live.manager->setRecordingInterval(-1);
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 1u);
+    ASSERT_NO_FATAL_FAILURE(stopRecording(live));
+    ASSERT_EQ(live.manager->setRecordingSurface(nullptr), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_TRUE(log.matches({
+        "D EGL: setRecordingInterval: -1",
+        "D EGL: Called setRecordingSurface: *",
+        "D EGL: Recording window is NULL, creating it now.",
+        "D EGL: Recording window size: 1080x1440",
+        "D EGL: Updated window geometry 0x0 --> 1080x1440 [*",
+        "D bool OpenGLManager::initializeRecordingFBO() : 810 x 1080",
+        "D EGL: Successfully created surface for recording!",
+        "D EGL: Called setRecordingSurface: (nil)",
+        "D EGL: Stopping recording now. Releasing recording surface and stuff.",
+        "D EGL: Called setRecordingSurface: (nil)",
+    }));
+    live.release();
+}
+
+}  // namespace
