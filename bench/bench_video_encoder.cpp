@@ -16,9 +16,7 @@
 #include <string>
 #include <vector>
 
-#include <gui/Surface.h>
-
-#include "kivhost/VideoEncoder.h"
+#include "encoder_bench.h"
 #include "kivhost/VirtualCamera.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
@@ -31,15 +29,10 @@ constexpr int kDistinct = 48;  // two seconds of different frames
 constexpr int kFrames = 96;    // each run encodes them twice over
 constexpr int kRuns = 5;
 
-std::vector<double> gOurs, gPeer, gOursCost;
+std::vector<double> gOurs, gPeer;
 bool gFailed = false;
 
 void quietLog(int, const char*, ...) {}
-
-double median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    return v.empty() ? 0.0 : v[v.size() / 2];
-}
 
 std::vector<std::vector<unsigned char>> makeFrames() {
     std::vector<std::vector<unsigned char>> frames;
@@ -57,68 +50,6 @@ std::vector<std::vector<unsigned char>> makeFrames() {
     return frames;
 }
 
-kivhost::VideoEncoderSettings settings() {
-    kivhost::VideoEncoderSettings s;
-    s.width = kWidth;
-    s.height = kHeight;
-    s.backlog = kFrames;
-    return s;
-}
-
-// Seconds for ours, and the encoder's own conversion and encoding time a frame.
-bool runOurs(const std::vector<std::vector<unsigned char>>& frames, const std::string& path,
-             double* seconds, double* cost) {
-    const auto start = std::chrono::steady_clock::now();
-    auto encoder = kivhost::VideoEncoder::open(path, settings());
-    if (encoder == nullptr) return false;
-    android::sp<android::Surface> surface = new android::Surface(encoder->getProducer());
-    ANativeWindow* window = surface.get();
-    native_window_api_connect(window, NATIVE_WINDOW_API_CPU);
-    native_window_set_usage(window, android::GraphicBuffer::USAGE_SW_WRITE_OFTEN);
-    for (int i = 0; i < kFrames; ++i) {
-        ANativeWindowBuffer* native = nullptr;
-        int fence = -1;
-        if (window->dequeueBuffer(window, &native, &fence) != 0) return false;
-        android::GraphicBuffer* buffer = android::GraphicBuffer::from(native);
-        void* pixels = nullptr;
-        if (buffer->getStride() != (uint32_t)kWidth ||
-            buffer->lock(android::GraphicBuffer::USAGE_SW_WRITE_OFTEN, &pixels) != 0) {
-            return false;
-        }
-        const std::vector<unsigned char>& frame = frames[i % frames.size()];
-        std::copy(frame.begin(), frame.end(), static_cast<unsigned char*>(pixels));
-        buffer->unlock();
-        native_window_set_buffers_timestamp(window, (int64_t)i * 1000000000LL / 24);
-        if (window->queueBuffer(window, native, -1) != 0) return false;
-    }
-    if (encoder->close() != 0) return false;
-    *seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-    const kivhost::VideoEncoderStats stats = encoder->stats();
-    *cost = (stats.convertNanos + stats.encodeNanos) / 1e9 / kFrames;
-    return stats.encoded == (uint64_t)kFrames && stats.dropped == 0;
-}
-
-bool runPeer(const std::vector<std::vector<unsigned char>>& frames, const std::string& path,
-             double* seconds) {
-    const kivhost::VideoEncoderSettings s = settings();
-    char command[512];
-    snprintf(command, sizeof(command),
-             "ffmpeg -v error -y -f rawvideo -pix_fmt rgba -s %dx%d -r 24 -i - -c:v libx264 "
-             "-preset %s -crf %d -threads %d -pix_fmt yuv420p %s",
-             kWidth, kHeight, s.preset.c_str(), s.crf, s.threads, path.c_str());
-    const auto start = std::chrono::steady_clock::now();
-    FILE* pipe = popen(command, "w");
-    if (pipe == nullptr) return false;
-    bool ok = true;
-    for (int i = 0; i < kFrames && ok; ++i) {
-        const std::vector<unsigned char>& frame = frames[i % frames.size()];
-        ok = fwrite(frame.data(), 1, frame.size(), pipe) == frame.size();
-    }
-    ok = pclose(pipe) == 0 && ok;
-    *seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-    return ok;
-}
-
 void BM_VideoEncoder_Interleaved(benchmark::State& state) {
     const std::vector<std::vector<unsigned char>> frames = makeFrames();
     char folder[] = "/tmp/kiv_bench_XXXXXX";
@@ -129,15 +60,15 @@ void BM_VideoEncoder_Interleaved(benchmark::State& state) {
     const std::string ours = std::string(folder) + "/ours.mp4";
     const std::string peer = std::string(folder) + "/peer.mp4";
     for (auto _ : state) {
-        double oursSeconds = 0, peerSeconds = 0, cost = 0;
-        if (!runOurs(frames, ours, &oursSeconds, &cost) || !runPeer(frames, peer, &peerSeconds)) {
+        double oursMs = 0, peerMs = 0;
+        if (!EncoderBench_ours(frames, kWidth, kHeight, kFrames, ours, &oursMs) ||
+            !EncoderBench_ffmpeg(frames, kWidth, kHeight, kFrames, peer, &peerMs)) {
             gFailed = true;
             state.SkipWithError("a side failed (or ours dropped frames)");
             break;
         }
-        gOurs.push_back(oursSeconds / kFrames);
-        gPeer.push_back(peerSeconds / kFrames);
-        gOursCost.push_back(cost);
+        gOurs.push_back(oursMs);
+        gPeer.push_back(peerMs);
     }
     unlink(ours.c_str());
     unlink(peer.c_str());
@@ -163,15 +94,15 @@ int main(int argc, char** argv) {
     }
     auto range = [](std::vector<double> v) {
         std::sort(v.begin(), v.end());
-        return std::make_pair(v.front() * 1e3, v.back() * 1e3);
+        return std::make_pair(v.front(), v.back());
     };
     const auto o = range(gOurs), p = range(gPeer);
     printf(
-        "video_encoder %dx%d, %d frames a run: ours %.2f ms/frame (%.2f-%.2f; conversion and "
-        "encoding alone %.2f), ffmpeg -c:v libx264 %.2f ms/frame (%.2f-%.2f), median of %zu\n",
-        kWidth, kHeight, kFrames, median(gOurs) * 1e3, o.first, o.second, median(gOursCost) * 1e3,
-        median(gPeer) * 1e3, p.first, p.second, gOurs.size());
+        "video_encoder %dx%d, %d frames a run: ours %.2f ms/frame (%.2f-%.2f), ffmpeg -c:v "
+        "libx264 %.2f ms/frame (%.2f-%.2f), median of %zu\n",
+        kWidth, kHeight, kFrames, EncoderBench_median(gOurs), o.first, o.second,
+        EncoderBench_median(gPeer), p.first, p.second, gOurs.size());
     printf("ratio video_encoder ours/ffmpeg = %.2f (target <= 1.1)\n",
-           median(gOurs) / median(gPeer));
+           EncoderBench_median(gOurs) / EncoderBench_median(gPeer));
     return 0;
 }

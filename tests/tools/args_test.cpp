@@ -9,6 +9,7 @@
 
 #include "args.h"
 #include "cli_log.h"
+#include "live_stats.h"
 #include "progress.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_log.h"
@@ -138,6 +139,25 @@ TEST(CliLog, CountsErrorReportsOnly) {
     VF_LogMsg(VF_LOG_DEBUG, "VC_ERROR_UNKNOWN (-1): %s:%d", "x", 1);
     __android_log_print(ANDROID_LOG_WARN, "KivImaging::EGL", "VC_ERROR_UNKNOWN (-1): x:1");
     EXPECT_EQ(before + 2, cliLogErrorCount());
+}
+
+TEST(LiveStats, IntervalsOfFramesThatFollowEachOtherAndTheSummaryLine) {
+    LiveStats stats(2);
+    // Frames 1-2 start no interval; 4 follows a frame the window dropped.
+    const struct {
+        uint64_t number;
+        int64_t ms;
+    } frames[] = {{1, 0}, {2, 1}, {3, 42}, {4, 83}, {6, 200}, {7, 240}, {8, 290}};
+    for (const auto& f : frames) stats.add(f.number, f.ms * 1000000);
+    EXPECT_EQ(stats.frames(), 7u);
+    EXPECT_DOUBLE_EQ(stats.percentile(50), 41.0);  // of 41, 40, 41, 50
+    EXPECT_DOUBLE_EQ(stats.percentile(99), 50.0);
+    EXPECT_DOUBLE_EQ(LiveStats(0).percentile(50), 0.0);
+    EXPECT_EQ(liveSummary(240, 3, 41.04, 43.96, 237, "out.mp4"),
+              "frames: 240 rendered, 3 dropped; interval p50 41.0 ms, p99 44.0 ms; recorded 237 "
+              "frames to out.mp4");
+    EXPECT_EQ(liveSummary(5, 0, 0, 0, 0, ""),
+              "frames: 5 rendered, 0 dropped; interval p50 0.0 ms, p99 0.0 ms");
 }
 
 }  // namespace

@@ -20,6 +20,8 @@ const char kUsage[] =
     "  apply     apply one effect to JPEG or PNG files\n"
     "  gallery   render one picture through every effect into a labelled contact sheet\n"
     "  sample    write the built-in test picture\n"
+    "  live      run the live pipeline: a virtual camera through an effect, with\n"
+    "            preview, recording, pictures and snapshots\n"
     "  help      show this text, or 'help <command>' for a command's options\n"
     "\n"
     "Every command takes --help and -v/--verbose (the library's log on standard error).\n"
@@ -38,6 +40,7 @@ const CommandEntry kCommands[] = {
     {"apply", cmdApply},
     {"gallery", cmdGallery},
     {"sample", cmdSample},
+    {"live", cmdLive},
 };
 
 const CommandEntry* findCommand(const char* name) {

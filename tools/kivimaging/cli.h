@@ -16,6 +16,7 @@ int cmdEffects(int argc, char** argv);
 int cmdApply(int argc, char** argv);
 int cmdGallery(int argc, char** argv);
 int cmdSample(int argc, char** argv);
+int cmdLive(int argc, char** argv);
 
 // "kivimaging <command>: <message>" and a pointer to --help on standard error;
 // returns kExitUsage.

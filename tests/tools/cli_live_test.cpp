@@ -1,0 +1,127 @@
+// 'kivimaging live' end to end: a video file made here plays through an
+// effect into a recording (read back with FFmpeg and compared with the
+// effect on the CPU), the generator feeds preview pictures, a picture and a
+// snapshot; bad arguments are refused with their messages.
+#include <dirent.h>
+
+#include <regex>
+
+#include "cli_fixture.h"
+#include "support/camera_frames.h"
+#include "support/look_reference.h"
+#include "support/video_files.h"
+
+namespace {
+
+const int kW = 160, kH = 96;
+const int kSepia = 401;
+
+class CliLiveTest : public CliTest {};
+
+TEST_F(CliLiveTest, AVideoFilePlaysThroughTheEffectIntoARecording) {
+    const int kClipFrames = 30;
+    ASSERT_TRUE(VideoFiles_writeGenerated(path("clip.mkv"), kW, kH, kClipFrames, 24));
+    const CliResult r = run({"live", "--camera", path("clip.mkv"), "--size", "160x96", "-e",
+                             "Sepia", "--frames", "1000", "--record", path("rec.mp4")});
+    ASSERT_EQ(r.status, 0) << r.err;
+    std::smatch m;
+    ASSERT_TRUE(std::regex_search(
+        r.out, m,
+        std::regex("^frames: (\\d+) rendered, (\\d+) dropped; interval p50 ([0-9.]+) ms, p99 "
+                   "([0-9.]+) ms; recorded (\\d+) frames to (.*)\n$")))
+        << r.out;
+    EXPECT_GE(std::stoi(m[1]), kClipFrames / 2);
+    EXPECT_GT(std::stod(m[3]), 0.0);
+    EXPECT_EQ(m[6].str(), path("rec.mp4"));
+    DecodedVideo video;
+    ASSERT_TRUE(VideoFiles_decode(path("rec.mp4"), &video));
+    EXPECT_EQ(video.codec, "h264");
+    EXPECT_EQ(video.width, kW);
+    EXPECT_EQ(video.height, kH);
+    ASSERT_EQ(video.rgba.size(), (size_t)std::stoi(m[5]));
+    ASSERT_GE(video.rgba.size(), 5u);
+    // Each recorded frame is Sepia over one of the clip's frames, later
+    // frames over later ones (4:2:0 and libx264 within 28 dB PSNR).
+    int last = -1;
+    for (size_t i = 0; i < video.rgba.size(); i += 4) {
+        int best = -1;
+        double bestPsnr = 0;
+        for (int k = 0; k < kClipFrames; ++k) {
+            const lookref::Picture camera(kW, kH, CameraFrames_rgba(k, kW, kH));
+            const double psnr =
+                VideoFiles_psnr(video.rgba[i], lookref::render(kSepia, camera, nullptr), 4);
+            if (psnr > bestPsnr) {
+                bestPsnr = psnr;
+                best = k;
+            }
+        }
+        EXPECT_GE(bestPsnr, 28.0) << "recorded frame " << i;
+        EXPECT_GE(best, last) << "recorded frame " << i;
+        last = best;
+    }
+}
+
+TEST_F(CliLiveTest, PreviewPicturesAPictureAndASnapshot) {
+    const CliResult r = run({"live", "--size", "96x64", "--frames", "20", "--preview",
+                             path("frames"), "--picture-at", "13", "-o", path("pic.jpg"),
+                             "--snapshot-at", "15", "-o", path("snap.png"), "--switch-every", "6"});
+    ASSERT_EQ(r.status, 0) << r.err;
+    EXPECT_TRUE(
+        std::regex_search(r.out, std::regex("^frames: \\d+ rendered, \\d+ dropped; interval "
+                                            "p50 [0-9.]+ ms, p99 [0-9.]+ ms\n$")))
+        << r.out;
+    int pngs = 0;
+    if (DIR* d = opendir(path("frames").c_str())) {
+        while (dirent* e = readdir(d)) pngs += strstr(e->d_name, ".png") != nullptr ? 1 : 0;
+        closedir(d);
+    }
+    EXPECT_GE(pngs, 1);
+    EXPECT_TRUE(exists("frames/frame_00001.png"));
+    for (const char* name : {"pic.jpg", "snap.png", "frames/frame_00001.png"}) {
+        ImagePtr picture = load(path(name));
+        ASSERT_NE(picture, nullptr) << name;
+        EXPECT_EQ(picture->width, 96) << name;
+        EXPECT_EQ(picture->height, 64) << name;
+    }
+    // The picture and the preview frames hold the camera's bars.
+    for (const char* name : {"pic.jpg", "frames/frame_00001.png"}) {
+        ImagePtr picture = load(path(name));
+        ASSERT_NE(picture, nullptr) << name;
+        bool lit = false;
+        for (uint32_t i = 0; i < VCImage_size(picture.get()) && !lit; ++i) {
+            lit = picture->data[i] > 16;
+        }
+        EXPECT_TRUE(lit) << name << " is black";
+    }
+}
+
+TEST_F(CliLiveTest, RefusedArguments) {
+    const struct {
+        std::vector<std::string> args;
+        int status;
+        const char* message;
+    } cases[] = {
+        {{"--size", "15x10"}, 2, "--size must be WxH, even sides from 16 to 4096"},
+        {{"--fps", "0"}, 2, "--fps must be a number from 1 to 120"},
+        {{"--frames", "5", "--seconds", "1"}, 2, "give --frames or --seconds, not both"},
+        {{"--record", "out.avi"}, 2, "--record must name an .mp4 file"},
+        {{"--record-interval", "100"}, 2, "--record-interval needs --record"},
+        {{"-o", "x.png"}, 2, "-o names the file of --picture-at or --snapshot-at, given before it"},
+        {{"--picture-at", "3"}, 2, "--picture-at needs -o FILE after it"},
+        {{"--snapshot-at", "3", "-o", "x.bmp"}, 2, "'x.bmp' must end in .png, .jpg or .jpeg"},
+        {{"-e", "NoSuchEffect"}, 2, "NoSuchEffect"},
+        {{"--camera", "/nonexistent/clip.mkv"},
+         1,
+         "kivimaging: cannot play '/nonexistent/clip.mkv' as a video"},
+    };
+    for (const auto& c : cases) {
+        std::vector<std::string> args = {"live"};
+        args.insert(args.end(), c.args.begin(), c.args.end());
+        const CliResult r = run(args);
+        EXPECT_EQ(r.status, c.status) << c.message;
+        EXPECT_NE(r.err.find(c.message), std::string::npos) << r.err;
+        EXPECT_EQ(r.out, "") << c.message;
+    }
+}
+
+}  // namespace
