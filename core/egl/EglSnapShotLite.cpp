@@ -59,7 +59,10 @@ int EglSnapShotLite::draw(sp<EglProgram>& program, bool finish) {
     {
         VFTraceSection trace("KI-SNAPSHOT_DRAW");
         mTarget->flushCache();
-        status = program->onDrawFrame();
+        // The flush leaves the default framebuffer bound: the draw must go
+        // to the target.
+        status = mTarget->bindFrameBuffer();
+        if (status == 0) status = program->onDrawFrame();
         if (status == 0 && finish) status = eglFlush();
     }
     mTarget->unbindFrameBuffer();

@@ -35,40 +35,23 @@ namespace {
 
 const int kW = 64, kH = 48;
 
-struct Effect {
-    explicit Effect(int id) : imaging(KivImaging_create(id, nullptr)) {}
-    ~Effect() { KivImaging_destroy(imaging.getFilter()); }
-    KivImaging imaging;
-};
-
 int64_t frameNumber(const std::vector<uint8_t>& rgba) {
-    return rgba.empty() ? -1 : kivhost::VirtualCamera_decodeFrameNumber(rgba.data(), kW, kH, false);
+    return LivePreview_frameNumber(rgba, kW, kH);
 }
 
 // Each test owns the clock (installed before the render thread starts) and
 // the log capture.
 class ManagerTest : public ::testing::Test {
 public:
-    // Starts and waits until the render thread paces for the first time:
-    // the first ten frames after the initialising one are not paced.
     void start(LivePreview& live, bool firstFrame = true) {
-        ASSERT_TRUE(live.start(firstFrame));
         if (firstFrame) {
-            ASSERT_TRUE(clock.waitForWaitsBegun(1));
-            ASSERT_EQ(live.framesShown(), 11u);
+            ASSERT_TRUE(live.startPaced(clock));
+        } else {
+            ASSERT_TRUE(live.start(false));
         }
     }
-    // One frame period: the cameras queue a frame (unless not), the clock
-    // moves `ms`, and the render thread goes round once more.
     void step(LivePreview& live, int ms = 41, bool frame = true) {
-        const size_t waits = clock.waitsBegun();
-        for (auto& c : live.camera) {
-            if (c && frame) {
-                ASSERT_EQ(c->queueFrame(), 0) << "camera frame not queued";
-            }
-        }
-        clock.advanceMs(ms);
-        ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
+        ASSERT_TRUE(live.step(clock, ms, frame));
     }
     // The render thread has stopped by itself.
     void expectStopped() { ASSERT_TRUE(logged("In RenderThread::destroy")); }
@@ -85,7 +68,7 @@ public:
 class EffectTest : public ManagerTest, public ::testing::WithParamInterface<std::pair<int, int>> {};
 
 TEST_P(EffectTest, EachShownFrameIsTheEffectOverTheLatchedFrame) {
-    Effect first(GetParam().first), second(GetParam().second);
+    LivePreviewEffect first(GetParam().first), second(GetParam().second);
     LivePreview live;
     live.manager->setFilter(&first.imaging);
     ASSERT_NO_FATAL_FAILURE(start(live));
@@ -322,7 +305,7 @@ INSTANTIATE_TEST_SUITE_P(
         LogCase{"session",
                 {},
                 [](LivePreview& live, ManagerTest& t) {
-                    Effect sepia(401);
+                    LivePreviewEffect sepia(401);
                     live.manager->setFilter(&sepia.imaging);
                     ASSERT_NO_FATAL_FAILURE(t.start(live));
                     live.manager->setSaveAsFlipped(true);

@@ -16,6 +16,7 @@ namespace {
 
 std::atomic<int> gProgramFaults{0};
 std::atomic<int> gReadFaults{0};
+std::atomic<int> gReadsBeforeFaults{0};
 std::atomic<int> gDrawFaults{0};
 std::atomic<int> gMakeCurrentFaults{0};
 
@@ -43,7 +44,8 @@ void GlFault_failProgramCreations(int count) {
     gProgramFaults = count;
 }
 
-void GlFault_failPictureReads(int count) {
+void GlFault_failPictureReads(int count, int after) {
+    gReadsBeforeFaults = after;
     gReadFaults = count;
     // Host buffers that share their storage with the GPU have no read-back
     // to fail: while armed, new ones copy through GL.
@@ -81,7 +83,8 @@ extern "C" void glReadPixels(GLint x, GLint y, GLsizei width, GLsizei height, GL
                              GLenum type, void* pixels) {
     static const auto next =
         driver<void (*)(GLint, GLint, GLsizei, GLsizei, GLenum, GLenum, void*)>("glReadPixels");
-    if ((long)width * height > 1 && takeFault(gReadFaults)) width = -1;
+    if ((long)width * height > 1 && !takeFault(gReadsBeforeFaults) && takeFault(gReadFaults))
+        width = -1;
     next(x, y, width, height, format, type, pixels);
 }
 

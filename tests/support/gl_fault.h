@@ -16,7 +16,8 @@
 #define KIV_TESTS_GL_FAULT_H
 
 void GlFault_failProgramCreations(int count);
-void GlFault_failPictureReads(int count);
+// The first `after` picture reads from now on pass, the next `count` fail.
+void GlFault_failPictureReads(int count, int after = 0);
 void GlFault_skipDraws(int count);
 // eglMakeCurrent of a context on a surface fails (EGL_BAD_SURFACE), as when
 // a window has gone; unbinding (no context) is passed on.

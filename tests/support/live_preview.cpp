@@ -30,7 +30,9 @@ bool LivePreview::start(bool firstFrame) {
     for (int i = 0; i < 2 && camera[i]; ++i) {
         sp<ANativeWindow> window = manager->getNewPreviewWindowForOpenGL(i);
         if (window == nullptr || camera[i]->connect(window) != 0) return false;
-        if (firstFrame && camera[i]->queueFrame() != 0) return false;
+        for (int n = 0; firstFrame && n < setup.firstFrames[i]; ++n) {
+            if (camera[i]->queueFrame() != 0) return false;
+        }
     }
     manager->notifyGLSurfaceConnectionComplete();
     return true;
@@ -58,6 +60,26 @@ std::vector<uint8_t> LivePreview::latestFrame() {
     return rgba;
 }
 
+::testing::AssertionResult LivePreview::startPaced(ManualClock& clock) {
+    if (!start()) return ::testing::AssertionFailure() << "the pipeline did not start";
+    if (!clock.waitForWaitsBegun(1)) return ::testing::AssertionFailure() << "never paced";
+    if (framesShown() != 11u)
+        return ::testing::AssertionFailure() << framesShown() << " frames before pacing, not 11";
+    return ::testing::AssertionSuccess();
+}
+
+::testing::AssertionResult LivePreview::step(ManualClock& clock, int ms, bool frame) {
+    const size_t waits = clock.waitsBegun();
+    for (int i = 0; i < 2 && frame; ++i) {
+        if (camera[i] && camera[i]->queueFrame() != 0)
+            return ::testing::AssertionFailure() << "camera " << i << " frame not queued";
+    }
+    clock.advanceMs(ms);
+    if (!clock.waitForWaitsBegun(waits + 1))
+        return ::testing::AssertionFailure() << "the render thread did not come round";
+    return ::testing::AssertionSuccess();
+}
+
 void LivePreview::release() {
     if (mReleased) return;
     mReleased = true;
@@ -83,4 +105,9 @@ std::vector<uint8_t> LivePreview_mirror(const std::vector<uint8_t>& rgba, int wi
         }
     }
     return out;
+}
+
+int64_t LivePreview_frameNumber(const std::vector<uint8_t>& rgba, int width, int height) {
+    if (rgba.size() != (size_t)width * height * 4) return -1;
+    return kivhost::VirtualCamera_decodeFrameNumber(rgba.data(), width, height, false);
 }

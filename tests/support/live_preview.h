@@ -4,6 +4,7 @@
 #ifndef KIV_TESTS_SUPPORT_LIVE_PREVIEW_H
 #define KIV_TESTS_SUPPORT_LIVE_PREVIEW_H
 
+#include <gtest/gtest.h>
 #include <gui/HostWindow.h>
 #include <utils/StrongPointer.h>
 
@@ -12,7 +13,9 @@
 #include <vector>
 
 #include "kivhost/VirtualCamera.h"
+#include "core/KivImaging.h"
 #include "kivimaging/OpenGLManager.h"
+#include "support/manual_clock.h"
 
 struct LivePreviewSetup {
     int width = 64;
@@ -21,6 +24,8 @@ struct LivePreviewSetup {
     OpenGLManagerMode mode = OPENGL_MANAGER_DIRECT;
     DisplayDeviceMode display = DISPLAY_DEVICE_GPU;
     bool previewWindow = true;
+    // Frames each camera queues before the render thread may draw.
+    int firstFrames[2] = {1, 1};
 };
 
 class LivePreview {
@@ -30,7 +35,7 @@ public:
     ~LivePreview();
 
     // Starts the render thread and connects the cameras; with `firstFrame`
-    // each camera queues its frame 0 before the thread may draw.
+    // each camera queues its first frames before the thread may draw.
     bool start(bool firstFrame = true);
     // The newest frame the preview window holds, RGBA top row first (older
     // ones are dropped); empty when none is queued.
@@ -38,6 +43,14 @@ public:
     // Frames the manager has swapped into the preview window.
     uint64_t framesShown() { return mPreview->queuedTotal(); }
     void release();
+
+    // On a manual clock (installed before start): starts and waits until
+    // the render thread paces for the first time, after the initialising
+    // frame and ten unpaced ones, each shown.
+    ::testing::AssertionResult startPaced(ManualClock& clock);
+    // One frame period: the cameras queue a frame (unless not), the clock
+    // moves `ms`, and the render thread goes round its loop once more.
+    ::testing::AssertionResult step(ManualClock& clock, int ms = 41, bool frame = true);
 
     const LivePreviewSetup setup;
     android::sp<OpenGLManager> manager;
@@ -48,6 +61,18 @@ private:
     android::sp<android::HostWindow>& mPreview = preview;
     bool mReleased = false;
 };
+
+// An effect made by id through the C API, destroyed with the handle; its
+// KivImaging is what setFilter() takes.
+struct LivePreviewEffect {
+    explicit LivePreviewEffect(int id) : imaging(KivImaging_create(id, nullptr)) {}
+    ~LivePreviewEffect() { KivImaging_destroy(imaging.getFilter()); }
+    KivImaging imaging;
+};
+
+// The generator's frame number in a shown RGBA frame (top row first); -1
+// when there is none.
+int64_t LivePreview_frameNumber(const std::vector<uint8_t>& rgba, int width, int height);
 
 // An RGBA picture upside down (rows swapped).
 std::vector<uint8_t> LivePreview_flipRows(const std::vector<uint8_t>& rgba, int width, int height);
