@@ -14,6 +14,7 @@
 #include "kivimaging/OpenGLManager.h"
 #include "support/camera_frames.h"
 #include "support/eventually.h"
+#include "support/gl_fault.h"
 #include "support/live_preview.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
@@ -188,25 +189,50 @@ TEST_F(RecordingTest, AnIntervalFrameComesOnlyAfterMoreThanTheInterval) {
     live.release();
 }
 
-TEST_F(RecordingTest, AClosedEncoderEndsTheRecordingAndThePreviewGoesOn) {
+// A recording that fails ends, its GL side goes the frame after, the
+// preview goes on, and recording again into a new encoder works.
+enum Ending { ENCODER_CLOSED, MAKE_CURRENT_FAILED };
+
+class RecordingEndTest : public RecordingTest, public ::testing::WithParamInterface<Ending> {};
+
+TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
     LivePreview live;
     ASSERT_NO_FATAL_FAILURE(start(live));
-    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    // A size of its own, so that its surface is the one a fault can pick.
+    ASSERT_NO_FATAL_FAILURE(openEncoder(kW / 2, kH / 2));
     ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
     for (int i = 0; i < 4; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(encoder->close(), 0);
+    ASSERT_EQ(recorded(), 3u);
+    log.clear();
+    if (GetParam() == ENCODER_CLOSED) {
+        EXPECT_EQ(encoder->close(), 0);
+    } else {
+        GlFault_failMakeCurrents(1, kW / 2, kH / 2);
+    }
     const uint64_t shown = live.framesShown();
-    ASSERT_NO_FATAL_FAILURE(step(live));  // the consumer is found gone
-    ASSERT_NO_FATAL_FAILURE(step(live));  // the GL side goes
+    ASSERT_NO_FATAL_FAILURE(step(live));  // the recording ends
+    ASSERT_NO_FATAL_FAILURE(step(live));  // its GL side goes
     ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(log.count("EGL: The recording surface has most likely been deleted (NO_INIT). "
-                        "Stopping record."),
-              1u);
+    GlFault_failMakeCurrents(0);
+    if (GetParam() == ENCODER_CLOSED) {
+        EXPECT_TRUE(
+            log.matches({"W EGL: The recording surface has most likely been deleted "
+                         "(NO_INIT). Stopping record."}));
+    } else {
+        EXPECT_TRUE(log.matches({
+            "E EGL Error: 0x300d 'EGL_BAD_SURFACE' - result = eglMakeCurrent(display, "
+            "mEglSurface, mEglSurface, context) at core/egl/EglWindowSurface:#",
+            "E VC_ERROR_UNKNOWN (-1): core/egl/EglWindowSurface:#",
+            "E EGL: Call to eglMakeCurrent() failed [recording]",
+            "E EGL: It looks like the SurfaceTexture was abandonned. Stopping record.",
+        }));
+    }
+    EXPECT_EQ(recorded(), 3u);
     EXPECT_EQ(live.framesShown(), shown + 3);
     const std::vector<uint8_t> frame = live.latestFrame();
     ASSERT_FALSE(frame.empty());
     EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(frame.data(), kW, kH, false), 7);
-    // Recording again, into a new encoder, works.
+
     encoder.reset();
     ASSERT_NO_FATAL_FAILURE(openEncoder());
     ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
@@ -218,6 +244,9 @@ TEST_F(RecordingTest, AClosedEncoderEndsTheRecordingAndThePreviewGoesOn) {
     ASSERT_EQ(video.rgba.size(), 1u);
     EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[0].data(), kW, kH, false), 9);
 }
+
+INSTANTIATE_TEST_SUITE_P(Endings, RecordingEndTest,
+                         ::testing::Values(ENCODER_CLOSED, MAKE_CURRENT_FAILED));
 
 // Start and stop many times with the pipeline running: nothing leaks (the
 // sanitizer builds check) and each recording holds its own frames.

@@ -19,10 +19,21 @@ std::atomic<int> gReadFaults{0};
 std::atomic<int> gReadsBeforeFaults{0};
 std::atomic<int> gDrawFaults{0};
 std::atomic<int> gMakeCurrentFaults{0};
+std::atomic<int> gMakeCurrentWidth{0};
+std::atomic<int> gMakeCurrentHeight{0};
 
 std::mutex gBindsLock;
 std::vector<std::pair<EGLContext, GLuint>> gBinds;
 EGLContext gDrawingContext = EGL_NO_CONTEXT;
+
+// No size asked, or the surface's.
+bool sizeMatches(EGLDisplay display, EGLSurface surface) {
+    const int width = gMakeCurrentWidth.load(), height = gMakeCurrentHeight.load();
+    if (width == 0) return true;
+    EGLint w = 0, h = 0;
+    return eglQuerySurface(display, surface, EGL_WIDTH, &w) && w == width &&
+           eglQuerySurface(display, surface, EGL_HEIGHT, &h) && h == height;
+}
 
 // Takes one armed fault, if any is left.
 bool takeFault(std::atomic<int>& faults) {
@@ -56,7 +67,9 @@ void GlFault_skipDraws(int count) {
     gDrawFaults = count;
 }
 
-void GlFault_failMakeCurrents(int count) {
+void GlFault_failMakeCurrents(int count, int width, int height) {
+    gMakeCurrentWidth = width;
+    gMakeCurrentHeight = height;
     gMakeCurrentFaults = count;
 }
 
@@ -110,7 +123,8 @@ extern "C" EGLBoolean eglMakeCurrent(EGLDisplay display, EGLSurface draw, EGLSur
                                      EGLContext context) {
     static const auto next =
         driver<EGLBoolean (*)(EGLDisplay, EGLSurface, EGLSurface, EGLContext)>("eglMakeCurrent");
-    if (context != EGL_NO_CONTEXT && draw != EGL_NO_SURFACE && takeFault(gMakeCurrentFaults)) {
+    if (context != EGL_NO_CONTEXT && draw != EGL_NO_SURFACE && gMakeCurrentFaults.load() > 0 &&
+        sizeMatches(display, draw) && takeFault(gMakeCurrentFaults)) {
         // The error eglGetError() reports next, as the driver would set it.
         static const auto bad =
             driver<EGLBoolean (*)(EGLDisplay, EGLSurface, EGLSurface, EGLContext)>(

@@ -20,8 +20,9 @@ void GlFault_failProgramCreations(int count);
 void GlFault_failPictureReads(int count, int after = 0);
 void GlFault_skipDraws(int count);
 // eglMakeCurrent of a context on a surface fails (EGL_BAD_SURFACE), as when
-// a window has gone; unbinding (no context) is passed on.
-void GlFault_failMakeCurrents(int count);
+// a window has gone; unbinding (no context) is passed on. With a size, only
+// calls onto surfaces of that size fail (to reach one surface of several).
+void GlFault_failMakeCurrents(int count, int width = 0, int height = 0);
 
 // Binds of a framebuffer other than 0, since the last reset, by the context
 // that made the last draw call (whether or not the draw was skipped).
