@@ -21,6 +21,7 @@ std::atomic<int> gDrawFaults{0};
 std::atomic<int> gMakeCurrentFaults{0};
 std::atomic<int> gMakeCurrentWidth{0};
 std::atomic<int> gMakeCurrentHeight{0};
+std::atomic<long> gObjectBalance{0};
 
 std::mutex gBindsLock;
 std::vector<std::pair<EGLContext, GLuint>> gBinds;
@@ -73,6 +74,10 @@ void GlFault_failMakeCurrents(int count, int width, int height) {
     gMakeCurrentFaults = count;
 }
 
+long GlFault_objectBalance() {
+    return gObjectBalance.load();
+}
+
 void GlFault_resetBinds() {
     std::lock_guard<std::mutex> guard(gBindsLock);
     gBinds.clear();
@@ -89,7 +94,9 @@ int GlFault_bindsOfDrawingContext() {
 extern "C" GLuint glCreateProgram() {
     static const auto next = driver<GLuint (*)()>("glCreateProgram");
     if (takeFault(gProgramFaults)) return 0;
-    return next();
+    const GLuint program = next();
+    gObjectBalance += program != 0;
+    return program;
 }
 
 extern "C" void glReadPixels(GLint x, GLint y, GLsizei width, GLsizei height, GLenum format,
@@ -133,4 +140,46 @@ extern "C" EGLBoolean eglMakeCurrent(EGLDisplay display, EGLSurface draw, EGLSur
         return EGL_FALSE;
     }
     return next(display, draw, read, context);
+}
+
+// Object counts: names made, and non-zero names deleted.
+namespace {
+void countDeleted(GLsizei n, const GLuint* names) {
+    for (GLsizei i = 0; i < n && names != nullptr; ++i) gObjectBalance -= names[i] != 0;
+}
+}  // namespace
+
+#define KIV_COUNT_GEN(gen, del)                                                              \
+    extern "C" void gen(GLsizei n, GLuint* names) {                                          \
+        static const auto next = driver<void (*)(GLsizei, GLuint*)>(#gen);                   \
+        next(n, names);                                                                      \
+        for (GLsizei i = 0; i < n && names != nullptr; ++i) gObjectBalance += names[i] != 0; \
+    }                                                                                        \
+    extern "C" void del(GLsizei n, const GLuint* names) {                                    \
+        static const auto next = driver<void (*)(GLsizei, const GLuint*)>(#del);             \
+        countDeleted(n, names);                                                              \
+        next(n, names);                                                                      \
+    }
+KIV_COUNT_GEN(glGenTextures, glDeleteTextures)
+KIV_COUNT_GEN(glGenFramebuffers, glDeleteFramebuffers)
+KIV_COUNT_GEN(glGenRenderbuffers, glDeleteRenderbuffers)
+KIV_COUNT_GEN(glGenBuffers, glDeleteBuffers)
+
+extern "C" void glDeleteProgram(GLuint program) {
+    static const auto next = driver<void (*)(GLuint)>("glDeleteProgram");
+    gObjectBalance -= program != 0;
+    next(program);
+}
+
+extern "C" GLuint glCreateShader(GLenum type) {
+    static const auto next = driver<GLuint (*)(GLenum)>("glCreateShader");
+    const GLuint shader = next(type);
+    gObjectBalance += shader != 0;
+    return shader;
+}
+
+extern "C" void glDeleteShader(GLuint shader) {
+    static const auto next = driver<void (*)(GLuint)>("glDeleteShader");
+    gObjectBalance -= shader != 0;
+    next(shader);
 }

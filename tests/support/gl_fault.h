@@ -24,6 +24,12 @@ void GlFault_skipDraws(int count);
 // calls onto surfaces of that size fail (to reach one surface of several).
 void GlFault_failMakeCurrents(int count, int width = 0, int height = 0);
 
+// GL objects (textures, framebuffers, renderbuffers, buffers, programs,
+// shaders) made minus those deleted, by every context of the process since
+// it started: a count that grows over repeated work means objects that
+// died with their context, or live on, undeleted.
+long GlFault_objectBalance();
+
 // Binds of a framebuffer other than 0, since the last reset, by the context
 // that made the last draw call (whether or not the draw was skipped).
 void GlFault_resetBinds();
