@@ -22,6 +22,7 @@
 #include <vector>
 
 #include "bench_common.h"
+#include "bench_gl.h"
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglProgram.h"
@@ -58,26 +59,8 @@ GLuint makeTarget(GLuint* texture) {
 class Bare {
 public:
     bool open() {
-        auto shader = [](GLenum type, const char* text) {
-            std::string adapted;
-            text = EglNativeSeam::get().shaderText(type, text, &adapted);
-            GLuint s = glCreateShader(type);
-            glShaderSource(s, 1, &text, nullptr);
-            glCompileShader(s);
-            return s;
-        };
-        mProgram = glCreateProgram();
-        GLuint vs = shader(GL_VERTEX_SHADER, EglShader::kVertexShader);
-        GLuint fs = shader(GL_FRAGMENT_SHADER, EglProgram::kDefaultFragmentShader2D);
-        glAttachShader(mProgram, vs);
-        glAttachShader(mProgram, fs);
-        glBindAttribLocation(mProgram, 0, "a_position");
-        glBindAttribLocation(mProgram, 1, "a_texcoord");
-        glLinkProgram(mProgram);
-        glDeleteShader(vs);
-        glDeleteShader(fs);
-        GLint linked = 0;
-        glGetProgramiv(mProgram, GL_LINK_STATUS, &linked);
+        mProgram = quadProgram(EglProgram::kDefaultFragmentShader2D);
+        const bool linked = mProgram != 0;
         glGenTextures(1, &mSource);
         glBindTexture(GL_TEXTURE_2D, mSource);
         glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
@@ -105,7 +88,6 @@ public:
         const bool converted = VCImage_convert(in, out) == 0;
         VCImage_destroy(in);
         VCImage_destroy(out);
-        static const GLfloat quad[] = {-1, -1, 0, 1, -1, 0, -1, 1, 0, 1, 1, 0};
         static const GLfloat uv[] = {0, 0, 1, 0, 0, 1, 1, 1};
         glActiveTexture(GL_TEXTURE0);
         glBindTexture(GL_TEXTURE_2D, mSource);
@@ -113,14 +95,7 @@ public:
         glTexSubImage2D(GL_TEXTURE_2D, 0, 0, 0, kWidth, kHeight, GL_RGBA, GL_UNSIGNED_BYTE,
                         mRgba.data());
         glBindFramebuffer(GL_FRAMEBUFFER, mFramebuffer);
-        glViewport(0, 0, kWidth, kHeight);
-        glUseProgram(mProgram);
-        glUniform1i(glGetUniformLocation(mProgram, "texSampler"), 0);
-        glVertexAttribPointer(0, 3, GL_FLOAT, GL_FALSE, 0, quad);
-        glVertexAttribPointer(1, 2, GL_FLOAT, GL_FALSE, 0, uv);
-        glEnableVertexAttribArray(0);
-        glEnableVertexAttribArray(1);
-        glDrawArrays(GL_TRIANGLE_STRIP, 0, 4);
+        drawQuad(mProgram, kWidth, kHeight, uv);
         glFinish();
         return converted && glGetError() == GL_NO_ERROR;
     }
