@@ -35,31 +35,30 @@ const char kAbandoned[] = "EGL: It looks like the SurfaceTexture was abandonned.
 
 int OpenGLManager::setRecordingSurface(
     const android::sp<android::IGraphicBufferProducer>& producer) {
-    Mutex::Autolock lock(mLock);
-    EglLog(VF_LOG_DEBUG, "EGL: Called setRecordingSurface: %p", (void*)producer.get());
-    if (producer == nullptr) {
-        if (mRecording) {
-            EglLog(VF_LOG_DEBUG,
-                   "EGL: Stopping recording now. Releasing recording surface and stuff.");
-            mRecording = false;
-            // The render thread lets the GL side go on its next frame.
-            mLock.unlock();
-            requestRender();
-            mLock.lock();
+    {
+        Mutex::Autolock lock(mLock);
+        EglLog(VF_LOG_DEBUG, "EGL: Called setRecordingSurface: %p", (void*)producer.get());
+        if (producer != nullptr) {
+            if (mPreviewWindow == nullptr || mProgram == nullptr) {
+                EglLog(VF_LOG_ERROR,
+                       "EGL: Can't start recording now: preview window is %p and program is %p",
+                       (void*)mPreviewWindow.get(), (void*)mProgram.get());
+                return VC_REPORT(VC_ERROR_INVALID_STATE);
+            }
+            // A window of the last recording that the render thread has not
+            // let go of yet goes now; its surface keeps the native window.
+            if (mRecordingWindow != nullptr) mRecordingWindow->release();
+            mRecordingWindow = new EglWindow(producer, mRecordingWidth, mRecordingHeight);
+            mRecording = true;
+            return 0;
         }
-        return 0;
+        if (!mRecording) return 0;
+        EglLog(VF_LOG_DEBUG, "EGL: Stopping recording now. Releasing recording surface and stuff.");
+        mRecording = false;
     }
-    if (mPreviewWindow == nullptr || mProgram == nullptr) {
-        EglLog(VF_LOG_ERROR,
-               "EGL: Can't start recording now: preview window is %p and program is %p",
-               (void*)mPreviewWindow.get(), (void*)mProgram.get());
-        return VC_REPORT(VC_ERROR_INVALID_STATE);
-    }
-    // A window of the last recording that the render thread has not let go
-    // of yet goes now; its surface keeps the native window it needs.
-    if (mRecordingWindow != nullptr) mRecordingWindow->release();
-    mRecordingWindow = new EglWindow(producer, mRecordingWidth, mRecordingHeight);
-    mRecording = true;
+    // Outside the lock (the wake-up takes it): the render thread lets the GL
+    // side go on the frame this asks for.
+    requestRender();
     return 0;
 }
 
@@ -81,32 +80,25 @@ void OpenGLManager::setRecordingMotion(int motion) {
 // Render thread, every frame after the picture step.
 int OpenGLManager::onDrawFrame_Recording() {
     VFTraceSection trace("KI-Recording");
-    sp<EglWindow> window;
-    bool windowReady = false;
     bool hasPreview = false;
     {
+        // One look under the lock: a client may stop or start again meanwhile.
         Mutex::Autolock lock(mLock);
-        window = mRecordingWindow;
-        windowReady = window != nullptr && window->getANativeWindow() != nullptr;
         hasPreview = mPreviewWindow != nullptr;
-    }
-    // A producer set again while recording: the surface in place belongs to
-    // the window before, so it goes before the new one is built.
-    const bool stale = mRecordingSurface != nullptr && !windowReady;
-    if ((!mRecording || stale) && mRecordingSurface != nullptr) {
-        VFTraceSection release("KI-releaseRecording");
-        sp<EglWindowSurface> surface;
-        {
-            Mutex::Autolock lock(mLock);
-            surface = mRecordingSurface;
+        // A producer set again while recording: the surface in place belongs
+        // to the window before, so it goes before the new one is built.
+        const bool stale = mRecordingSurface != nullptr && mRecordingWindow != nullptr &&
+                           mRecordingWindow->getANativeWindow() == nullptr;
+        if (mRecordingSurface != nullptr && (!mRecording || stale)) {
+            VFTraceSection release("KI-releaseRecording");
+            mRecordingSurface->release();
             mRecordingSurface.clear();
-            if (!stale && mRecordingWindow != nullptr) {
-                mRecordingWindow->release();
+            if (!mRecording) {
+                if (mRecordingWindow != nullptr) mRecordingWindow->release();
                 mRecordingWindow.clear();
+                return 0;
             }
         }
-        surface->release();
-        if (!stale) return 0;
     }
     if (!mRecording) return 0;
 
@@ -199,18 +191,18 @@ int OpenGLManager::initializeRecording() {
         EglLog(VF_LOG_ERROR, "EGL: Display is invalid (EGL_NO_DISPLAY)");
         return VC_ERROR_UNKNOWN;
     }
-    sp<EglWindow> window;
+    sp<ANativeWindow> native;
     {
+        // Under the lock: a client setting another producer releases this window.
         Mutex::Autolock lock(mLock);
-        window = mRecordingWindow;
-        if (window != nullptr && window->getANativeWindow() == nullptr &&
-            window->initialize() != 0) {
-            window.clear();
+        if (mRecordingWindow != nullptr && (mRecordingWindow->getANativeWindow() != nullptr ||
+                                            mRecordingWindow->initialize() == 0)) {
+            native = mRecordingWindow->getANativeWindow();
         }
     }
-    if (window == nullptr) return VC_ERROR_UNKNOWN;
-    sp<EglWindowSurface> surface = new EglWindowSurface(mEglEnv, window->getANativeWindow(),
-                                                        EglWindowSurface::SURFACE_RECORDING);
+    if (native == nullptr) return VC_ERROR_UNKNOWN;
+    sp<EglWindowSurface> surface =
+        new EglWindowSurface(mEglEnv, native, EglWindowSurface::SURFACE_RECORDING);
     if (surface->initialize() != 0 || surface->getEGLSurface() == EGL_NO_SURFACE) {
         if (surface->getEGLSurface() == EGL_NO_SURFACE) {
             EglLog(VF_LOG_ERROR, "EGL: Failed to create the window (but no EGL error was raised).");
@@ -229,8 +221,7 @@ int OpenGLManager::initializeRecording() {
         Mutex::Autolock lock(mLock);
         if (width != mRecordingWidth || height != mRecordingHeight) {
             EglLog(VF_LOG_DEBUG, "EGL: Updated window geometry %dx%d --> %dx%d [%p] (Recording)",
-                   mRecordingWidth, mRecordingHeight, width, height,
-                   (void*)window->getANativeWindow().get());
+                   mRecordingWidth, mRecordingHeight, width, height, (void*)native.get());
             mRecordingWidth = width;
             mRecordingHeight = height;
         }

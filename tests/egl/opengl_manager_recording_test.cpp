@@ -66,13 +66,16 @@ public:
         ASSERT_EQ(live.manager->setRecordingSurface(nullptr), 0);
         ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
     }
-    void openEncoder(int width = kW, int height = kH) {
+    std::unique_ptr<VideoEncoder> makeEncoder(int width, int height, const std::string& name) {
         kivhost::VideoEncoderSettings settings;
         settings.width = width;
         settings.height = height;
         settings.threads = 1;
         settings.backlog = 256;
-        encoder = VideoEncoder::open(dir.file("rec.mp4"), settings);
+        return VideoEncoder::open(dir.file(name), settings);
+    }
+    void openEncoder(int width = kW, int height = kH) {
+        encoder = makeEncoder(width, height, "rec.mp4");
         ASSERT_NE(encoder, nullptr);
     }
     // Frames the manager queued into the encoder.
@@ -187,6 +190,32 @@ TEST_F(RecordingTest, AnIntervalFrameComesOnlyAfterMoreThanTheInterval) {
     ASSERT_NO_FATAL_FAILURE(step(live));
     EXPECT_EQ(recorded(), 2u);
     live.release();
+}
+
+TEST_F(RecordingTest, ANewProducerWhileRecordingTakesOverOnTheNextFrame) {
+    LivePreview live;
+    ASSERT_NO_FATAL_FAILURE(start(live));
+    ASSERT_NO_FATAL_FAILURE(openEncoder());
+    std::unique_ptr<VideoEncoder> second = makeEncoder(kW, kH, "second.mp4");
+    ASSERT_NE(second, nullptr);
+    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_EQ(live.manager->setRecordingSurface(second->getProducer()), 0);
+    ASSERT_NO_FATAL_FAILURE(step(live));  // the first one's surface goes, the second's is built
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    ASSERT_NO_FATAL_FAILURE(step(live));
+    EXPECT_EQ(recorded(), 1u);
+    EXPECT_EQ(second->stats().queued, 2u);
+    live.release();
+    const DecodedVideo first = closeAndDecode();
+    ASSERT_EQ(first.rgba.size(), 1u);
+    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(first.rgba[0].data(), kW, kH, false), 2);
+    ASSERT_EQ(second->close(), 0);
+    DecodedVideo video;
+    ASSERT_TRUE(VideoFiles_decode(second->path(), &video));
+    ASSERT_EQ(video.rgba.size(), 2u);
+    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[0].data(), kW, kH, false), 4);
 }
 
 // A recording that fails ends, its GL side goes the frame after, the
