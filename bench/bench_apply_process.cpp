@@ -42,6 +42,8 @@ Run runChild(const std::vector<std::string>& args, const std::string& out) {
     for (const std::string& a : args) argv.push_back(const_cast<char*>(a.c_str()));
     argv.push_back(nullptr);
     Run run;
+    // The child's freopen would otherwise write our unflushed lines again.
+    fflush(stdout);
     auto start = std::chrono::steady_clock::now();
     pid_t pid = fork();
     if (pid == 0) {
