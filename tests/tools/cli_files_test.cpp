@@ -5,6 +5,7 @@
 #include <errno.h>
 #include <gtest/gtest.h>
 #include <string.h>
+#include <strings.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -215,24 +216,6 @@ TEST_F(CliFiles, JpegsAreTurnedUprightAsTheirExifSays) {
     }
 }
 
-TEST_F(CliFiles, OutputFormatFollowsTheLastExtension) {
-    ASSERT_EQ(0, mkdir(path("pics.jpg").c_str(), 0755));
-    struct Case {
-        const char* name;
-        const Bytes& magic;
-    } cases[] = {{"x.jpg.png", kPngMagic},
-                 {"pics.jpg/sheet.png", kPngMagic},
-                 {"y.png.jpg", kJpegMagic},
-                 {"z.PNG", kPngMagic},
-                 {"w.Jpeg", kJpegMagic}};
-    for (const Case& c : cases) {
-        CliResult r = run({"sample", "-o", path(c.name), "--size", "64x64"});
-        ASSERT_EQ(0, r.status) << c.name << ": " << r.err;
-        EXPECT_TRUE(startsWith(kivtest::readFile(path(c.name)), c.magic)) << c.name;
-        EXPECT_NE(nullptr, load(path(c.name))) << c.name;
-    }
-}
-
 // Half-transparent and nearly transparent pixels keep their colour as they
 // are, through an effect that passes pixels on.
 TEST_F(CliFiles, StraightAlphaIsKeptExactly) {
@@ -248,8 +231,11 @@ TEST_F(CliFiles, StraightAlphaIsKeptExactly) {
     EXPECT_EQ(picture, VCImageTest_bytes(*out));
 }
 
-TEST_F(CliFiles, OutputsReplaceWholeWithUsualPermissions) {
+// The format follows the last extension, in any case; the file replaces a
+// longer one whole, with the umask's permissions.
+TEST_F(CliFiles, OutputsReplaceWholeWithUsualPermissionsInTheirFormat) {
     std::string in = writePng("in.png", 24, 16);
+    ASSERT_EQ(0, mkdir(path("pics.jpg").c_str(), 0755));
     struct Case {
         const char* output;
         const char* umask;
@@ -259,33 +245,43 @@ TEST_F(CliFiles, OutputsReplaceWholeWithUsualPermissions) {
         {"a.jpg", "022", 0, "644"},
         {"b.png", "022", 0, "644"},
         {"c.jpg", "027", 0, "640"},
+        {"x.jpg.png", "022", 0, "644"},
+        {"pics.jpg/sheet.png", "022", 0, "644"},
+        {"y.png.jpg", "022", 0, "644"},
+        {"z.PNG", "022", 0, "644"},
+        {"w.Jpeg", "022", 0, "644"},
         {"missing/d.png", "022", 1, "No such file or directory"},
         {"in.png/e.png", "022", 1, "Not a directory"},
     };
     for (const Case& c : cases) {
+        const std::string out = path(c.output);
         // An old, longer file stands at the target first, where one can.
         if (c.status == 0) {
-            ASSERT_TRUE(kivtest::writeFile(path(c.output), Bytes(1 << 16, 'o')));
+            ASSERT_TRUE(kivtest::writeFile(out, Bytes(1 << 16, 'o')));
         }
-        CliResult r = run({"apply", "-e", "403", in, "-o", path(c.output)},
-                          std::string("umask ") + c.umask + "; ");
+        CliResult r =
+            run({"apply", "-e", "403", in, "-o", out}, std::string("umask ") + c.umask + "; ");
         EXPECT_EQ(c.status, r.status) << c.output << ": " << r.err;
-        if (c.status == 0) {
-            struct stat st;
-            ASSERT_EQ(0, stat(path(c.output).c_str(), &st));
-            char mode[8];
-            snprintf(mode, sizeof(mode), "%o", st.st_mode & 0777);
-            EXPECT_STREQ(c.message, mode) << c.output;
-            EXPECT_NE(nullptr, load(path(c.output))) << c.output;
-            EXPECT_LT(st.st_size, 1 << 16) << c.output;
-        } else {
-            EXPECT_NE(std::string::npos,
-                      r.err.find("cannot write '" + path(c.output) + "': " + c.message))
+        if (c.status != 0) {
+            EXPECT_NE(std::string::npos, r.err.find("cannot write '" + out + "': " + c.message))
                 << r.err;
+            continue;
         }
+        struct stat st;
+        ASSERT_EQ(0, stat(out.c_str(), &st));
+        char mode[8];
+        snprintf(mode, sizeof(mode), "%o", st.st_mode & 0777);
+        EXPECT_STREQ(c.message, mode) << c.output;
+        EXPECT_LT(st.st_size, 1 << 16) << c.output;
+        const bool png = strcasecmp(out.c_str() + out.size() - 3, "png") == 0;
+        EXPECT_TRUE(startsWith(kivtest::readFile(out), png ? kPngMagic : kJpegMagic)) << c.output;
+        EXPECT_NE(nullptr, load(out)) << c.output;
     }
     // Nothing but the outputs is left behind.
-    EXPECT_EQ(namesIn(mDir.path()), (std::set<std::string>{"in.png", "a.jpg", "b.png", "c.jpg"}));
+    EXPECT_EQ(namesIn(path("pics.jpg")), (std::set<std::string>{"sheet.png"}));
+    EXPECT_EQ(namesIn(mDir.path()),
+              (std::set<std::string>{"in.png", "a.jpg", "b.png", "c.jpg", "x.jpg.png", "pics.jpg",
+                                     "y.png.jpg", "z.PNG", "w.Jpeg"}));
 }
 
 TEST_F(CliFiles, ConcurrentWritersLeaveOneWholePicture) {
