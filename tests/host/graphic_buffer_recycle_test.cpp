@@ -31,10 +31,8 @@ size_t bytesOf(int w, int h, int format) {
 const void* useAndDrop(EGLDisplay display, int w, int h, int format,
                        uint32_t usage = kRenderUsage) {
     sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, format, usage);
-    void* pixels = nullptr;
-    EXPECT_EQ(buffer->lock(kWrite, &pixels), android::NO_ERROR);
-    memset(pixels, 0x5A, bytesOf(w, h, format));
-    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    const void* pixels = fillCpu(buffer, 0x5A, bytesOf(w, h, format));
+    EXPECT_NE(pixels, nullptr);
     EXPECT_FALSE(GlTest_bufferPixels(display, buffer).empty());
     return pixels;
 }
@@ -57,13 +55,10 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     for (const auto& c : cases) {
         const void* old = useAndDrop(display(), w, h, c.format);
         sp<GraphicBuffer> buffer = new GraphicBuffer(w, h, c.format, kRenderUsage);
-        void* pixels = nullptr;
-        ASSERT_EQ(buffer->lock(kRead, &pixels), android::NO_ERROR);
+        const void* pixels = nullptr;
+        const size_t bytes = bytesOf(w, h, c.format);
+        EXPECT_EQ(cpuBytes(buffer, bytes, &pixels), std::vector<uint8_t>(bytes, 0)) << c.format;
         EXPECT_EQ(pixels, old) << c.format;  // the memory was recycled...
-        size_t bytes = bytesOf(w, h, c.format);
-        const uint8_t* p = static_cast<const uint8_t*>(pixels);
-        EXPECT_EQ(std::vector<uint8_t>(p, p + bytes), std::vector<uint8_t>(bytes, 0)) << c.format;
-        ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
         std::vector<uint8_t> expected;
         for (int i = 0; i < w * h; ++i) expected.insert(expected.end(), c.zero, c.zero + 4);
         EXPECT_EQ(GlTest_bufferPixels(display(), buffer), expected)
@@ -75,29 +70,19 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     EXPECT_EQ(GlTest_bufferPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
-    void* pixels = nullptr;
-    ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
-    const uint8_t* p = static_cast<const uint8_t*>(pixels);
-    EXPECT_EQ(std::vector<uint8_t>(p, p + w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
+    EXPECT_EQ(cpuBytes(target, w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
     EXPECT_EQ(Seam::readbacks(target), 1u);
-    ASSERT_EQ(target->unlock(), android::NO_ERROR);
 
     // The texture-only memory goes to a texture-only buffer, mirror and all.
     sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
-    ASSERT_EQ(source->lock(kRead, &pixels), android::NO_ERROR);
-    p = static_cast<const uint8_t*>(pixels);
-    std::vector<uint8_t> cpu(p, p + w * h * 4);
-    ASSERT_EQ(source->unlock(), android::NO_ERROR);
-    EXPECT_EQ(cpu, std::vector<uint8_t>(w * h * 4, 0x5A));
-    EXPECT_EQ(GlTest_bufferPixels(display(), source), cpu);
+    EXPECT_EQ(cpuBytes(source, w * h * 4), std::vector<uint8_t>(w * h * 4, 0x5A));
+    EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(w * h * 4, 0x5A));
     EXPECT_EQ(Seam::uploads(source), 0u);
 
     // Written before its first GPU use, a recycled texture shows the new bytes.
     source.clear();
     sp<GraphicBuffer> written = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
-    ASSERT_EQ(written->lock(kWrite, &pixels), android::NO_ERROR);
-    memset(pixels, 0x33, w * h * 4);
-    ASSERT_EQ(written->unlock(), android::NO_ERROR);
+    ASSERT_NE(nullptr, fillCpu(written, 0x33, w * h * 4));
     EXPECT_EQ(GlTest_bufferPixels(display(), written), std::vector<uint8_t>(w * h * 4, 0x33));
 }
 
@@ -110,19 +95,14 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     EXPECT_EQ(GlTest_bufferPixels(display(), target), std::vector<uint8_t>(bytes, 0));
     EXPECT_TRUE(Seam::sharesGpuStorage(target));
-    void* pixels = nullptr;
-    ASSERT_EQ(target->lock(kRead, &pixels), android::NO_ERROR);
+    const void* pixels = nullptr;
+    EXPECT_EQ(cpuBytes(target, bytes, &pixels), std::vector<uint8_t>(bytes, 0));
     EXPECT_EQ(pixels, old);
-    const uint8_t* p = static_cast<const uint8_t*>(pixels);
-    EXPECT_EQ(std::vector<uint8_t>(p, p + bytes), std::vector<uint8_t>(bytes, 0));
-    ASSERT_EQ(target->unlock(), android::NO_ERROR);
 
     useAndDrop(display(), w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x5A));
-    ASSERT_EQ(source->lock(kWrite, &pixels), android::NO_ERROR);
-    memset(pixels, 0x33, bytes);
-    ASSERT_EQ(source->unlock(), android::NO_ERROR);
+    ASSERT_NE(nullptr, fillCpu(source, 0x33, bytes));
     EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
     EXPECT_EQ(Seam::uploads(source) + Seam::readbacks(target), 0u);
 }
