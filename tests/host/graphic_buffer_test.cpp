@@ -267,16 +267,15 @@ TEST_F(GraphicBufferSyncTest, GpuRenderingReachesTheCpuOnTheRenderingThread) {
     EXPECT_EQ(eglGetCurrentContext(), mGl->env()->getEGLContext());
     glClearColor(0.0f, 1.0f, 0.0f, 1.0f);
     glClear(GL_COLOR_BUFFER_BIT);
-    pixels = lock(buffer, kRead);
-    EXPECT_EQ(pixels[0], 0);
-    EXPECT_EQ(pixels[1], 255);
-    EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
+    EXPECT_EQ(cpuBytes(buffer, 2), (std::vector<uint8_t>{0, 255}));
 
     // A read-write lock that changes nothing sends nothing back up; a change does.
     lock(buffer, kRead | kWrite);
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(Seam::uploads(buffer), 0u);
-    lock(buffer, kRead | kWrite)[0] = 99;
+    pixels = lock(buffer, kRead | kWrite);
+    ASSERT_NE(pixels, nullptr);
+    pixels[0] = 99;
     EXPECT_EQ(buffer->unlock(), android::NO_ERROR);
     EXPECT_EQ(Seam::uploads(buffer), 1u);
     view.bind();
@@ -303,7 +302,7 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
 
     // A CPU write shows at once; the same memory comes back on every lock.
     uint8_t* again = lock(buffer, kWrite);
-    EXPECT_EQ(again, pixels);
+    ASSERT_EQ(again, pixels);
     memset(again, 0x44, pattern.size());
     ASSERT_EQ(buffer->unlock(), android::NO_ERROR);
     view.bind();
