@@ -162,26 +162,6 @@ TEST_F(ManagerTest, RequestRenderDuringTheFirstTenFramesIsIgnored) {
     live.release();
 }
 
-TEST_F(ManagerTest, TwoCamerasAreBothLatchedEveryFrame) {
-    LivePreviewSetup setup;
-    setup.layout = CAMERA_LAYOUT_DUAL;
-    LivePreview live(setup);
-    ASSERT_NO_FATAL_FAILURE(start(live));
-    // A camera whose frames are not latched runs out of buffers within a
-    // few frames (step() asserts that each frame was queued).
-    for (int i = 0; i < 8; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(live.framesShown(), 19u);
-    EXPECT_EQ(frameNumber(live.latestFrame()), 8);
-    live.release();
-}
-
-TEST_F(ManagerTest, OneCameraLayoutHasNoSecondCameraWindow) {
-    LivePreview live;
-    ASSERT_NO_FATAL_FAILURE(start(live));
-    EXPECT_EQ(live.manager->getNewPreviewWindowForOpenGL(1), nullptr);
-    live.release();
-}
-
 TEST_F(ManagerTest, StoppedPreviewKeepsLatchingButShowsNothing) {
     LivePreview live;
     ASSERT_NO_FATAL_FAILURE(start(live));
