@@ -29,7 +29,7 @@
 #include <utils/StrongPointer.h>
 
 struct ANativeWindow;
-struct VCImage;
+class VCImage;
 class ANWCondition;
 class AsyncImageConverter;
 class EglEnvironment;
