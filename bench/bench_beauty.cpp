@@ -25,6 +25,7 @@
 #include <vector>
 
 #include "bench_common.h"
+#include "bench_gl.h"
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglImage.h"
 #include "core/egl/EglNativeSeam.h"
@@ -71,30 +72,6 @@ VCImage* makeFrame() {
     return image;
 }
 
-GLuint compile(const char* fragment) {
-    auto shader = [](GLenum type, const char* text) {
-        // The text GL compiles for the library's shaders on this platform
-        // (highp where mediump is emulated), so both sides run the same code.
-        std::string adapted;
-        text = EglNativeSeam::get().shaderText(type, text, &adapted);
-        GLuint s = glCreateShader(type);
-        glShaderSource(s, 1, &text, nullptr);
-        glCompileShader(s);
-        return s;
-    };
-    GLuint program = glCreateProgram();
-    GLuint vs = shader(GL_VERTEX_SHADER, EglShader::kVertexShader);
-    GLuint fs = shader(GL_FRAGMENT_SHADER, fragment);
-    glAttachShader(program, vs);
-    glAttachShader(program, fs);
-    glLinkProgram(program);
-    glDeleteShader(vs);
-    glDeleteShader(fs);
-    GLint linked = 0;
-    glGetProgramiv(program, GL_LINK_STATUS, &linked);
-    return linked ? program : 0;
-}
-
 // The same passes, with nothing around them.
 class BareBeauty {
 public:
@@ -102,7 +79,7 @@ public:
         mState = state;
         mTarget = target;
         for (int type = 0; type < 4; ++type) {
-            mPrograms[type] = compile(beauty.getFragmentShader(Beauty::BLUR_TYPE(type)));
+            mPrograms[type] = quadProgram(beauty.getFragmentShader(Beauty::BLUR_TYPE(type)));
             if (mPrograms[type] == 0) return false;
         }
         for (int i = 0; i < 2; ++i) {
