@@ -19,10 +19,6 @@
 #include <thread>
 #include <vector>
 
-extern "C" {
-#include <libavutil/log.h>
-}
-
 #include <gui/HostWindow.h>
 
 #include "core/KivImaging.h"
@@ -160,7 +156,7 @@ BENCHMARK(BM_LiveRecord)->Iterations(1)->Unit(benchmark::kSecond)->UseRealTime()
 int main(int argc, char** argv) {
     VF_LogMsg = quietLog;
     __android_log_set_minimum_priority(ANDROID_LOG_ERROR);
-    av_log_set_level(AV_LOG_ERROR);
+    kivhost::HostVideo_setVerbose(false);
     if (getenv("EGL_PLATFORM") == nullptr) setenv("EGL_PLATFORM", "surfaceless", 0);
     benchmark::Initialize(&argc, argv);
     benchmark::RunSpecifiedBenchmarks();

@@ -48,6 +48,12 @@ install(TARGETS kivimaging EXPORT kivimaging-targets
 install(FILES ${KIV_PUBLIC_HEADERS} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kivimaging)
 install(FILES ${KIV_PUBLIC_VCCORE_HEADERS} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kivimaging/vccore)
 
+# The host video library, opened at run time by the program and the library
+# (from their own folder or the library folder) when video is read or written.
+if(TARGET kivhostvideo)
+  install(TARGETS kivhostvideo LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+endif()
+
 # The command-line program (its target name yields "kivimaging" to the library).
 if(TARGET kivimaging_cli)
   install(TARGETS kivimaging_cli RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})

@@ -1,7 +1,5 @@
 // The host video encoder: the queue's consumer side and its two threads.
-extern "C" {
-#include <libavutil/frame.h>
-}
+extern "C" {}
 
 #include "kivhost/VideoEncoder.h"
 
@@ -9,6 +7,7 @@ extern "C" {
 #include <cmath>
 #include <condition_variable>
 #include <deque>
+#include <memory>
 #include <mutex>
 #include <thread>
 #include <vector>
@@ -16,7 +15,7 @@ extern "C" {
 #include <gui/BufferItemConsumer.h>
 #include <gui/BufferQueue.h>
 
-#include "Mp4VideoWriter.h"
+#include "HostVideoLibrary.h"
 #include "core/egl/HalPixelFormat.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_error.h"
@@ -73,13 +72,13 @@ struct VideoEncoder::State {
     sp<BufferItemConsumer> consumer;
     sp<BufferItemConsumer::FrameAvailableListener> signal;
     std::vector<uint8_t> scratch;  // the intake thread's
-    Mp4VideoWriter writer;
+    std::unique_ptr<Mp4VideoWriter> writer;
     std::thread intake;
     std::thread encode;
 
     ~State() {
-        for (Job& job : jobs) Mp4VideoWriter::freeFrame(job.frame);
-        for (AVFrame* frame : pool) Mp4VideoWriter::freeFrame(frame);
+        for (Job& job : jobs) writer->freeFrame(job.frame);
+        for (AVFrame* frame : pool) writer->freeFrame(frame);
     }
 };
 
@@ -97,11 +96,12 @@ private:
 
 // Converts the buffer's RGB pixels into the frame's YUVP bytes; false for a
 // buffer the video cannot take (logged once per encoder by the caller).
-bool convertFrame(const sp<GraphicBuffer>& buffer, AVFrame* frame, std::vector<uint8_t>* scratch) {
+bool convertFrame(const sp<GraphicBuffer>& buffer, unsigned char* yuv, int frameWidth,
+                  int frameHeight, std::vector<uint8_t>* scratch) {
     const uint32_t fourcc = HalPixelFormat::fourccOf(buffer->getPixelFormat(), false);
     const int width = (int)buffer->getWidth();
     const int height = (int)buffer->getHeight();
-    if (!VCImage_isRGB(fourcc) || width != frame->width || height != frame->height) return false;
+    if (!VCImage_isRGB(fourcc) || width != frameWidth || height != frameHeight) return false;
     void* pixels = nullptr;
     if (buffer->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels) != android::NO_ERROR) {
         return false;
@@ -127,8 +127,7 @@ bool convertFrame(const sp<GraphicBuffer>& buffer, AVFrame* frame, std::vector<u
     target.width = width;
     target.height = height;
     target.format = VC_FORMAT_YUVP;
-    VCImage_wrap(&target, frame->data[0], (int)VCImage_requiredSize(width, height, VC_FORMAT_YUVP),
-                 0);
+    VCImage_wrap(&target, yuv, (int)VCImage_requiredSize(width, height, VC_FORMAT_YUVP), 0);
     const int converted = VCImage_convert(&source, &target);
     buffer->unlock();
     return converted == 0;
@@ -173,7 +172,13 @@ std::unique_ptr<VideoEncoder> VideoEncoder::open(const std::string& path,
 
 int VideoEncoder::start() {
     State& s = *mState;
-    const int opened = s.writer.open(mPath, mSettings);
+    const HostVideoCalls* video = HostVideo_calls();
+    if (video != nullptr) s.writer.reset(video->newWriter());
+    if (s.writer == nullptr) {
+        s.closed = true;  // nothing to finish
+        return VC_REPORT(VC_ERROR_UNSUPPORTED);
+    }
+    const int opened = s.writer->open(mPath, mSettings);
     if (opened != 0) {
         s.closed = true;  // nothing to finish
         return opened;
@@ -240,7 +245,7 @@ bool VideoEncoder::takeFrame() {
                 frame = s.pool.back();
                 s.pool.pop_back();
             } else {
-                frame = s.writer.newFrame();
+                frame = s.writer->newFrame();
             }
         } else if (!s.failed && !s.warnedBehind) {
             s.warnedBehind = true;
@@ -254,11 +259,12 @@ bool VideoEncoder::takeFrame() {
     if (frame != nullptr) {
         // libx264 copies what it is given, so a pooled frame is ours again
         // once encoded; should a reference ever outlive that, take a fresh one.
-        if (!av_frame_is_writable(frame)) {
-            Mp4VideoWriter::freeFrame(frame);
-            frame = s.writer.newFrame();
+        if (!s.writer->writable(frame)) {
+            s.writer->freeFrame(frame);
+            frame = s.writer->newFrame();
         }
-        converted = frame != nullptr && convertFrame(item.mGraphicBuffer, frame, &s.scratch);
+        converted = frame != nullptr && convertFrame(item.mGraphicBuffer, s.writer->pixels(frame),
+                                                     mSettings.width, mSettings.height, &s.scratch);
     }
     const int64_t spent = steadyNanos() - start;
     s.consumer->releaseBuffer(item);
@@ -341,7 +347,7 @@ void VideoEncoder::encodeLoop() {
             std::lock_guard<std::mutex> guard(s.lock);
             failed = s.failed;
         }
-        const int status = failed ? 0 : s.writer.write(job.frame, job.pts);
+        const int status = failed ? 0 : s.writer->write(job.frame, job.pts);
         const int64_t spent = steadyNanos() - start;
         if (status != 0) fail(status);
         std::lock_guard<std::mutex> guard(s.lock);
@@ -376,7 +382,7 @@ int VideoEncoder::close() {
     }
     if (status == 0) {
         const int64_t start = steadyNanos();
-        status = s.writer.finish();
+        status = s.writer->finish();
         std::lock_guard<std::mutex> guard(s.lock);
         s.stats.encodeNanos += steadyNanos() - start;
         s.status = status;

@@ -16,6 +16,7 @@
 #include <functional>
 #include <thread>
 
+#include "host/media/HostVideoLibrary.h"
 #include "host/media/VideoEncoderTestSeam.h"
 #include "kivhost/VirtualCamera.h"
 #include "support/camera_frames.h"
@@ -217,21 +218,25 @@ TEST(VideoEncoderTest, StatusesAndLogLines) {
         std::function<void(VideoEncoderSettings*)> change;
         std::string path;
         int status;
-        std::string line;  // a prefix
+        std::string line;    // a prefix
+        const char* source;  // where the error arose
     };
+    const char* const inEncoder = "host/media/VideoEncoder:";
+    const char* const inWriter = "host/video/FfmpegMp4Writer:";
     const Case cases[] = {
         {[](VideoEncoderSettings* s) { s->width = 161; }, "a.mp4", VC_ERROR_INVALID_SIZE,
-         "VideoEncoder: cannot encode 161x96 (even sizes of 2 or more)"},
+         "VideoEncoder: cannot encode 161x96 (even sizes of 2 or more)", inEncoder},
         {[](VideoEncoderSettings* s) { s->height = 0; }, "a.mp4", VC_ERROR_INVALID_SIZE,
-         "VideoEncoder: cannot encode 160x0 (even sizes of 2 or more)"},
+         "VideoEncoder: cannot encode 160x0 (even sizes of 2 or more)", inEncoder},
         {[](VideoEncoderSettings* s) { s->fps = 0; }, "a.mp4", VC_ERROR_INVALID_PARAM,
-         "VideoEncoder: cannot encode at 0 fps, backlog 8, 1 threads"},
+         "VideoEncoder: cannot encode at 0 fps, backlog 8, 1 threads", inEncoder},
         {[](VideoEncoderSettings* s) { s->backlog = 0; }, "a.mp4", VC_ERROR_INVALID_PARAM,
-         "VideoEncoder: cannot encode at 24 fps, backlog 0, 1 threads"},
+         "VideoEncoder: cannot encode at 24 fps, backlog 0, 1 threads", inEncoder},
         {[](VideoEncoderSettings*) {}, "missing/a.mp4", VC_ERROR_IO_FAILED,
-         "VideoEncoder: cannot write " + dir.file("missing/a.mp4") + ": No such file or directory"},
+         "VideoEncoder: cannot write " + dir.file("missing/a.mp4") + ": No such file or directory",
+         inWriter},
         {[](VideoEncoderSettings* s) { s->preset = "nonsense"; }, "a.mp4", VC_ERROR_CODEC_FAILED,
-         "VideoEncoder: cannot start libx264 (preset nonsense, crf 20): "},
+         "VideoEncoder: cannot start libx264 (preset nonsense, crf 20): ", inWriter},
     };
     for (const Case& c : cases) {
         LogCapture log;
@@ -242,7 +247,7 @@ TEST(VideoEncoderTest, StatusesAndLogLines) {
         EXPECT_EQ(status, c.status) << c.line;
         EXPECT_EQ(log.countPrefix(c.line, VF_LOG_ERROR), 1u) << c.line;
         EXPECT_EQ(log.countPrefix(std::string(VCError_name(c.status)) + " (" +
-                                  std::to_string(c.status) + "): host/media/"),
+                                  std::to_string(c.status) + "): " + c.source),
                   1u)
             << c.line;
         EXPECT_FALSE(kivtest::fileExists(dir.file(c.path))) << c.line;
@@ -280,3 +285,25 @@ TEST(VideoEncoderTest, StatusesAndLogLines) {
 }
 
 }  // namespace
+
+// FFmpeg is opened on first use: without its library nothing is written, the
+// caller learns why once, and the library is found again once it is back.
+TEST(VideoEncoderTest, WithoutTheVideoLibraryNothingOpens) {
+    kivtest::TempDir dir;
+    LogCapture log;
+    kivhost::HostVideo_reloadForTesting("libkiv_no_video_here.so");
+    int status = 0;
+    EXPECT_EQ(VideoEncoder::open(dir.file("a.mp4"), sized(160, 96), &status), nullptr);
+    EXPECT_EQ(status, VC_ERROR_UNSUPPORTED);
+    EXPECT_EQ(kivhost::VirtualCamera_video(dir.file("a.mp4"), 96, 64, false), nullptr);
+    EXPECT_EQ(log.countPrefix("HostVideo: no video support (libkiv_no_video_here.so): "
+                              "libkiv_no_video_here.so: cannot open shared object file",
+                              VF_LOG_ERROR),
+              1u);
+    EXPECT_EQ(log.countPrefix("VC_ERROR_UNSUPPORTED (-"), 1u);
+    EXPECT_FALSE(kivtest::fileExists(dir.file("a.mp4")));
+    kivhost::HostVideo_reloadForTesting(nullptr);
+    std::unique_ptr<VideoEncoder> encoder = VideoEncoder::open(dir.file("a.mp4"), sized(160, 96));
+    ASSERT_NE(encoder, nullptr);
+    EXPECT_EQ(encoder->close(), 0);
+}

@@ -164,6 +164,26 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
     return ::testing::AssertionSuccess();
 }
 
+// FFmpeg and the hundred-odd libraries it needs are opened only for video:
+// pictures go through without them, in the program and in the library.
+TEST_F(Cli, PicturesNeedNoVideoLibraries) {
+    writePng("in.png", 64, 48);
+    CliResult r =
+        run({"apply", "-e", "Sepia", path("in.png"), "-o", path("out.png")}, "LD_DEBUG=files ");
+    ASSERT_EQ(0, r.status) << r.err;
+    EXPECT_NE(std::string::npos, r.err.find("file=libEGL.so")) << "no loader trace";
+    EXPECT_EQ(std::string::npos, r.err.find("libavcodec"));
+    EXPECT_EQ(std::string::npos, r.err.find("libkivhostvideo"));
+    FILE* ldd = popen("ldd '" KIV_LIBRARY_FILE "'", "r");
+    ASSERT_NE(nullptr, ldd);
+    std::string needed;
+    char line[512];
+    while (fgets(line, sizeof(line), ldd) != nullptr) needed += line;
+    EXPECT_EQ(0, pclose(ldd));
+    EXPECT_NE(std::string::npos, needed.find("libEGL.so")) << needed;
+    EXPECT_EQ(std::string::npos, needed.find("libav")) << needed;
+}
+
 // The sample picture: eight colour bars, grey and hue ramps, one-pixel
 // stripes and checkerboard, skin tones and primary ramps, opaque, exactly.
 TEST_F(Cli, GoldenSamplePicture) {

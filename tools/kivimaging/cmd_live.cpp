@@ -17,10 +17,6 @@
 #include <thread>
 #include <vector>
 
-extern "C" {
-#include <libavutil/log.h>
-}
-
 #include <gui/HostWindow.h>
 #include <gui/Surface.h>
 
@@ -375,7 +371,7 @@ int cmdLive(int argc, char** argv) {
     int rc = parseOptions(args, &o);
     if (rc != kExitOk) return rc;
     cliLogSetup(args.has("verbose"));
-    av_log_set_level(args.has("verbose") ? AV_LOG_INFO : AV_LOG_ERROR);
+    kivhost::HostVideo_setVerbose(args.has("verbose"));
 
     EffectChoice choice;
     if (!effectResolve(o.effect, &choice, &error)) return usageError("live", error);

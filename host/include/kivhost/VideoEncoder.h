@@ -23,6 +23,11 @@
 
 namespace kivhost {
 
+// FFmpeg's own messages: errors only, or its information too. Holds for the
+// host video library whenever it is loaded (it is loaded on first use, by
+// the first video read or encoder opened).
+void HostVideo_setVerbose(bool verbose);
+
 struct VideoEncoderSettings {
     // Even, at least 2x2: the queue's default buffer size.
     int width = 1280;

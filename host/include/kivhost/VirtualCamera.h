@@ -48,7 +48,8 @@ std::unique_ptr<VirtualCameraSource> VirtualCamera_pictures(const std::vector<st
 std::unique_ptr<VirtualCameraSource> VirtualCamera_folder(const std::string& folder, int width,
                                                           int height);
 // A video file decoded with FFmpeg and scaled to the camera's size, from its
-// start again at its end when `loop`; null when it cannot be opened (logged).
+// start again at its end when `loop`; null when it cannot be opened or the
+// host video library cannot be loaded (logged).
 std::unique_ptr<VirtualCameraSource> VirtualCamera_video(const std::string& path, int width,
                                                          int height, bool loop);
 

@@ -8,12 +8,12 @@ extern "C" {
 #include <algorithm>
 #include <cmath>
 
-#include "Mp4VideoWriter.h"
+#include "host/media/Mp4VideoWriter.h"
 #include "kivhost/VideoEncoder.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_log.h"
 
-#define VC_SOURCE "host/media/Mp4VideoWriter"
+#define VC_SOURCE "host/video/FfmpegMp4Writer"
 
 namespace kivhost {
 
@@ -25,13 +25,34 @@ std::string avError(int code) {
     return text;
 }
 
+class FfmpegMp4Writer : public Mp4VideoWriter {
+public:
+    ~FfmpegMp4Writer() override { close(); }
+    int open(const std::string& path, const VideoEncoderSettings& settings) override;
+    AVFrame* newFrame() override;
+    void freeFrame(AVFrame* frame) override { av_frame_free(&frame); }
+    unsigned char* pixels(AVFrame* frame) override { return frame->data[0]; }
+    bool writable(AVFrame* frame) override { return av_frame_is_writable(frame) != 0; }
+    int write(AVFrame* frame, int64_t pts) override;
+    int finish() override;
+
+private:
+    int drain();
+    void close();
+
+    int mWidth = 0;
+    int mHeight = 0;
+    std::string mPath;
+    AVFormatContext* mFormat = nullptr;
+    AVCodecContext* mCodec = nullptr;
+    AVStream* mStream = nullptr;
+    AVPacket* mPacket = nullptr;
+    bool mHeaderWritten = false;
+};
+
 }  // namespace
 
-Mp4VideoWriter::~Mp4VideoWriter() {
-    close();
-}
-
-void Mp4VideoWriter::close() {
+void FfmpegMp4Writer::close() {
     if (mFormat != nullptr && mFormat->pb != nullptr) avio_closep(&mFormat->pb);
     avformat_free_context(mFormat);
     mFormat = nullptr;
@@ -40,7 +61,7 @@ void Mp4VideoWriter::close() {
     av_packet_free(&mPacket);
 }
 
-int Mp4VideoWriter::open(const std::string& path, const VideoEncoderSettings& settings) {
+int FfmpegMp4Writer::open(const std::string& path, const VideoEncoderSettings& settings) {
     mWidth = settings.width;
     mHeight = settings.height;
     mPath = path;
@@ -100,7 +121,7 @@ int Mp4VideoWriter::open(const std::string& path, const VideoEncoderSettings& se
     return 0;
 }
 
-AVFrame* Mp4VideoWriter::newFrame() {
+AVFrame* FfmpegMp4Writer::newFrame() {
     AVFrame* frame = av_frame_alloc();
     if (frame == nullptr) return nullptr;
     frame->width = mWidth;
@@ -121,11 +142,7 @@ AVFrame* Mp4VideoWriter::newFrame() {
     return frame;
 }
 
-void Mp4VideoWriter::freeFrame(AVFrame* frame) {
-    av_frame_free(&frame);
-}
-
-int Mp4VideoWriter::write(AVFrame* frame, int64_t pts) {
+int FfmpegMp4Writer::write(AVFrame* frame, int64_t pts) {
     frame->pts = pts;
     const int result = avcodec_send_frame(mCodec, frame);
     if (result < 0) {
@@ -136,7 +153,7 @@ int Mp4VideoWriter::write(AVFrame* frame, int64_t pts) {
     return drain();
 }
 
-int Mp4VideoWriter::drain() {
+int FfmpegMp4Writer::drain() {
     for (;;) {
         int result = avcodec_receive_packet(mCodec, mPacket);
         if (result == AVERROR(EAGAIN) || result == AVERROR_EOF) return 0;
@@ -155,7 +172,7 @@ int Mp4VideoWriter::drain() {
     }
 }
 
-int Mp4VideoWriter::finish() {
+int FfmpegMp4Writer::finish() {
     if (!mHeaderWritten) return VC_REPORT(VC_ERROR_INVALID_STATE);
     mHeaderWritten = false;
     int status = avcodec_send_frame(mCodec, nullptr) < 0 ? VC_REPORT(VC_ERROR_CODEC_FAILED) : 0;
@@ -168,6 +185,10 @@ int Mp4VideoWriter::finish() {
     }
     close();
     return status;
+}
+
+Mp4VideoWriter* FfmpegMp4Writer_create() {
+    return new FfmpegMp4Writer();
 }
 
 }  // namespace kivhost

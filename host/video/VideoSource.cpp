@@ -116,12 +116,11 @@ private:
 
 }  // namespace
 
-std::unique_ptr<VirtualCameraSource> VirtualCamera_video(const std::string& path, int width,
-                                                         int height, bool loop) {
+VirtualCameraSource* VideoSource_open(const char* path, int width, int height, bool loop) {
     if (width < 2 || height < 2 || ((width | height) & 1) != 0) return nullptr;
     std::unique_ptr<Video> source(new Video(width, height, loop));
     if (!source->open(path)) return nullptr;
-    return source;
+    return source.release();
 }
 
 }  // namespace kivhost
