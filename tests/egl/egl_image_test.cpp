@@ -1,13 +1,14 @@
-// EglImage on real Mesa: the four kinds, their failures (the fixture sees
-// what they leave behind), the GraphicBuffer writes (copy, conversion, YUV
-// resize), and an NV21 picture drawn by the default external shader against
-// the image core's NV21 -> RGBA conversion.
+// EglImage on real Mesa: the four kinds, the GraphicBuffer writes (copy,
+// conversion, YUV resize), and every status and error line in one table (the
+// fixture sees what failures leave behind). How an NV21 buffer looks through
+// the default external shader: egl_window_test.
 #include "core/egl/EglImage.h"
 
 #include <gtest/gtest.h>
 #include <ui/GraphicBuffer.h>
 
 #include <algorithm>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -57,22 +58,6 @@ Pixels take(VCImage* image, size_t n) {
     Pixels out(image->data, image->data + n);
     VCImage_destroy(image);
     return out;
-}
-
-TEST(EglImageStateTest, OperationsBeforeInitializeLogAndFail) {
-    sp<EglImage> image = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 4, 4);
-    LogCapture log;
-    EXPECT_NE(image->bindTexture(), 0);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: bindTexture mInitialized == false"));
-    EXPECT_NE(image->bindFrameBuffer(), 0);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "EGL: bindFrameBuffer mInitialized == false"));
-    log.clear();
-    EXPECT_EQ(image->getImageData(), nullptr);
-    EXPECT_NE(image->flushCache(), 0);
-    EXPECT_EQ(log.count("EGL: not initialized"), 2u);
-    EXPECT_EQ(image->getTextureID(), 0u);
-    // No GL call was made: there is no context on this thread to make one.
-    EXPECT_EQ(eglGetCurrentContext(), EGL_NO_CONTEXT);
 }
 
 class EglImageTest : public GlContextTest {
@@ -147,10 +132,7 @@ TEST_F(EglImageTest, TextureAndFramebufferKinds) {
 TEST_F(EglImageTest, GraphicBufferFramebufferRendersIntoCpuVisibleMemory) {
     const int w = 16, h = 8;
     sp<EglImage> target = external(EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, w, h, VC_FORMAT_RGBA);
-    LogCapture log;
     ASSERT_EQ(target->initialize(), 0);
-    EXPECT_TRUE(
-        log.contains("EglImage: Creating GraphicBuffer 16x8 RGBA (format 1, usage 0x00000333)"));
     EXPECT_NE(target->getRenderBufferID(), 0u);
     EXPECT_NE(target->getFrameBufferID(), 0u);
     EXPECT_EQ(target->getTextureID(), 0u);
@@ -185,51 +167,6 @@ TEST_F(EglImageTest, GraphicBufferFramebufferRendersIntoCpuVisibleMemory) {
     EXPECT_EQ(target->getGraphicBuffer(), nullptr);
 }
 
-TEST_F(EglImageTest, BadSizesAndFormatsFailAndLeaveNothing) {
-    // An incomplete (0x0) framebuffer.
-    sp<EglImage> image = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 0, 0);
-    LogCapture log;
-    EXPECT_EQ(image->initialize(), VC_ERROR_INVALID_STATE);
-    EXPECT_EQ(log.countPrefix("VC_ERROR_INVALID_STATE (-7): core/egl/EglImage:"), 1u);
-    EXPECT_EQ(image->getTextureID(), 0u);
-    EXPECT_EQ(image->getFrameBufferID(), 0u);
-    EXPECT_FALSE(image->isInitialized());
-    EXPECT_NE(image->bindFrameBuffer(), 0);
-    // A GL call that fails on the way is a GL error (-1), not a state error,
-    // and leaves nothing behind either.
-    sp<EglImage> negative = new EglImage(EglImage::IMAGE_FRAMEBUFFER, -1, 4);
-    log.clear();
-    EXPECT_EQ(negative->initialize(), VC_ERROR_UNKNOWN);
-    std::vector<std::string> lines = log.texts();
-    ASSERT_EQ(lines.size(), 2u);
-    EXPECT_EQ(lines[0].rfind("GL Error: 0x0501 'GL_INVALID_VALUE' - glTexImage2D(GL_TEXTURE_2D, 0, "
-                             "GL_RGBA, mWidth, mHeight, 0, GL_RGBA, GL_UNSIGNED_BYTE, NULL) at "
-                             "core/egl/EglImage:",
-                             0),
-              0u)
-        << lines[0];
-    EXPECT_EQ(lines[1].rfind("VC_ERROR_UNKNOWN (-1): core/egl/EglImage:", 0), 0u) << lines[1];
-    EXPECT_EQ(negative->getTextureID(), 0u);
-    EXPECT_EQ(negative->getFrameBufferID(), 0u);
-
-    // The two log lines differ in spelling on purpose.
-    sp<EglImage> rgb = external(EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_RGB8);
-    EXPECT_EQ(rgb->initialize(), VC_ERROR_UNSUPPORTED);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Unsupported format for the EglImage: RGB8"));
-    sp<EglImage> yuyv = external(EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_YUYV);
-    EXPECT_EQ(yuyv->initialize(), VC_ERROR_UNSUPPORTED);
-    EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Unsupported format for the EgImage: YUYV"));
-    EXPECT_EQ(yuyv->getGraphicBuffer(), nullptr);
-    sp<EglImage> noEnv = new EglImage(EglImage::IMAGE_EXTERNAL, 8, 8);
-    EXPECT_NE(noEnv->initialize(), 0);
-    // 4:2:0 needs even sizes: the buffer itself cannot be allocated.
-    sp<EglImage> odd = external(EglImage::IMAGE_EXTERNAL, 7, 5, VC_FORMAT_NV21);
-    EXPECT_EQ(odd->initialize(), VC_ERROR_ALLOC_FAILED);
-    EXPECT_TRUE(
-        log.contains(VF_LOG_ERROR, "Failed to initialize GraphicBuffer. Error: Invalid argument."));
-    EXPECT_EQ(odd->getGraphicBuffer(), nullptr);
-}
-
 TEST_F(EglImageTest, WritesCopyOrConvertIntoTheBuffer) {
     // Same size and format: a copy.
     sp<EglImage> rgba = external(EglImage::IMAGE_EXTERNAL, 4, 2, VC_FORMAT_RGBA);
@@ -251,16 +188,11 @@ TEST_F(EglImageTest, WritesCopyOrConvertIntoTheBuffer) {
         EXPECT_EQ(read->data[i], (19595 * p[0] + 38470 * p[1] + 7471 * p[2]) >> 16) << i;
     }
 
-    VCImage empty;  // no data
-    empty.width = 4;
-    empty.height = 2;
-    empty.format = VC_FORMAT_RGBA;
-    EXPECT_EQ(nv21->setImageData(empty, GL_CLAMP_TO_EDGE), VC_ERROR_NULL_PARAM);
     nv21->release();
     rgba->release();
 }
 
-TEST_F(EglImageTest, SmallerYuvIsResizedAndOtherSizesAreIncompatible) {
+TEST_F(EglImageTest, SmallerYuvIsResizedPlaneByPlane) {
     const int sw = 640, sh = 480, dw = 1280, dh = 720;
     sp<EglImage> image = external(EglImage::IMAGE_EXTERNAL, dw, dh, VC_FORMAT_NV21);
     ASSERT_EQ(image->initialize(), 0);
@@ -292,73 +224,81 @@ TEST_F(EglImageTest, SmallerYuvIsResizedAndOtherSizesAreIncompatible) {
             ASSERT_EQ(outChroma[y * dw + 2 * x + 1], (uint8_t)(sx + 1)) << x << "," << y;
         }
     }
-    read.reset();  // gives back the read lock it holds on the buffer
-    ImagePtr rgba(VCImage_createNew(sw, sh, VC_FORMAT_RGBA));
-    LogCapture log;
-    EXPECT_EQ(image->setImageData(*rgba, GL_CLAMP_TO_EDGE), VC_ERROR_INVALID_PARAM);
-    EXPECT_TRUE(
-        log.contains(VF_LOG_ERROR, "Incompatible image : 640x480 'RGBA' --> 1280x720 'NV21'"));
-    // The failed write still gave the buffer back.
-    void* pixels = nullptr;
-    EXPECT_EQ(image->getGraphicBuffer()->lock(0x3, &pixels), android::NO_ERROR);
-    image->getGraphicBuffer()->unlock();
     image->release();
 }
 
-TEST_F(EglImageTest, Nv21DrawnThroughTheDefaultShaderMatchesTheCpuConversion) {
-    const int w = 64;
-    const int h = 48;
-    ImagePtr picture(VCImage_createNew(w, h, VC_FORMAT_NV21));
-    ASSERT_NE(picture, nullptr);
-    // Gradients and strong chroma so that clamping happens too.
-    for (int y = 0; y < h; ++y) {
-        for (int x = 0; x < w; ++x) picture->data[y * w + x] = (uint8_t)((x * 4 + y * 5) % 256);
+// Every status and error line of EglImage, one call a row; a failed
+// initialize leaves no GL object (the fixture counts them) and no buffer.
+TEST_F(EglImageTest, LogLinesAndStatuses) {
+    const std::string kImage = "core/egl/EglImage:#";
+    sp<EglImage> fresh = new EglImage(EglImage::IMAGE_FRAMEBUFFER, 4, 4);
+    sp<EglImage> nv21 = external(EglImage::IMAGE_EXTERNAL, 8, 4, VC_FORMAT_NV21);
+    ASSERT_EQ(nv21->initialize(), 0);
+    ImagePtr rgba(VCImage_createNew(4, 2, VC_FORMAT_RGBA));
+    ImagePtr empty(VCImage_createEmpty(4, 2, VC_FORMAT_RGBA));  // no data
+    auto init = [&](sp<EglImage> image) {
+        int status = image->initialize();
+        EXPECT_FALSE(image->isInitialized());
+        EXPECT_EQ(image->getTextureID() + image->getFrameBufferID(), 0u);
+        EXPECT_EQ(image->getGraphicBuffer(), nullptr);
+        return status;
+    };
+    const struct {
+        std::function<int()> call;
+        int status;
+        std::vector<std::string> lines;
+    } rows[] = {
+        // clang-format off
+        {[&] { return fresh->bindTexture(); }, VC_ERROR_INVALID_STATE,
+         {"E EGL: bindTexture mInitialized == false"}},
+        {[&] { return fresh->bindFrameBuffer(); }, VC_ERROR_INVALID_STATE,
+         {"E EGL: bindFrameBuffer mInitialized == false"}},
+        {[&] { return fresh->flushCache(); }, VC_ERROR_INVALID_STATE, {"E EGL: not initialized"}},
+        {[&] { return fresh->getImageData() == nullptr ? -100 : 0; }, -100,
+         {"E EGL: not initialized"}},
+        // An incomplete (0x0) framebuffer; a GL call that fails on the way.
+        {[&] { return init(new EglImage(EglImage::IMAGE_FRAMEBUFFER, 0, 0)); },
+         VC_ERROR_INVALID_STATE, {"E VC_ERROR_INVALID_STATE (-7): " + kImage}},
+        {[&] { return init(new EglImage(EglImage::IMAGE_FRAMEBUFFER, -1, 4)); }, VC_ERROR_UNKNOWN,
+         {"E GL Error: 0x0501 'GL_INVALID_VALUE' - glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA, mWidth, "
+          "mHeight, 0, GL_RGBA, GL_UNSIGNED_BYTE, NULL) at " + kImage,
+          "E VC_ERROR_UNKNOWN (-1): " + kImage}},
+        // The two spellings differ on purpose.
+        {[&] { return init(external(EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_RGB8)); },
+         VC_ERROR_UNSUPPORTED, {"E Unsupported format for the EglImage: RGB8",
+                                "E VC_ERROR_UNSUPPORTED (-6): " + kImage}},
+        {[&] { return init(external(EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_YUYV)); },
+         VC_ERROR_UNSUPPORTED, {"E Unsupported format for the EgImage: YUYV",
+                                "E VC_ERROR_UNSUPPORTED (-6): " + kImage}},
+        {[&] { return init(new EglImage(nullptr, EglImage::IMAGE_EXTERNAL, 8, 8, VC_FORMAT_NV21)); },
+         VC_ERROR_INVALID_STATE,
+         {"E EGL: an EglImage on a GraphicBuffer needs an EglEnvironment",
+          "E VC_ERROR_INVALID_STATE (-7): " + kImage}},
+        // 4:2:0 needs even sizes: the buffer itself cannot be allocated.
+        {[&] { return init(external(EglImage::IMAGE_EXTERNAL, 7, 5, VC_FORMAT_NV21)); },
+         VC_ERROR_ALLOC_FAILED, {"E GraphicBuffer: cannot allocate 7x5 format 17 (stride 7)",
+                                 "E Failed to initialize GraphicBuffer. Error: Invalid argument.",
+                                 "E VC_ERROR_ALLOC_FAILED (-5): " + kImage}},
+        {[&] { return nv21->setImageData(*empty, GL_CLAMP_TO_EDGE); }, VC_ERROR_NULL_PARAM,
+         {"E VC_ERROR_NULL_PARAM (-2): " + kImage}},
+        // A refused write still gives the buffer back.
+        {[&] {
+             int status = nv21->setImageData(*rgba, GL_CLAMP_TO_EDGE);
+             void* pixels = nullptr;
+             EXPECT_EQ(nv21->getGraphicBuffer()->lock(0x3, &pixels), android::NO_ERROR);
+             nv21->getGraphicBuffer()->unlock();
+             return status;
+         }, VC_ERROR_INVALID_PARAM, {"E EGL: lockGraphicBuffer format : 11, width : 8, stride : 8",
+                                     "E Incompatible image : 4x2 'RGBA' --> 8x4 'NV21'",
+                                     "E VC_ERROR_INVALID_PARAM (-3): " + kImage}},
+        // clang-format on
+    };
+    for (size_t i = 0; i < sizeof(rows) / sizeof(rows[0]); ++i) {
+        LogCapture log;
+        EXPECT_EQ(rows[i].status, rows[i].call()) << "row " << i;
+        EXPECT_TRUE(log.matches(rows[i].lines)) << "row " << i;
     }
-    for (int i = 0; i < w * h / 2; i += 2) {
-        picture->data[w * h + i] = (uint8_t)((i * 13) % 256);      // V
-        picture->data[w * h + i + 1] = (uint8_t)((i * 29) % 256);  // U
-    }
-
-    sp<EglImage> target =
-        new EglImage(mGl->env(), EglImage::IMAGE_EXTERNAL_FRAMEBUFFER, w, h, (int)VC_FORMAT_RGBA);
-    sp<EglImage> source =
-        new EglImage(mGl->env(), EglImage::IMAGE_EXTERNAL, w, h, (int)VC_FORMAT_NV21);
-    ASSERT_EQ(target->initialize(), 0);
-    glActiveTexture(GL_TEXTURE0);
-    ASSERT_EQ(source->initialize(), 0);
-    ASSERT_EQ(source->bindTexture(), 0);
-    ASSERT_EQ(source->setImageData(*picture, GL_CLAMP_TO_EDGE), 0);
-
-    sp<EglProgram> program = new EglProgram();
-    program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
-    ASSERT_EQ(program->initialize(10, false), 0);
-    program->setCameraGeometry(w, h, 0, 0);
-    program->setPreviewGeometry(w, h, false);
-    // The flush leaves the default framebuffer bound, so the target is bound after it.
-    ASSERT_EQ(target->flushCache(), 0);
-    ASSERT_EQ(target->bindFrameBuffer(), 0);
-    ASSERT_EQ(program->onDrawFrame(), 0);
-    glFinish();
-    target->unbindFrameBuffer();
-    source->unbindTexture();
-
-    ImagePtr result(target->getImageData());
-    ASSERT_NE(result, nullptr);
-    // What the GPU shows must be the image core's own NV21 -> RGBA; 1 allows
-    // for the shader's float output rounding (llvmpipe: exact).
-    ImagePtr expected(VCImage_createNew(w, h, VC_FORMAT_RGBA));
-    ASSERT_EQ(VCImage_convert(picture.get(), expected.get()), 0);
-    for (int i = 0; i < w * h; ++i) {
-        const uint8_t* p = result->data + i * 4;
-        const uint8_t* want = expected->data + i * 4;
-        for (int c = 0; c < 3; ++c) {
-            ASSERT_NEAR(p[c], want[c], 1) << "pixel " << i % w << "," << i / w << " channel " << c;
-        }
-        ASSERT_EQ(p[3], 255);
-    }
-    program->release();
-    source->release();
-    target->release();
+    nv21->release();
 }
 
 }  // namespace

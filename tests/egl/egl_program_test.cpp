@@ -211,19 +211,6 @@ TEST_F(EglProgramTest, EffectSnippetIsWrappedCompiledAndDrawn) {
     EXPECT_EQ(filter.draws, 1);
 }
 
-TEST_F(EglProgramTest, BrokenSnippetFallsBackToPassThrough) {
-    TestFilter filter("vec4 doEffect() { return undefined_thing; }");
-    mProgram->setFilter(&filter);
-    LogCapture log;
-    ASSERT_EQ(mProgram->initialize(10, false), 0);
-    EXPECT_TRUE(
-        log.contains(VF_LOG_ERROR, "GL Error: failed to load effect shader. Loading default."));
-    int result = -99;
-    EXPECT_EQ(draw(&result), expectedFor(mSrc, EglProgram::GEOMETRY_VFLIP));
-    EXPECT_EQ(result, 0);
-    EXPECT_EQ(filter.draws, 1);  // the effect still gets its per-frame call
-}
-
 TEST_F(EglProgramTest, FailingEffectIsDroppedAndTheNextFrameIsPassThrough) {
     TestFilter filter("vec4 doEffect() { return vec4(0.0, 0.0, 1.0, 1.0); }");
     filter.drawResult = -1;
@@ -274,7 +261,6 @@ TEST_F(EglProgramTest, TwoInputModeUsesTheSecondTemplateAndTheFlipFlag) {
     TestFilter second("vec4 doEffect2() { return texture2D(texSampler2, v_texcoord); }");
     mProgram->setFilter(&second);
     ASSERT_EQ(mProgram->initialize(20, false), 0);
-    EXPECT_STREQ(mProgram->getBaseFragmentCode(), EglProgram::kBaseFragmentCode2);
     EXPECT_EQ(draw(), expectedFor(mSrc2, EglProgram::GEOMETRY_VFLIP, true));  // flip set
     ASSERT_EQ(mProgram->setPreviewGeometry(W, H, false), 0);
     // The camera-0 type does not matter with two inputs.

@@ -9,7 +9,6 @@
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
-#include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglWindowSurface.h"
 #include "support/gl_context.h"
 
@@ -114,6 +113,10 @@ TEST_F(GlContextTest, HostWindowFramesFollowTheWindowSize) {
     sp<EglWindowSurface> surface =
         new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
     ASSERT_EQ(surface->initialize(), 0);
+    EXPECT_EQ(window->getConnectedApi(), NATIVE_WINDOW_API_EGL);
+    // A swap of a surface that is not current fails and queues nothing.
+    EXPECT_NE(surface->swapSurface(), 0);
+    EXPECT_EQ(window->queuedTotal(), 0u);
     auto surfaceWidth = [&]() {
         EGLint width = 0;
         eglQuerySurface(mGl->env()->getEGLDisplay(), surface->getEGLSurface(), EGL_WIDTH, &width);
@@ -143,33 +146,6 @@ TEST_F(GlContextTest, HostWindowFramesFollowTheWindowSize) {
     }
     ASSERT_EQ(mGl->surface()->bindSurface(), 0);
     surface->release();
-    EXPECT_EQ(window->getConnectedApi(), 0);
-}
-
-// Through the seam: a surface of the window's size that connects to it; a
-// swap of a surface that is not current fails and queues nothing; GL's lower
-// half (red) becomes the bottom rows of the queued frame.
-TEST_F(GlContextTest, SeamSwapQueuesTheRenderedFrameTopRowFirst) {
-    const int w = 12, h = 8;
-    sp<HostWindow> window = new HostWindow(w, h);
-    EGLDisplay display = mGl->env()->getEGLDisplay();
-    EglNativeSeam& seam = EglNativeSeam::get();
-    EGLSurface surface =
-        seam.createWindowSurface(display, mGl->env()->getEGLConfig(), window.get(), nullptr);
-    ASSERT_NE(surface, EGL_NO_SURFACE);
-    EXPECT_EQ(window->getConnectedApi(), NATIVE_WINDOW_API_EGL);
-    EGLint width = 0;
-    eglQuerySurface(display, surface, EGL_WIDTH, &width);
-    EXPECT_EQ(width, w);
-    EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_FALSE));
-    EXPECT_EQ(window->queuedTotal(), 0u);
-    EGLSurface previousDraw = eglGetCurrentSurface(EGL_DRAW);
-    ASSERT_TRUE(seam.makeCurrent(display, &surface, mGl->env()->getEGLContext()));
-    GlTest_fillHalves(w, h);
-    EXPECT_EQ(seam.swapBuffers(display, &surface), static_cast<EGLBoolean>(EGL_TRUE));
-    ASSERT_NO_FATAL_FAILURE(expectHalvesFrame(window, w, h));
-    ASSERT_TRUE(eglMakeCurrent(display, previousDraw, previousDraw, mGl->env()->getEGLContext()));
-    EXPECT_EQ(seam.destroySurface(display, surface), static_cast<EGLBoolean>(EGL_TRUE));
     EXPECT_EQ(window->getConnectedApi(), 0);
 }
 
