@@ -71,13 +71,11 @@ TEST_F(GraphicBufferRecycleTest, RecycledBuffersReadAsNewOnBothSides) {
     sp<GraphicBuffer> target = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kRenderUsage);
     EXPECT_EQ(GlTest_bufferPixels(display(), target), std::vector<uint8_t>(w * h * 4, 0));
     EXPECT_EQ(cpuBytes(target, w * h * 4), std::vector<uint8_t>(w * h * 4, 0));
-    EXPECT_EQ(Seam::readbacks(target), 1u);
 
     // The texture-only memory goes to a texture-only buffer, mirror and all.
     sp<GraphicBuffer> source = new GraphicBuffer(w, h, HAL_PIXEL_FORMAT_RGBA_8888, kTextureUsage);
     EXPECT_EQ(cpuBytes(source, w * h * 4), std::vector<uint8_t>(w * h * 4, 0x5A));
     EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(w * h * 4, 0x5A));
-    EXPECT_EQ(Seam::uploads(source), 0u);
 
     // Written before its first GPU use, a recycled texture shows the new bytes.
     source.clear();
@@ -104,7 +102,6 @@ TEST_F(GraphicBufferRecycleTest, SharedStorageRecyclesWithTheSameRules) {
     EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x5A));
     ASSERT_NE(nullptr, fillCpu(source, 0x33, bytes));
     EXPECT_EQ(GlTest_bufferPixels(display(), source), std::vector<uint8_t>(bytes, 0x33));
-    EXPECT_EQ(Seam::uploads(source) + Seam::readbacks(target), 0u);
 }
 
 TEST(GraphicBufferRecycleDisplayTest, KeptBuffersGoWithTheDisplaysLastOtherUser) {
