@@ -4,9 +4,7 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
-#include <cmath>
 #include <functional>
-#include <memory>
 #include <numeric>
 #include <string>
 #include <vector>
@@ -18,15 +16,15 @@
 #include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/Platform.h"
 #include "core/filters/sce/singleCameraEffects.h"
+#include "support/image_ptr.h"
 #include "support/temp_dir.h"
 #include "support/test_picture.h"
-#include "support/image_ptr.h"
 #include "vccore/vc_file.h"
 #include "vccore/vc_picture.h"
 
 namespace {
 
-using Bytes = std::vector<unsigned char>;
+using kivtest::Bytes;
 
 // Even sizes (NV21 needs them); taller than three 64-row bands.
 const int kWidth = 72;
@@ -36,49 +34,34 @@ const int kHeight = 210;
 std::vector<int> factoryIds() {
     std::vector<int> ids;
     for (auto range :
-         {std::make_pair(200, 213), std::make_pair(400, 447), std::make_pair(500, 508)}) {
+         {std::make_pair(200, 213), std::make_pair(400, 447), std::make_pair(500, 508)})
         for (int id = range.first; id <= range.second; ++id) {
             KivFilter* effect = KivImaging_create(id, nullptr);
-            if (effect == nullptr) continue;
-            if (effect->getFilterType() == id) ids.push_back(id);
+            if (effect != nullptr && effect->getFilterType() == id) ids.push_back(id);
             delete effect;
         }
-    }
     return ids;
 }
 
-// The test picture (gradients, hard-edged blocks the neighbour-reading
-// effects pick out), alpha varying for PNG.
-ImagePtr photo(int width, int height, bool alpha) {
-    std::vector<uint8_t> rgba = kivtest::makeTestPicture(width, height, !alpha);
-    ImagePtr image(VCImage_createNew(width, height, VC_FORMAT_RGBA));
-    std::copy(rgba.begin(), rgba.end(), image->data);
-    return image;
-}
-
-Bytes bytesOf(unsigned char* stream, size_t length) {
+Bytes owned(unsigned char* stream, size_t length) {
     Bytes out(stream, stream + length);
     free(stream);
     return out;
 }
 
-Bytes jpegOf(int width, int height) {
-    ImagePtr jpeg(VCImage_encodeToJpeg(photo(width, height, false).get(), 90));
+// The picture as a PNG (alpha varying) or a JPEG (opaque), or `rgba` so.
+Bytes encode(const VCImage& rgba, bool png, int quality = 90) {
+    if (png) {
+        size_t length = 0;
+        unsigned char* stream = VCPicture_encodePng(&rgba, &length);
+        return owned(stream, length);
+    }
+    ImagePtr jpeg(VCImage_encodeToJpeg(&rgba, quality));
     return Bytes(jpeg->data, jpeg->data + jpeg->size);
 }
-
-const Bytes& jpegInput() {
-    static const Bytes bytes = jpegOf(kWidth, kHeight);
-    return bytes;
-}
-
-const Bytes& pngInput() {
-    static const Bytes bytes = [] {
-        size_t length = 0;
-        unsigned char* png = VCPicture_encodePng(photo(kWidth, kHeight, true).get(), &length);
-        return bytesOf(png, length);
-    }();
-    return bytes;
+Bytes pictureFile(int width, int height, bool png = false) {
+    Bytes rgba = kivtest::makeTestPicture(width, height, !png);
+    return encode(*VCImageTest_wrap(rgba.data(), width, height, VC_FORMAT_RGBA), png);
 }
 
 // Effects the streamed path leaves to the whole picture: those that do not
@@ -86,80 +69,92 @@ const Bytes& pngInput() {
 // (their own passes would read rows no pass of the band drew).
 bool declines(KivFilter* effect) {
     if (dynamic_cast<KivPixelReachSource*>(effect) == nullptr) return true;
-    const KivPixelReach reach = KivFilter_pixelReach(effect, kWidth, kHeight);
-    return reach.kind != KivPixelReach::SAME_PIXEL &&
+    return KivFilter_pixelReach(effect, kWidth, kHeight).kind != KivPixelReach::SAME_PIXEL &&
            dynamic_cast<SingleCameraEffects*>(effect) == nullptr;
 }
 
-class StreamTest : public ::testing::TestWithParam<int> {
-protected:
-    static void SetUpTestSuite() {
-        sProcessor = new VFilterBufferedProcessorImpl();
-        sProcessor->initialize();
+// One processor with 64-row bands for a whole suite.
+struct Bands {
+    Bands() {
+        processor.initialize();
         KivBandPipeline::setBandRowsForTesting(64);
     }
-    static void TearDownTestSuite() {
+    ~Bands() {
         KivBandPipeline::setBandRowsForTesting(0);
-        sProcessor->release();
-        delete sProcessor;
+        processor.release();
     }
-
-    // The whole-picture path: decoded into `format`, one draw, encoded. Each
-    // path gets the effect fresh: some move on from frame to frame.
+    // The streamed path; *rc its status, *why its decoding verdict.
+    Bytes streamed(const Bytes& input, bool nv21, VFilterBufferedProcessorImpl::StreamOutput out,
+                   int* rc, VCDecodeFailure* why = nullptr) {
+        unsigned char* stream = nullptr;
+        size_t length = 0;
+        VCDecodeFailure verdict = VC_DECODE_CORRUPT;
+        *rc = processor.processStream(input.data(), input.size(), nv21, out, &stream, &length,
+                                      &verdict);
+        if (why != nullptr) *why = verdict;
+        EXPECT_EQ(*rc == 0 && out.sink == nullptr, stream != nullptr);
+        return owned(stream, length);
+    }
+    // The whole-picture path: decoded into `format`, one draw, encoded.
     Bytes whole(const Bytes& input, uint32_t format, bool png, int quality) {
-        sProcessor->setEffect(GetParam());
         ImagePtr in(VCImage_createEmpty(0, 0, format));
         EXPECT_EQ(0, VCImage_decodeFromJpeg(in.get(), input.data(), (int)input.size()));
         ImagePtr out(VCImage_createNew(in->width, in->height, VC_FORMAT_RGBA));
-        const int rc = format == VC_FORMAT_NV21
-                           ? sProcessor->doProcessNV21(in->data, in->width, in->height, out->data)
-                           : sProcessor->doProcessRGBA(in->data, in->width, in->height, out->data,
-                                                       VC_FORMAT_RGBA);
-        EXPECT_EQ(0, rc);
-        if (png) {
-            size_t length = 0;
-            unsigned char* stream = VCPicture_encodePng(out.get(), &length);
-            return bytesOf(stream, length);
-        }
-        ImagePtr jpeg(VCImage_encodeToJpeg(out.get(), quality));
-        return Bytes(jpeg->data, jpeg->data + jpeg->size);
+        EXPECT_EQ(0, format == VC_FORMAT_NV21
+                         ? processor.doProcessNV21(in->data, in->width, in->height, out->data)
+                         : processor.doProcessRGBA(in->data, in->width, in->height, out->data,
+                                                   VC_FORMAT_RGBA));
+        return encode(*out, png, quality);
     }
-
-    Bytes streamed(const Bytes& input, bool nv21, bool png, int quality, int* rc) {
-        sProcessor->setEffect(GetParam());
-        unsigned char* stream = nullptr;
-        size_t length = 0;
-        VCDecodeFailure why = VC_DECODE_CORRUPT;
-        *rc = sProcessor->processStream(input.data(), input.size(), nv21, {png, quality}, &stream,
-                                        &length, &why);
-        EXPECT_EQ(VC_DECODE_OK, why);
-        return *rc == 0 ? bytesOf(stream, length) : Bytes();
-    }
-
-    static VFilterBufferedProcessorImpl* sProcessor;
+    VFilterBufferedProcessorImpl processor;
 };
 
-VFilterBufferedProcessorImpl* StreamTest::sProcessor = nullptr;
+class StreamTest : public ::testing::TestWithParam<int> {
+protected:
+    static void SetUpTestSuite() { sBands = new Bands(); }
+    static void TearDownTestSuite() { delete sBands; }
+    // Each path gets the effect fresh: some move on from frame to frame.
+    Bytes streamed(const Bytes& input, bool nv21, bool png, int quality, int* rc) {
+        sBands->processor.setEffect(GetParam());
+        VCDecodeFailure why;
+        Bytes out = sBands->streamed(input, nv21, {png, quality}, rc, &why);
+        EXPECT_EQ(VC_DECODE_OK, why);
+        return out;
+    }
+    Bytes whole(const Bytes& input, uint32_t format, bool png, int quality) {
+        sBands->processor.setEffect(GetParam());
+        return sBands->whole(input, format, png, quality);
+    }
+    KivFilter* effect() {
+        EXPECT_EQ(0, sBands->processor.setEffect(GetParam()));
+        return sBands->processor.getEffect();
+    }
+    static Bands* sBands;
+};
+
+Bands* StreamTest::sBands = nullptr;
 
 TEST_P(StreamTest, BandsGiveTheWholePicturesBytes) {
-    ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
+    static const Bytes jpeg = pictureFile(kWidth, kHeight),
+                       png = pictureFile(kWidth, kHeight, true);
     struct Case {
         const Bytes& input;
         bool nv21, png;
         int quality;
     } cases[] = {
-        {jpegInput(), false, false, 90},  // kivimaging apply
-        {jpegInput(), true, false, 98},   // processFile
-        {pngInput(), false, true, 0},     // PNG in and out, alpha kept
+        {jpeg, false, false, 90},  // kivimaging apply
+        {jpeg, true, false, 98},   // processFile
+        {png, false, true, 0},     // PNG in and out, alpha kept
     };
+    const bool declined = declines(effect());
     for (const Case& c : cases) {
+        SCOPED_TRACE(testing::Message() << "nv21 " << c.nv21 << " png " << c.png);
         int rc = -1;
         Bytes band = streamed(c.input, c.nv21, c.png, c.quality, &rc);
-        if (rc == VC_ERROR_UNSUPPORTED && declines(sProcessor->getEffect())) return;
-        ASSERT_EQ(0, rc) << "nv21 " << c.nv21 << " png " << c.png;
+        if (rc == VC_ERROR_UNSUPPORTED && declined) return;
+        ASSERT_EQ(0, rc);
         EXPECT_TRUE(band ==
-                    whole(c.input, c.nv21 ? VC_FORMAT_NV21 : VC_FORMAT_RGBA, c.png, c.quality))
-            << "nv21 " << c.nv21 << " png " << c.png;
+                    whole(c.input, c.nv21 ? VC_FORMAT_NV21 : VC_FORMAT_RGBA, c.png, c.quality));
     }
 }
 
@@ -168,11 +163,10 @@ TEST_P(StreamTest, BandsGiveTheWholePicturesBytes) {
 // early really reads as zeros.
 TEST_P(StreamTest, NeighbourReadingEffectsKeepTheirReach) {
     const int width = 1024, height = 1800;
-    ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
-    const KivPixelReach reach = KivFilter_pixelReach(sProcessor->getEffect(), width, height);
+    const KivPixelReach reach = KivFilter_pixelReach(effect(), width, height);
     if (reach.kind != KivPixelReach::NEIGHBOURS) GTEST_SKIP() << "reads no neighbours";
     EXPECT_GT(reach.haloRows, 0);
-    static const Bytes input = jpegOf(width, height);
+    static const Bytes input = pictureFile(width, height);
     int rc = -1;
     Bytes band = streamed(input, false, false, 90, &rc);
     ASSERT_EQ(0, rc);
@@ -187,30 +181,23 @@ TEST_P(StreamTest, NeighbourReadingEffectsKeepTheirReach) {
 // effects that use the position (Vignette, Rainbow, Ripple) may round the
 // odd pixel to the next level.
 TEST_P(StreamTest, TilesGiveTheUntiledPixels) {
-    struct Size {
-        int width, height;
-    } sizes[] = {{256, 64}, {64, 256}, {200, 150}};
-    for (const Size& size : sizes) {
-        const Bytes input = jpegOf(size.width, size.height);
-        ASSERT_EQ(0, sProcessor->setEffect(GetParam()));
-        const KivPixelReach reach =
-            KivFilter_pixelReach(sProcessor->getEffect(), size.width, size.height);
-        const int rows = reach.kind == KivPixelReach::NEIGHBOURS ? reach.haloRows + 2 : 2;
-        const int columns = reach.kind == KivPixelReach::NEIGHBOURS ? reach.haloColumns + 2 : 2;
-        const bool tiles = !declines(sProcessor->getEffect()) &&
-                           reach.kind != KivPixelReach::WHOLE_PICTURE && 2 * rows < 128 &&
-                           (size.width <= 128 || 2 * columns < 128);
+    for (auto size : {std::make_pair(256, 64), std::make_pair(64, 256), std::make_pair(200, 150)}) {
+        const Bytes input = pictureFile(size.first, size.second);
+        const KivPixelReach reach = KivFilter_pixelReach(effect(), size.first, size.second);
+        const bool near = reach.kind == KivPixelReach::NEIGHBOURS;
+        const int rows = near ? reach.haloRows + 2 : 2, columns = near ? reach.haloColumns + 2 : 2;
+        const bool tiles = !declines(effect()) && reach.kind != KivPixelReach::WHOLE_PICTURE &&
+                           2 * rows < 128 && (size.first <= 128 || 2 * columns < 128);
         for (bool nv21 : {false, true}) {
             SCOPED_TRACE(testing::Message()
-                         << size.width << "x" << size.height << " nv21 " << nv21);
+                         << size.first << "x" << size.second << " nv21 " << nv21);
             int rc = -1;
             const Bytes untiled = streamed(input, nv21, true, 0, &rc);
             Platform::setMaximumTextureSizeForTesting(128);
             const Bytes tiled = streamed(input, nv21, true, 0, &rc);
             Platform::resetForTesting();
             ASSERT_EQ(tiles ? 0 : VC_ERROR_UNSUPPORTED, rc);
-            if (!tiles) continue;
-            if (tiled == untiled) continue;
+            if (!tiles || tiled == untiled) continue;
             ImagePtr a(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
             ImagePtr b(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
             ASSERT_EQ(0, VCImage_decodeFromJpeg(a.get(), tiled.data(), (int)tiled.size()));
@@ -229,19 +216,14 @@ INSTANTIATE_TEST_SUITE_P(Factory, StreamTest, ::testing::ValuesIn(factoryIds()),
                              return std::to_string(info.param);
                          });
 
-}  // namespace
-
-namespace {
-
 // What cannot stream says so before anything is drawn; what fails midway
-// stops every stage and says why.
-TEST(StreamRefusal, StatusAndReason) {
-    VFilterBufferedProcessorImpl processor;
-    processor.initialize();
-    processor.setEffect(401);
-    KivBandPipeline::setBandRowsForTesting(64);
-    const Bytes jpeg = jpegOf(kWidth, kHeight);
-    const Bytes odd = jpegOf(kWidth - 1, kHeight);
+// stops every stage and says why. A sink gets the stream as it is made, the
+// same bytes; one that refuses stops every stage (no hang) with the
+// encoder's failure.
+TEST(StreamRefusal, StatusReasonAndSinks) {
+    Bands bands;
+    bands.processor.setEffect(401);
+    const Bytes jpeg = pictureFile(kWidth, kHeight), odd = pictureFile(kWidth - 1, kHeight);
     const Bytes truncated(jpeg.begin(), jpeg.begin() + jpeg.size() * 2 / 3);
     const Bytes text = {'n', 'o', 't', ' ', 'a', ' ', 'p', 'i', 'c'};
     struct Row {
@@ -260,91 +242,26 @@ TEST(StreamRefusal, StatusAndReason) {
     };
     for (const Row& row : table) {
         if (row.maxTexture > 0) Platform::setMaximumTextureSizeForTesting(row.maxTexture);
-        unsigned char* stream = nullptr;
-        size_t length = 0;
-        VCDecodeFailure why = VC_DECODE_CORRUPT;
-        EXPECT_EQ(row.status, processor.processStream(row.input.data(), row.input.size(), row.nv21,
-                                                      {false, 90}, &stream, &length, &why))
-            << row.what;
+        int rc = -1;
+        VCDecodeFailure why;
+        bands.streamed(row.input, row.nv21, {false, 90}, &rc, &why);
+        EXPECT_EQ(row.status, rc) << row.what;
         EXPECT_EQ(row.why, why) << row.what;
-        EXPECT_EQ(row.status == 0, stream != nullptr) << row.what;
-        free(stream);
         Platform::resetForTesting();
     }
-    VCDecodeFailure why;
     unsigned char* stream = nullptr;
     size_t length = 0;
-    EXPECT_EQ(VC_ERROR_NULL_PARAM,
-              processor.processStream(nullptr, 0, false, {false, 90}, &stream, &length, &why));
-    KivBandPipeline::setBandRowsForTesting(0);
-    processor.release();
-}
-
-}  // namespace
-
-namespace {
-
-// processFile streams a picture into a JPEG output, asks for the output path
-// once, and leaves other outputs (and pictures it cannot stream) to the
-// whole-picture path: the files are those of load, doProcessNV21 and save.
-TEST(StreamFile, ProcessFileWritesTheWholePathsFile) {
-    kivtest::TempDir dir;
-    VFilterBufferedProcessorImpl processor;
-    processor.initialize();
-    processor.setEffect(422);
-    KivBandPipeline::setBandRowsForTesting(64);
-    const std::string even = dir.file("even.jpg"), odd = dir.file("odd.jpg");
-    kivtest::writeFile(even, jpegOf(kWidth, kHeight));
-    kivtest::writeFile(odd, jpegOf(kWidth - 1, kHeight - 1));
-    // Odd sizes do not load as NV21 at all, streamed or not.
-    EXPECT_EQ(VFilterBufferedProcessorImpl::FILE_LOAD_FAILED,
-              processor.processFilePath(odd.c_str(), [&]() {
-                  ADD_FAILURE() << "output asked for";
-                  return "never.jpg";
-              }));
-    for (const char* output : {"out.JPG", "out.png"}) {
-        const std::string got = dir.file(output), want = dir.file(std::string("whole_") + output);
-        int asked = 0;
-        EXPECT_EQ(VFilterBufferedProcessorImpl::FILE_OK,
-                  processor.processFilePath(even.c_str(), [&]() {
-                      ++asked;
-                      return got.c_str();
-                  }));
-        EXPECT_EQ(1, asked) << output;
-        ImagePtr nv21(VCImage_createEmpty(0, 0, VC_FORMAT_NV21));
-        ASSERT_EQ(0, VCImage_loadFromFile(nv21.get(), even.c_str()));
-        ImagePtr rgba(VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA));
-        ASSERT_EQ(0, processor.doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data));
-        ASSERT_EQ(0, VCImage_saveToFile(rgba.get(), want.c_str(), 98));
-        EXPECT_TRUE(kivtest::readFile(got) == kivtest::readFile(want)) << output;
-    }
-    KivBandPipeline::setBandRowsForTesting(0);
-    processor.release();
-}
-
-}  // namespace
-
-namespace {
-
-// A sink gets the stream as it is made, the same bytes; one that refuses
-// stops every stage (no hang) with the encoder's failure.
-TEST(StreamSink, SameBytesOrAFailure) {
-    VFilterBufferedProcessorImpl processor;
-    processor.initialize();
-    processor.setEffect(401);
-    KivBandPipeline::setBandRowsForTesting(64);
-    const Bytes jpeg = jpegOf(kWidth, kHeight);
+    VCDecodeFailure why;
+    EXPECT_EQ(VC_ERROR_NULL_PARAM, bands.processor.processStream(nullptr, 0, false, {false, 90},
+                                                                 &stream, &length, &why));
     struct Collect {
         Bytes bytes;
         size_t refuseAfter;
     };
     for (bool png : {false, true}) {
-        unsigned char* stream = nullptr;
-        size_t length = 0;
-        VCDecodeFailure why;
-        ASSERT_EQ(0, processor.processStream(jpeg.data(), jpeg.size(), false, {png, 90}, &stream,
-                                             &length, &why));
-        const Bytes whole = bytesOf(stream, length);
+        int rc = -1;
+        const Bytes whole = bands.streamed(jpeg, false, {png, 90}, &rc);
+        ASSERT_EQ(0, rc);
         for (size_t refuseAfter : {SIZE_MAX, size_t(0), whole.size() / 2}) {
             Collect sink{{}, refuseAfter};
             VFilterBufferedProcessorImpl::StreamOutput out = {png, 90};
@@ -356,18 +273,46 @@ TEST(StreamSink, SameBytesOrAFailure) {
             };
             out.sinkUser = &sink;
             const bool fits = refuseAfter >= whole.size();
-            EXPECT_EQ(fits ? 0 : VC_ERROR_CODEC_FAILED,
-                      processor.processStream(jpeg.data(), jpeg.size(), false, out, &stream,
-                                              &length, &why))
-                << png << " " << refuseAfter;
-            EXPECT_EQ(nullptr, stream);
-            if (fits) {
-                EXPECT_TRUE(sink.bytes == whole) << png;
-            }
+            bands.streamed(jpeg, false, out, &rc);
+            EXPECT_EQ(fits ? 0 : VC_ERROR_CODEC_FAILED, rc) << png << " " << refuseAfter;
+            EXPECT_TRUE(!fits || sink.bytes == whole) << png;
         }
     }
-    KivBandPipeline::setBandRowsForTesting(0);
-    processor.release();
+}
+
+// processFile streams a picture into a JPEG output, asks for the output path
+// once, and leaves other outputs (and pictures it cannot stream) to the
+// whole-picture path: the files are those of load, doProcessNV21 and save.
+TEST(StreamFile, ProcessFileWritesTheWholePathsFile) {
+    kivtest::TempDir dir;
+    Bands bands;
+    bands.processor.setEffect(422);
+    const std::string even = dir.file("even.jpg"), odd = dir.file("odd.jpg");
+    kivtest::writeFile(even, pictureFile(kWidth, kHeight));
+    kivtest::writeFile(odd, pictureFile(kWidth - 1, kHeight - 1));
+    // Odd sizes do not load as NV21 at all, streamed or not.
+    EXPECT_EQ(VFilterBufferedProcessorImpl::FILE_LOAD_FAILED,
+              bands.processor.processFilePath(odd.c_str(), [&]() {
+                  ADD_FAILURE() << "output asked for";
+                  return "never.jpg";
+              }));
+    for (const char* output : {"out.JPG", "out.png"}) {
+        const std::string got = dir.file(output), want = dir.file(std::string("whole_") + output);
+        int asked = 0;
+        EXPECT_EQ(VFilterBufferedProcessorImpl::FILE_OK,
+                  bands.processor.processFilePath(even.c_str(), [&]() {
+                      ++asked;
+                      return got.c_str();
+                  }));
+        EXPECT_EQ(1, asked) << output;
+        ImagePtr nv21(VCImage_createEmpty(0, 0, VC_FORMAT_NV21));
+        ASSERT_EQ(0, VCImage_loadFromFile(nv21.get(), even.c_str()));
+        ImagePtr rgba(VCImage_createNew(nv21->width, nv21->height, VC_FORMAT_RGBA));
+        ASSERT_EQ(0,
+                  bands.processor.doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data));
+        ASSERT_EQ(0, VCImage_saveToFile(rgba.get(), want.c_str(), 98));
+        EXPECT_TRUE(kivtest::readFile(got) == kivtest::readFile(want)) << output;
+    }
 }
 
 }  // namespace
