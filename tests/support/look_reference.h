@@ -1,7 +1,5 @@
-// Plain C++ restatement of the fixed looks' per-pixel math, used to check what
-// the GPU renders. Each look is written again from its formula, in float, with
-// GL's sampling rules (texel centres, GL_LINEAR, clamp to edge), not by reusing
-// the shader text.
+// The looks' per-pixel math written again on the CPU from their formulas (not
+// from the shader texts), to check what the GPU renders.
 #ifndef KIV_TESTS_LOOK_REFERENCE_H
 #define KIV_TESTS_LOOK_REFERENCE_H
 
@@ -42,16 +40,14 @@ std::vector<uint8_t> render(int look, const Picture& picture, std::vector<bool>*
 // The per-channel tolerance, in 1/255, of a look on llvmpipe.
 int tolerance(int look);
 
-// gtest check of an RGBA8 result against render() within tolerance(look) over
-// the first `rows` rows (all when negative), skipping pixels near a threshold;
-// over a whole picture those must stay under an eighth (the test picture's flat
-// patches sit on level boundaries).
+// An RGBA8 result against render() within tolerance(look) over the first
+// `rows` rows (all when negative), pixels near a threshold skipped (under an
+// eighth of a whole picture: its flat patches sit on level boundaries).
 void expectLook(int look, const Picture& picture, const uint8_t* actual, const std::string& label,
                 int rows = -1);
 
-// Compares an RGBA8 result with an expected one over the first `rows` rows
-// (all when negative), channel by channel within `tolerance` (in 1/255),
-// skipping pixels flagged in `skip` (may be null).
+// An RGBA8 result against an expected one over the first `rows` rows (all
+// when negative) within `tolerance` (in 1/255), but pixels flagged in `skip`.
 void expectPixels(const std::vector<uint8_t>& expected, const std::vector<bool>* skip,
                   const uint8_t* actual, int width, int height, int tolerance,
                   const std::string& label, int rows = -1);
