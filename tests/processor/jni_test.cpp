@@ -149,7 +149,6 @@ TEST_F(JniProcessorTest, ProcessBitmapReturnsANewArgb8888Bitmap) {
     log.clear();
     EXPECT_NE(nullptr, mProcessor->processBitmap(mEnv, rgb565));
     EXPECT_TRUE(log.contains(VF_LOG_ERROR, "Bitmap format is not RGBA_8888!"));
-    EXPECT_TRUE(log.contains(VF_LOG_DEBUG, "process_bitmap: width:8, height:4, stride:16"));
     EXPECT_EQ(0, intCall(rgb565, "getLockCount"));
 }
 

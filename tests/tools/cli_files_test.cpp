@@ -1,7 +1,6 @@
 // The kivimaging program against bad and unusual files: every input it cannot
 // use is refused with its reason and nothing written; every output is whole
 // and readable or not there at all, also on a full or read-only disk.
-#include <dirent.h>
 #include <errno.h>
 #include <gtest/gtest.h>
 #include <string.h>
@@ -23,20 +22,6 @@
 namespace {
 
 using kivtest::Bytes;
-
-// The file names in a folder, but for the fixture's own.
-std::set<std::string> namesIn(const std::string& folder) {
-    std::set<std::string> names;
-    DIR* dir = opendir(folder.c_str());
-    while (dir != nullptr) {
-        dirent* entry = readdir(dir);
-        if (entry == nullptr) break;
-        std::string name = entry->d_name;
-        if (name != "." && name != ".." && name != "stdout" && name != "stderr") names.insert(name);
-    }
-    if (dir != nullptr) closedir(dir);
-    return names;
-}
 
 bool startsWith(const Bytes& bytes, const Bytes& prefix) {
     return bytes.size() >= prefix.size() && std::equal(prefix.begin(), prefix.end(), bytes.begin());

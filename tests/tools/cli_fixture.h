@@ -9,6 +9,8 @@
 #include <string.h>
 #include <sys/wait.h>
 
+#include <filesystem>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -29,6 +31,17 @@ inline ImagePtr loadPicture(const std::string& file) {
     ImagePtr image(VCImage_createEmpty(0, 0, VC_FORMAT_RGBA));
     if (VCImage_loadFromFile(image.get(), file.c_str()) != VC_OK) image.reset();
     return image;
+}
+
+// The file names in a folder, but for the fixture's own.
+inline std::set<std::string> namesIn(const std::string& folder) {
+    std::set<std::string> names;
+    std::error_code absent;
+    for (const auto& entry : std::filesystem::directory_iterator(folder, absent))
+        names.insert(entry.path().filename().string());
+    names.erase("stdout");
+    names.erase("stderr");
+    return names;
 }
 
 class CliTest : public ::testing::Test {

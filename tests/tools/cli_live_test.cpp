@@ -2,8 +2,6 @@
 // effect into a recording (read back with FFmpeg and compared with the
 // effect on the CPU), the generator feeds preview pictures, a picture and a
 // snapshot; bad arguments are refused with their messages.
-#include <dirent.h>
-
 #include <regex>
 
 #include "cli_fixture.h"
@@ -71,10 +69,8 @@ TEST_F(CliLiveTest, PreviewPicturesAPictureAndASnapshot) {
                                             "p50 [0-9.]+ ms, p99 [0-9.]+ ms\n$")))
         << r.out;
     int pngs = 0;
-    if (DIR* d = opendir(path("frames").c_str())) {
-        while (dirent* e = readdir(d)) pngs += strstr(e->d_name, ".png") != nullptr ? 1 : 0;
-        closedir(d);
-    }
+    for (const std::string& name : namesIn(path("frames")))
+        pngs += name.find(".png") != std::string::npos;
     // Every preview frame read is saved, and the run reads 20.
     EXPECT_GE(pngs, 20);
     // Each at the camera's size, with the camera's bars in it.
