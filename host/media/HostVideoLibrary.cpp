@@ -8,6 +8,7 @@
 #include <atomic>
 #include <mutex>
 #include <string>
+#include <vector>
 
 #include "kivhost/VideoEncoder.h"
 #include "vccore/vc_error.h"
@@ -40,24 +41,46 @@ std::string ownFolder() {
     return slash == std::string::npos ? std::string() : path.substr(0, slash);
 }
 
+// The folders the loader searches for the main program's libraries
+// (LD_LIBRARY_PATH, its run path, the system's). A plain dlopen would search
+// those of its caller, which is not us where a sanitizer wraps dlopen.
+std::vector<std::string> programSearchPath() {
+    std::vector<std::string> folders;
+    void* program = dlopen(nullptr, RTLD_NOW);
+    Dl_serinfo size;
+    if (program == nullptr || dlinfo(program, RTLD_DI_SERINFOSIZE, &size) != 0) return folders;
+    std::vector<char> storage(size.dls_size);
+    Dl_serinfo* info = reinterpret_cast<Dl_serinfo*>(storage.data());
+    *info = size;
+    if (dlinfo(program, RTLD_DI_SERINFO, info) == 0) {
+        for (unsigned int i = 0; i < info->dls_cnt; ++i)
+            folders.push_back(info->dls_serpath[i].dls_name);
+    }
+    return folders;
+}
+
 // Beside this library, in the library folder seen from the program folder
-// (an installed tree), then wherever the loader looks (LD_LIBRARY_PATH, the
-// run path of the build tree, the system's folders).
+// (an installed tree), then wherever the program's own libraries are found
+// (the build tree's run path among them).
 void* openLibrary(std::string* error) {
-    const std::string folder = ownFolder();
-    const std::string candidates[] = {
-        folder + "/" KIV_HOST_VIDEO_LIBRARY,
-        folder + "/" KIV_HOST_VIDEO_RELATIVE_LIBDIR "/" KIV_HOST_VIDEO_LIBRARY,
-        KIV_HOST_VIDEO_LIBRARY,
-    };
-    for (const std::string& candidate : candidates) {
-        const std::string& name = gOnlyName.empty() ? candidate : gOnlyName;
-        if (name[0] == '/' && access(name.c_str(), F_OK) != 0) continue;
+    std::vector<std::string> candidates;
+    if (!gOnlyName.empty()) {
+        candidates.push_back(gOnlyName);
+    } else {
+        const std::string folder = ownFolder();
+        candidates.push_back(folder + "/" KIV_HOST_VIDEO_LIBRARY);
+        candidates.push_back(folder + "/" KIV_HOST_VIDEO_RELATIVE_LIBDIR
+                                      "/" KIV_HOST_VIDEO_LIBRARY);
+        for (const std::string& dir : programSearchPath())
+            candidates.push_back(dir + "/" KIV_HOST_VIDEO_LIBRARY);
+    }
+    *error = "not found";
+    for (const std::string& name : candidates) {
+        if (name.find('/') != std::string::npos && access(name.c_str(), F_OK) != 0) continue;
         void* handle = dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL);
         if (handle != nullptr) return handle;
         const char* why = dlerror();
         *error = why != nullptr ? why : name;
-        if (!gOnlyName.empty()) break;
     }
     return nullptr;
 }
