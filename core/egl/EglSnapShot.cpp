@@ -43,6 +43,7 @@ EglSnapShot::EglSnapShot(const sp<EglEnvironment>& env, int width, int height,
     : EglObject(width, height),
       mEglEnv(env),
       mConverter(converter),
+      mBuffers(std::make_shared<EglSnapShotBuffers>()),
       mWorkQueue(1, false),
       mImagesBusy(false),
       mPreviousCaptureTimeout(kDefaultPreviousCaptureTimeout) {
@@ -58,11 +59,13 @@ EglSnapShot::~EglSnapShot() {
 }
 
 int EglSnapShot::initialize_l() {
+    mBuffers->open();
     return EglSnapShot_makeTarget(mEglEnv, mWidth, mHeight, mTarget);
 }
 
 void EglSnapShot::release_l() {
     EglSnapShot_drainQueue(mWorkQueue);
+    mBuffers->close();
     for (sp<EglImage>& image : mInputs) {
         if (image != nullptr) image->release();
         image.clear();
@@ -308,9 +311,10 @@ int EglSnapShot::takePictureAsync(const VCImage* base, const VCImage* pip,
 }
 
 int EglSnapShot::readAndPost(OnFrameListener& listener, nsecs_t timestamp) {
-    int status = mTarget == nullptr ? VC_REPORT(VC_ERROR_INVALID_STATE)
-                                    : EglSnapShot_readAndPost(*mTarget, *mConverter, mWidth,
-                                                              mHeight, listener, timestamp, kNames);
+    int status = mTarget == nullptr
+                     ? VC_REPORT(VC_ERROR_INVALID_STATE)
+                     : EglSnapShot_readAndPost(*mTarget, *mConverter, mBuffers, mWidth, mHeight,
+                                               listener, timestamp, kNames);
     if (status == kEglSnapShotReportUnknown) status = VC_REPORT(VC_ERROR_UNKNOWN);
     // A render thread waiting to capture again may go on.
     giveBackImages();

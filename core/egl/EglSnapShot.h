@@ -76,6 +76,7 @@ private:
     android::sp<EglEnvironment> mEglEnv;
     android::sp<EglImage> mTarget;
     android::sp<ImageConverter> mConverter;
+    std::shared_ptr<EglSnapShotBuffers> mBuffers;
     android::sp<EglImage> mInputs[2];
     android::WorkQueue mWorkQueue;
     android::Mutex mLock;

@@ -3,6 +3,8 @@
 #include <utils/Condition.h>
 #include <utils/Mutex.h>
 
+#include <stdlib.h>
+
 #include <GLES2/gl2.h>
 
 #include "core/egl/EglCheck.h"
@@ -46,6 +48,78 @@ private:
 
 }  // namespace
 
+// An image on a buffer of EglSnapShotBuffers: destroying it gives the buffer
+// back, unless someone has since freed or replaced the buffer.
+class EglSnapShotBuffers::Image : public VCImage {
+public:
+    Image(const std::shared_ptr<EglSnapShotBuffers>& buffers, unsigned char* buffer, int w, int h,
+          uint32_t bytes)
+        : mBuffers(buffers), mBuffer(buffer) {
+        data = buffer;
+        width = w;
+        height = h;
+        format = VC_FORMAT_RGBA;
+        size = bytes;
+    }
+    ~Image() override {
+        if (data == mBuffer && !wrapped && mBuffers->keep(data, size)) data = nullptr;
+    }
+
+private:
+    std::shared_ptr<EglSnapShotBuffers> mBuffers;
+    unsigned char* mBuffer;
+};
+
+EglSnapShotBuffers::~EglSnapShotBuffers() {
+    free(mData);
+}
+
+VCImage* EglSnapShotBuffers::newImage(const std::shared_ptr<EglSnapShotBuffers>& buffers, int width,
+                                      int height) {
+    const uint32_t size = VCImage_requiredSize(width, height, VC_FORMAT_RGBA);
+    if (size == 0) return nullptr;
+    unsigned char* data = buffers->take(size);
+    if (data == nullptr) data = static_cast<unsigned char*>(malloc(size));
+    if (data == nullptr) return nullptr;
+    return new Image(buffers, data, width, height, size);
+}
+
+void EglSnapShotBuffers::open() {
+    std::lock_guard<std::mutex> guard(mLock);
+    mOpen = true;
+}
+
+void EglSnapShotBuffers::close() {
+    unsigned char* data;
+    {
+        std::lock_guard<std::mutex> guard(mLock);
+        mOpen = false;
+        data = mData;
+        mData = nullptr;
+    }
+    free(data);
+}
+
+unsigned char* EglSnapShotBuffers::take(uint32_t size) {
+    unsigned char* data;
+    {
+        std::lock_guard<std::mutex> guard(mLock);
+        data = mData;
+        mData = nullptr;
+        if (data != nullptr && mSize == size) return data;
+    }
+    free(data);  // another size: the snapshot's pictures have changed
+    return nullptr;
+}
+
+bool EglSnapShotBuffers::keep(unsigned char* data, uint32_t size) {
+    std::lock_guard<std::mutex> guard(mLock);
+    if (!mOpen || mData != nullptr) return false;
+    mData = data;
+    mSize = size;
+    return true;
+}
+
 EglSnapShotCreateSync gEglSnapShotCreateSync = createSync;
 EglSnapShotClientWait gEglSnapShotClientWait = clientWait;
 
@@ -61,8 +135,9 @@ int EglSnapShot_makeTarget(const android::sp<EglEnvironment>& env, int width, in
     return status;
 }
 
-int EglSnapShot_readAndPost(EglImage& target, ImageConverter& converter, int width, int height,
-                            OnFrameListener& listener, nsecs_t timestamp,
+int EglSnapShot_readAndPost(EglImage& target, ImageConverter& converter,
+                            const std::shared_ptr<EglSnapShotBuffers>& buffers, int width,
+                            int height, OnFrameListener& listener, nsecs_t timestamp,
                             const EglSnapShotNames& names) {
     VCImage* image;
     {
@@ -76,7 +151,7 @@ int EglSnapShot_readAndPost(EglImage& target, ImageConverter& converter, int wid
     if (image->wrapped) {
         // The converter may outlive the buffer's lock: it gets a copy of its own.
         VFTraceSection trace(names.convert);
-        VCImage* copy = VCImage_createNew(width, height, VC_FORMAT_RGBA);
+        VCImage* copy = EglSnapShotBuffers::newImage(buffers, width, height);
         const int status = copy != nullptr ? VCImage_convert(image, copy) : VC_ERROR_ALLOC_FAILED;
         VCImage_destroy(image);
         if (status < 0) {

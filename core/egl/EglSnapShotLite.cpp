@@ -18,18 +18,24 @@ const EglSnapShotNames kNames = {"KI-SNAPSHOT_GETIMAGE", "KI-SNAPSHOT_CONVERT",
 
 EglSnapShotLite::EglSnapShotLite(const sp<EglEnvironment>& env, int width, int height,
                                  sp<ImageConverter>& converter)
-    : EglObject(width, height), mEglEnv(env), mWorkQueue(1, false), mConverter(converter) {}
+    : EglObject(width, height),
+      mEglEnv(env),
+      mWorkQueue(1, false),
+      mConverter(converter),
+      mBuffers(std::make_shared<EglSnapShotBuffers>()) {}
 
 EglSnapShotLite::~EglSnapShotLite() {
     mWorkQueue.finish();
 }
 
 int EglSnapShotLite::initialize_l() {
+    mBuffers->open();
     return EglSnapShot_makeTarget(mEglEnv, mWidth, mHeight, mTarget);
 }
 
 void EglSnapShotLite::release_l() {
     EglSnapShot_drainQueue(mWorkQueue);
+    mBuffers->close();
     if (mTarget != nullptr) mTarget->release();
     mTarget.clear();
 }
@@ -117,7 +123,7 @@ int EglSnapShotLite::takePictureAsync(sp<EglProgram>& program, OnFrameListener& 
 int EglSnapShotLite::takePictureReadPixels(sp<EglProgram>& program, OnFrameListener& listener,
                                            nsecs_t timestamp) {
     if (program == nullptr) return VC_REPORT(VC_ERROR_NULL_PARAM);
-    VCImage* snapshot = VCImage_createNew(mWidth, mHeight, VC_FORMAT_RGBA);
+    VCImage* snapshot = EglSnapShotBuffers::newImage(mBuffers, mWidth, mHeight);
     if (snapshot == nullptr) {
         EglLog(VF_LOG_ERROR, "image allocation failed");
         return VC_REPORT(VC_ERROR_UNKNOWN);
@@ -143,7 +149,7 @@ int EglSnapShotLite::takePictureReadPixels(sp<EglProgram>& program, OnFrameListe
 
 int EglSnapShotLite::readAndPost(OnFrameListener& listener, nsecs_t timestamp) {
     if (mTarget == nullptr) return VC_REPORT(VC_ERROR_INVALID_STATE);
-    const int status = EglSnapShot_readAndPost(*mTarget, *mConverter, mWidth, mHeight, listener,
-                                               timestamp, kNames);
+    const int status = EglSnapShot_readAndPost(*mTarget, *mConverter, mBuffers, mWidth, mHeight,
+                                               listener, timestamp, kNames);
     return status == kEglSnapShotReportUnknown ? VC_REPORT(VC_ERROR_UNKNOWN) : status;
 }

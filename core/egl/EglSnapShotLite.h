@@ -56,6 +56,7 @@ private:
     android::sp<EglImage> mTarget;
     android::WorkQueue mWorkQueue;
     android::sp<ImageConverter> mConverter;
+    std::shared_ptr<EglSnapShotBuffers> mBuffers;
 };
 
 #endif
