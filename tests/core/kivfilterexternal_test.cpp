@@ -1,14 +1,13 @@
 // Downloadable filters end to end: libraries installed in a temporary device
 // tree, loaded by name, driven on the CPU and on llvmpipe through the buffered
 // processor. The C stand-in (plugin_standin/) checks the plug-in slot order
-// and records every call; the two example plug-ins are checked against CPU
-// statements of their math.
+// and records every call; the example Solarize is checked against a CPU
+// statement of its math.
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
 #include <algorithm>
-#include <cmath>
 #include <fstream>
 #include <memory>
 #include <string>
