@@ -3,9 +3,6 @@
 #include <dlfcn.h>
 
 #include <atomic>
-#include <mutex>
-#include <utility>
-#include <vector>
 
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
@@ -22,10 +19,6 @@ std::atomic<int> gMakeCurrentFaults{0};
 std::atomic<int> gMakeCurrentWidth{0};
 std::atomic<int> gMakeCurrentHeight{0};
 std::atomic<long> gObjectBalance{0};
-
-std::mutex gBindsLock;
-std::vector<std::pair<EGLContext, GLuint>> gBinds;
-EGLContext gDrawingContext = EGL_NO_CONTEXT;
 
 // No size asked, or the surface's.
 bool sizeMatches(EGLDisplay display, EGLSurface surface) {
@@ -78,19 +71,6 @@ long GlFault_objectBalance() {
     return gObjectBalance.load();
 }
 
-void GlFault_resetBinds() {
-    std::lock_guard<std::mutex> guard(gBindsLock);
-    gBinds.clear();
-    gDrawingContext = EGL_NO_CONTEXT;
-}
-
-int GlFault_bindsOfDrawingContext() {
-    std::lock_guard<std::mutex> guard(gBindsLock);
-    int n = 0;
-    for (const auto& bind : gBinds) n += bind.first == gDrawingContext && bind.second != 0;
-    return n;
-}
-
 extern "C" GLuint glCreateProgram() {
     static const auto next = driver<GLuint (*)()>("glCreateProgram");
     if (takeFault(gProgramFaults)) return 0;
@@ -110,20 +90,7 @@ extern "C" void glReadPixels(GLint x, GLint y, GLsizei width, GLsizei height, GL
 
 extern "C" void glDrawArrays(GLenum mode, GLint first, GLsizei count) {
     static const auto next = driver<void (*)(GLenum, GLint, GLsizei)>("glDrawArrays");
-    {
-        std::lock_guard<std::mutex> guard(gBindsLock);
-        gDrawingContext = eglGetCurrentContext();
-    }
     if (!takeFault(gDrawFaults)) next(mode, first, count);
-}
-
-extern "C" void glBindFramebuffer(GLenum target, GLuint framebuffer) {
-    static const auto next = driver<void (*)(GLenum, GLuint)>("glBindFramebuffer");
-    {
-        std::lock_guard<std::mutex> guard(gBindsLock);
-        gBinds.emplace_back(eglGetCurrentContext(), framebuffer);
-    }
-    next(target, framebuffer);
 }
 
 extern "C" EGLBoolean eglMakeCurrent(EGLDisplay display, EGLSurface draw, EGLSurface read,

@@ -1,5 +1,5 @@
-// Driver failures on demand, and a count of framebuffer binds, on the real GL
-// of a test program. A program that calls these functions also gets the GL
+// Driver failures on demand, and a count of GL objects, on the real GL of a
+// test program. A program that calls these functions also gets the GL
 // entry points below defined in itself (in place of the driver's, the way
 // host/ stands in for eglInitialize); they pass every call on to the driver
 // except while a fault is armed:
@@ -29,10 +29,5 @@ void GlFault_failMakeCurrents(int count, int width = 0, int height = 0);
 // it started: a count that grows over repeated work means objects that
 // died with their context, or live on, undeleted.
 long GlFault_objectBalance();
-
-// Binds of a framebuffer other than 0, since the last reset, by the context
-// that made the last draw call (whether or not the draw was skipped).
-void GlFault_resetBinds();
-int GlFault_bindsOfDrawingContext();
 
 #endif
