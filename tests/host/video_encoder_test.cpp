@@ -21,6 +21,7 @@
 #include "kivhost/VirtualCamera.h"
 #include "support/camera_frames.h"
 #include "support/eventually.h"
+#include "support/image_ptr.h"
 #include "support/log_capture.h"
 #include "support/temp_dir.h"
 #include "support/video_files.h"
@@ -74,19 +75,6 @@ struct Producer {
     }
     sp<Surface> surface;
 };
-
-// Noise compresses badly, so a file grows fast.
-std::vector<uint8_t> noise(int seed, int width, int height) {
-    std::vector<uint8_t> rgba((size_t)width * height * 4);
-    uint32_t x = 2463534242u + (uint32_t)seed * 7919u;
-    for (uint8_t& b : rgba) {
-        x ^= x << 13;
-        x ^= x >> 17;
-        x ^= x << 5;
-        b = (uint8_t)x;
-    }
-    return rgba;
-}
 
 int64_t frameNumber(const DecodedVideo& video, size_t i) {
     return kivhost::VirtualCamera_decodeFrameNumber(video.rgba[i].data(), video.width, video.height,
@@ -201,7 +189,7 @@ TEST(VideoEncoderTest, AFailingFileLetsTheProducerGo) {
     Producer producer(encoder->getProducer());
     int result = 0;
     for (int i = 0; i < 5000 && result == 0; ++i) {
-        result = producer.queue(noise(i, 160, 96), 160, 1000000LL * i);
+        result = producer.queue(VCImageTest_randomBytes(160 * 96 * 4, i), 160, 1000000LL * i);  // noise: big
     }
     setrlimit(RLIMIT_FSIZE, &saved);
     signal(SIGXFSZ, previous);
