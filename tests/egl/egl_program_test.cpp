@@ -1,7 +1,8 @@
 // EglProgram on llvmpipe: what reaches the framebuffer for each geometry and
 // effect path (checked against a CPU mapping of the same quad), the default
 // fallbacks, effect replacement and failure, geometry and texture-unit rules;
-// the fixture sees that no GL object is left alive.
+// the fixture sees that no GL object is left alive. Snippets of real looks
+// drawn through the program against the CPU: tests/filters.
 #include <GLES2/gl2.h>
 #include <GLES2/gl2ext.h>
 #include <gtest/gtest.h>
@@ -193,22 +194,6 @@ TEST_F(EglProgramTest, DefaultOnlyDraws2DAndIgnoresEffects) {
     EXPECT_EQ(GlTest_readPixels(W, H), expectedFor(mSrc, EglProgram::GEOMETRY_NORMAL));
     EXPECT_EQ(filter.loads + filter.draws, 0);
     glDeleteTextures(1, &texture);
-}
-
-TEST_F(EglProgramTest, EffectSnippetIsWrappedCompiledAndDrawn) {
-    TestFilter filter(
-        "vec4 doEffect() { vec4 c = texture2D(texSampler, v_texcoord); return vec4(1.0 - c.rgb, "
-        "c.a); }");
-    mProgram->setFilter(&filter);
-    ASSERT_EQ(mProgram->initialize(10, false), 0);
-    normal();
-    Pixels out = draw();
-    ASSERT_EQ(out.size(), mSrc.size());
-    for (size_t i = 0; i < out.size(); i++) {
-        EXPECT_NEAR(out[i], i % 4 == 3 ? mSrc[i] : 255 - mSrc[i], 1) << "byte " << i;
-    }
-    EXPECT_EQ(filter.loads, 1);
-    EXPECT_EQ(filter.draws, 1);
 }
 
 TEST_F(EglProgramTest, FailingEffectIsDroppedAndTheNextFrameIsPassThrough) {
