@@ -39,7 +39,7 @@ protected:
 };
 
 // Board (any case) and chip decide the platform, the vendor, full-range NV21
-// and the formats; the answers are logged once and cached.
+// and the formats; the answers are cached.
 TEST_F(PlatformTest, DevicesTable) {
     using namespace fourcc;
     const struct {
@@ -81,27 +81,14 @@ TEST_F(PlatformTest, DevicesTable) {
                        Platform::isNativeInputFormat(BGRA), Platform::isNativeInputFormat(RGBA)}));
         EXPECT_TRUE(Platform::isNativeOutputFormat(RGBA) && !Platform::isNativeOutputFormat(BGRA));
     }
+    // The answers are cached: a property changed afterwards is not seen.
     setDevice("MSM8974", nullptr);
-    LogCapture log;
     Platform::getCurrentPlatform();
-    Platform::getCurrentVendor();
     Platform::isSupported_QCOM_NV21_FULL_RANGE();
-    setenv("KIV_PROP_ro_board_platform", "tavrix3", 1);  // cached: not seen, nothing logged again
+    setenv("KIV_PROP_ro_board_platform", "tavrix3", 1);
     EXPECT_EQ(Platform::PLATFORM_MSM8974, Platform::getCurrentPlatform());
     EXPECT_EQ(Platform::VENDOR_QCOM, Platform::getCurrentVendor());
-    EXPECT_TRUE(log.matches({"D Current platform is MSM8974 (known)", "D Current vendor is QCOM",
-                             "D isSupported_QCOM_NV21_FULL_RANGE true"}));
-    EXPECT_EQ(3u, log.lines().size());
-    setDevice("sdm845", nullptr);
-    log.clear();
-    Platform::getCurrentPlatform();
-    Platform::getCurrentVendor();
-    setDevice("tavrix4", "tavrix7420");
-    Platform::getCurrentVendor();
-    Platform::isSupported_TAVRIX_NV21_FULL_RANGE();
-    EXPECT_TRUE(
-        log.matches({"D Current platform is sdm845 (unknown)", "D Current vendor is UNKNOWN",
-                     "D Current vendor is KVAR", "D isSupported_TAVRIX_NV21_FULL_RANGE true"}));
+    EXPECT_TRUE(Platform::isSupported_QCOM_NV21_FULL_RANGE());
 }
 
 TEST_F(PlatformTest, MaximumTextureSizeIsQueriedOnceWithAFallback) {

@@ -23,8 +23,7 @@ std::string standinCase() {
 }
 
 const std::string kNotImplemented = "E VC_ERROR_NOT_IMPLEMENTED (-42): vccore/src/vc_csc:#",
-                  kUnsupported = "E VC_ERROR_UNSUPPORTED (-6): vccore/src/vc_csc:#",
-                  kExternalOk = "D [VCImage] Conversion successful with external CSC module";
+                  kUnsupported = "E VC_ERROR_UNSUPPORTED (-6): vccore/src/vc_csc:#";
 
 // A BGRA image whose first pixel is (B 0x12, G 0x34, …) converted into NV12
 // with its chroma displaced behind a gap: the hardware pair. The stand-in
@@ -53,8 +52,7 @@ TEST(VCConverterCsc, AbsentLibraryClearsTheFlagForGood) {
     if (!standinCase().empty()) GTEST_SKIP() << "run with stand-ins";
     LogCapture log;
     EXPECT_EQ(nullptr, VCConverter_create(64, 48, VC_FORMAT_NV21, VC_FORMAT_RGBA));
-    EXPECT_TRUE(log.matches({"D VCConverter_create: 64x48 NV21 --> RGBA",
-                             "E VCConverter: Could not open the dynamic library for CSC."}));
+    EXPECT_TRUE(log.matches({"E VCConverter: Could not open the dynamic library for CSC."}));
     // Sticky: no second attempt, no second error line.
     log.clear();
     EXPECT_EQ(nullptr, VCConverter_create(32, 32, VC_FORMAT_YV12, VC_FORMAT_BGRA));
@@ -71,7 +69,6 @@ TEST(VCConverterCsc, AbsentLibraryClearsTheFlagForGood) {
     log.clear();
     ASSERT_EQ(VC_OK, VCImage_convert(pair.in.get(), pair.out.get()));
     EXPECT_TRUE(log.matches({kNotImplemented, kUnsupported}));
-    EXPECT_FALSE(log.contains(kExternalOk.substr(2)));
     EXPECT_EQ(kCpuLuma, pair.dst[0]);
     // Other pairs are refused without a word.
     log.clear();
@@ -86,9 +83,6 @@ TEST(VCConverterCsc, PresentLibraryIsUsed) {
     LogCapture log;
     VCConverter* conv = VCConverter_create(64, 48, VC_FORMAT_NV21, VC_FORMAT_RGBA);
     ASSERT_NE(nullptr, conv);
-    EXPECT_EQ(std::vector<std::string>({"VCConverter_create: 64x48 NV21 --> RGBA",
-                                        "VCConverter: Calling vc_csc_init: 64x48 NV21 --> RGBA"}),
-              log.texts());
     uint8_t px[16] = {};
     ImagePtr a = VCImageTest_wrap(px, 2, 2, VC_FORMAT_RGBA, 16);
     ImagePtr b = VCImageTest_wrap(px, 2, 2, VC_FORMAT_NV21, 16);
@@ -99,6 +93,8 @@ TEST(VCConverterCsc, PresentLibraryIsUsed) {
     EXPECT_EQ(VC_ERROR_NULL_PARAM, VCConverter_convert(conv, empty.get(), b.get()));
     EXPECT_EQ(VC_ERROR_NULL_PARAM, VCConverter_convert(conv, a.get(), nullptr));
     EXPECT_EQ(64002, VCConverter_convert(conv, a.get(), b.get()));
+    const std::string kNull = "E VC_ERROR_NULL_PARAM (-2): vccore/src/vc_image:#";
+    EXPECT_TRUE(log.matches({kNull, kNull, kNull}));  // the refusals only
     VCConverter_release(conv);
     // A refused geometry keeps the library available.
     log.clear();
@@ -114,13 +110,12 @@ TEST(VCConverterCsc, PresentLibraryIsUsed) {
     HardwarePair pair;
     log.clear();
     ASSERT_EQ(VC_OK, VCImage_convert(pair.in.get(), pair.out.get()));
-    EXPECT_TRUE(log.matches({kNotImplemented, kExternalOk}));
+    EXPECT_TRUE(log.matches({kNotImplemented}));
     EXPECT_EQ(pair.expected(0x12 ^ 0xF0, 0x34 ^ 0xF0), pair.written());
     // RGBA to NV12 is not the hardware pair.
     log.clear();
     pair.in->format = VC_FORMAT_RGBA;
     ASSERT_EQ(VC_OK, VCImage_convert(pair.in.get(), pair.out.get()));
-    EXPECT_FALSE(log.contains(kExternalOk.substr(2)));
     EXPECT_EQ((19595 * 0x12 + 38470 * 0x34) >> 16, pair.dst[0]);
 }
 
@@ -143,7 +138,7 @@ TEST(VCConverterCsc, IncompleteLibrariesAndEntryChoice) {
         EXPECT_EQ(kCpuLuma, pair.dst[0]);
     } else {
         // The NEON entry is taken when offered, also over the plain one.
-        EXPECT_TRUE(log.matches({kNotImplemented, kExternalOk}));
+        EXPECT_TRUE(log.matches({kNotImplemented}));
         EXPECT_EQ(pair.expected(0x12 ^ 0x0F, 0x34 ^ 0x0F), pair.written());
     }
 }
