@@ -1,7 +1,8 @@
 // The adjustable colour effects, one case a parameter text: the uniforms it
 // sets, the warnings for what it cannot use, and the picture through the
-// buffered processor (RGBA and NV21) against a CPU statement of the colour
-// steps. Load failures and GL objects: effect_gl_test.
+// buffered processor against a CPU statement of the colour steps. The NV21
+// input path of every look: tests/processor. Load failures and GL objects:
+// effect_gl_test.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -213,11 +214,6 @@ TEST_P(ColorEffectCase, SetsItsUniformsWarnsAndDrawsAsTheCpu) {
               sProcessor->doProcessRGBA(picture.rgba().data(), w, h, out.data(), VC_FORMAT_RGBA));
     expectPixels(renderColour(steps, c.expected, picture), nullptr, out.data(), w, h, kTolerance,
                  "RGBA");
-    Nv21Picture nv21 = makeNv21Picture(64, 48);
-    out.assign(64 * 48 * 4, 0x5A);
-    ASSERT_EQ(0, sProcessor->doProcessNV21(nv21.nv21.data(), 64, 48, out.data()));
-    expectPixels(renderColour(steps, c.expected, Picture(64, 48, nv21.rgba)), nullptr, out.data(),
-                 64, 48, kTolerance, "NV21");
 }
 
 INSTANTIATE_TEST_SUITE_P(EveryControl, ColorEffectCase, ::testing::ValuesIn(kCases),
