@@ -60,7 +60,7 @@ void KivBandPipeline::setBandRowsForTesting(int rows) {
 
 int KivBandPipeline::bandRows(int width) {
     if (gBandRowsForTesting.load() > 0) return gBandRowsForTesting.load();
-    const int rows = (4 << 20) / 4 / std::max(width, 1);
+    const int rows = (1 << 20) / 4 / std::max(width, 1);
     return std::max(kTileRows, rows / kTileRows * kTileRows);
 }
 
@@ -75,16 +75,24 @@ int KivBandPipeline::onDecoded(void* self, const unsigned char* rgba, int first,
 }
 
 int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
+    // Decoded rows never straddle bands (bands are whole multiples of them).
+    const int band = first / mBandRows;
+    const bool newBand = mSourceSlots > 0 && first % mBandRows == 0;
+    // The band whose memory it takes has no reader left once the rows it
+    // reaches are all drawn.
+    const int freed = (band - mSourceSlots + 1) * mBandRows + mPicture.haloRows;
     {
         // Room: no further ahead of the drawn rows than the bands in flight
         // and the reach of the next band need.
         std::unique_lock<std::mutex> lock(mLock);
         mChanged.wait(lock, [&] {
             return mStatus != 0 ||
-                   first + rows <= mDrawn + kBandsInFlight * mBandRows + mPicture.haloRows;
+                   (first + rows <= mDrawn + kBandsInFlight * mBandRows + mPicture.haloRows &&
+                    (!newBand || mDrawn >= freed));
         });
         if (mStatus != 0) return mStatus;
     }
+    if (newBand && !mSource.takeBand(band)) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     const int w = mPicture.width;
     const size_t rowBytes = (size_t)w * 4;
     const unsigned char* rowsToCopy = rgba;
@@ -132,7 +140,7 @@ void KivBandPipeline::encode(VCStreamWriter* writer) {
             return;
         }
         y = drawn;
-        mTarget.discardRowsBelow(y);
+        if (mTargetSlots == 0) mTarget.discardRowsBelow(y);
         std::lock_guard<std::mutex> guard(mLock);
         mEncoded = y;
         mChanged.notify_all();
@@ -150,11 +158,18 @@ int KivBandPipeline::draw() {
         const int y1 = std::min(h, y0 + mBandRows);
         {
             std::unique_lock<std::mutex> lock(mLock);
+            // A band of a target ring takes the memory of one encoded.
+            const int encoded = y0 - (mTargetSlots > 0 ? std::min(kBandsInFlight, mTargetSlots - 1)
+                                                       : kBandsInFlight) *
+                                         mBandRows;
             mChanged.wait(lock, [&] {
-                return mStatus != 0 || (mDecoded >= std::min(h, y1 + halo) &&
-                                        mEncoded >= y0 - kBandsInFlight * mBandRows);
+                return mStatus != 0 || (mDecoded >= std::min(h, y1 + halo) && mEncoded >= encoded);
             });
             if (mStatus != 0) break;
+        }
+        if (mTargetSlots > 0 && !mTarget.takeBand(y0 / mBandRows)) {
+            fail(VC_REPORT(VC_ERROR_ALLOC_FAILED));
+            break;
         }
         int drawn = 0;
         if (tiled) {
@@ -175,7 +190,7 @@ int KivBandPipeline::draw() {
             break;
         }
         // Rows no later band reads give their memory back.
-        if (y1 - halo > 0) mSource.discardRowsBelow(y1 - halo);
+        if (mSourceSlots == 0 && y1 - halo > 0) mSource.discardRowsBelow(y1 - halo);
         std::lock_guard<std::mutex> guard(mLock);
         mDrawn = y1;
         mChanged.notify_all();
@@ -241,6 +256,19 @@ int KivBandPipeline::drawTiles(int y0, int y1, bool first) {
 }
 
 int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
+    // Rings where they save anything: the source keeps the bands in flight,
+    // the one being drawn and the reach on either side of it; the target the
+    // band being drawn and those the encoder has not reached.
+    const int bands = (mPicture.height + mBandRows - 1) / mBandRows;
+    const int reachBands = (mPicture.haloRows + mBandRows - 1) / mBandRows;
+    const int sourceSlots = kBandsInFlight + 1 + 2 * reachBands;
+    const int targetSlots = kBandsInFlight + 1;
+    if (mTiles.source == nullptr) {
+        if (sourceSlots < bands && mSource.useBandRing(mBandRows, sourceSlots))
+            mSourceSlots = sourceSlots;
+        if (targetSlots < bands && mTarget.useBandRing(mBandRows, targetSlots))
+            mTargetSlots = targetSlots;
+    }
     std::thread decoder([this, reader] {
         pthread_setname_np(pthread_self(), "kiv-decode");
         decode(reader);

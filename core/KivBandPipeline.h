@@ -16,6 +16,11 @@
 //   GL thread:       per band, once its source rows are there: draw, finish
 //   encoder thread:  rows of the target -> writer, then their memory goes
 //
+// Where the pictures can, they keep a ring of a few bands' memory instead
+// (EglSharedPicture::useBandRing): a band takes the memory of one no stage
+// uses any more, so that after the first bands nothing is allocated, zeroed
+// or given back.
+//
 // A picture wider or taller than a texture keeps its rows in CPU memory
 // (KivRowStore) and each band is drawn in column tiles: the tile and the rows
 // and columns it reads around it are copied into a tile-sized source, drawn
@@ -75,8 +80,9 @@ public:
     // VC_ERROR_ALLOC_FAILED without memory for a band.
     int run(VCStreamReader* reader, VCStreamWriter* writer);
 
-    // Rows per drawn band for a picture `width` pixels wide: about four
-    // megabytes of RGBA, in whole llvmpipe tiles (64 rows).
+    // Rows per drawn band for a picture `width` pixels wide: about a
+    // megabyte of RGBA (each picture keeps a few bands on each side of GL,
+    // counted twice in resident memory), in whole llvmpipe tiles (64 rows).
     static int bandRows(int width);
     // For tests: bands of `rows` rows (a multiple of 64) whatever the width;
     // 0 goes back to bandRows().
@@ -107,6 +113,10 @@ private:
     // rows are padded).
     std::vector<unsigned char> mNv21;
     std::vector<unsigned char> mRgba;
+
+    // Bands of memory the source and target keep in turns; 0 without a ring.
+    int mSourceSlots = 0;
+    int mTargetSlots = 0;
 
     std::mutex mLock;
     std::condition_variable mChanged;

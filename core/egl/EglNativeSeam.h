@@ -38,6 +38,22 @@ public:
     // Rows [0, y) will not be used again: their memory may be given back
     // (they then read as zeros).
     virtual void discardRowsBelow(int y) = 0;
+    // For rows used once from top to bottom: only `slots` bands of
+    // `bandRows` rows hold memory, which they take in turns, so that a large
+    // picture neither allocates nor gives back memory band after band.
+    // False where the picture cannot (rows are then discarded as usual).
+    virtual bool useBandRing(int bandRows, int slots) {
+        (void)bandRows;
+        (void)slots;
+        return false;
+    }
+    // With a ring, before any row of band `band` is touched: band
+    // `band - slots`, which nobody may use any more, gives it its memory
+    // (and reads as zeros after). False when the memory could not move.
+    virtual bool takeBand(int band) {
+        (void)band;
+        return false;
+    }
 };
 
 class EglNativeSeam {

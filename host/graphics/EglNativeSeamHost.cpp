@@ -53,6 +53,10 @@ public:
     unsigned char* row(int y) const override { return mPixels.pixels() + (size_t)y * pitch(); }
     size_t pitch() const override { return android::SharedPixels::rowPitch(mPixels.width()); }
     void discardRowsBelow(int y) override { mPixels.discardBelow((size_t)y * pitch()); }
+    bool useBandRing(int bandRows, int slots) override {
+        return mPixels.useRing((size_t)bandRows * pitch(), slots);
+    }
+    bool takeBand(int band) override { return mPixels.takePart(band); }
 
 private:
     android::SharedPixels mPixels;

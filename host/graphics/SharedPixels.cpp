@@ -2,10 +2,14 @@
 
 #include <fcntl.h>
 #include <linux/falloc.h>
+#include <stdio.h>
 #include <string.h>
 #include <sys/mman.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 
 #include "core/egl/EglExtensions.h"
@@ -127,7 +131,8 @@ bool SharedPixels::allocate(uint32_t width, uint32_t height) {
 }
 
 void SharedPixels::discardBelow(size_t bytes) {
-    if (mPixels == nullptr) return;
+    // A ring keeps its memory; the file under it holds none.
+    if (mPixels == nullptr || mRingFd >= 0) return;
     const size_t page = (size_t)sysconf(_SC_PAGESIZE);
     const size_t start = (size_t)(mPixels - static_cast<unsigned char*>(mMapping));
     // Pixels start on a page; only pages wholly below the point go.
@@ -139,9 +144,85 @@ void SharedPixels::discardBelow(size_t bytes) {
     }
 }
 
+// llvmpipe maps an imported file once, whole, for as long as the import
+// lives: the one other mapping of our file from its start at its full size.
+unsigned char* SharedPixels::findDriverPixels() const {
+    struct stat st;
+    if (fstat(mFd, &st) != 0) return nullptr;
+    FILE* maps = fopen("/proc/self/maps", "re");
+    if (maps == nullptr) return nullptr;
+    unsigned char* found = nullptr;
+    int count = 0;
+    char line[512];
+    while (fgets(line, sizeof(line), maps) != nullptr) {
+        unsigned long start = 0, end = 0, offset = 0, inode = 0;
+        unsigned int major = 0, minor = 0;
+        if (sscanf(line, "%lx-%lx %*s %lx %x:%x %lu", &start, &end, &offset, &major, &minor,
+                   &inode) != 6 ||
+            inode != st.st_ino || makedev(major, minor) != st.st_dev || offset != 0 ||
+            end - start != mFileSize || (void*)start == mMapping) {
+            continue;
+        }
+        found = (unsigned char*)start + (mPixels - static_cast<unsigned char*>(mMapping));
+        ++count;
+    }
+    fclose(maps);
+    return count == 1 ? found : nullptr;
+}
+
+bool SharedPixels::mapPart(unsigned char* base, int k, int fd, size_t offset, bool populate) const {
+    const size_t first = (size_t)k * mPartBytes;
+    const size_t end = (size_t)(static_cast<unsigned char*>(mMapping) + mFileSize - mPixels);
+    if (first >= end) return true;
+    const size_t length = std::min(mPartBytes, end - first);
+    return mmap(base + first, length, PROT_READ | PROT_WRITE,
+                MAP_SHARED | MAP_FIXED | (populate ? MAP_POPULATE : 0), fd,
+                (off_t)offset) != MAP_FAILED;
+}
+
+bool SharedPixels::useRing(size_t partBytes, int slots) {
+    const size_t page = (size_t)sysconf(_SC_PAGESIZE);
+    if (mPixels == nullptr || mRingFd >= 0 || partBytes == 0 || partBytes % page != 0 ||
+        slots < 1) {
+        return false;
+    }
+    mDriverPixels = findDriverPixels();
+    if (mDriverPixels == nullptr) return false;
+    int fd = memfd_create("kiv-graphic-buffer-ring", MFD_CLOEXEC);
+    if (fd < 0 || ftruncate(fd, (off_t)(partBytes * slots)) != 0) {
+        if (fd >= 0) close(fd);
+        mDriverPixels = nullptr;
+        return false;
+    }
+    mRingFd = fd;
+    mPartBytes = partBytes;
+    mSlots = slots;
+    return true;
+}
+
+bool SharedPixels::takePart(int k) {
+    if (mRingFd < 0 || k < 0) return false;
+    const size_t pixelStart = (size_t)(mPixels - static_cast<unsigned char*>(mMapping));
+    const size_t slot = (size_t)(k % mSlots) * mPartBytes;
+    bool ok = true;
+    for (unsigned char* base : {mPixels, mDriverPixels}) {
+        // The part before gets its own (never written) pages back: zeros.
+        const int before = k - mSlots;
+        if (before >= 0)
+            ok = mapPart(base, before, mFd, pixelStart + (size_t)before * mPartBytes, false) && ok;
+        ok = mapPart(base, k, mRingFd, slot, true) && ok;
+    }
+    return ok;
+}
+
 void SharedPixels::free() {
     if (mMapping != nullptr) munmap(mMapping, mFileSize);
     if (mFd >= 0) close(mFd);
+    if (mRingFd >= 0) close(mRingFd);
+    mRingFd = -1;
+    mPartBytes = 0;
+    mSlots = 0;
+    mDriverPixels = nullptr;
     mFd = -1;
     mMapping = nullptr;
     mFileSize = 0;

@@ -37,6 +37,20 @@ public:
     // less far than an earlier one does nothing.
     void discardBelow(size_t bytes);
 
+    // After importTexture, for pixels written and read once in order: part k
+    // of the pixels (`partBytes` bytes from k * partBytes, whole pages) lives
+    // in slot k % slots of a ring that stays in memory, so that going through
+    // a large picture neither allocates, zeroes nor gives back memory. The
+    // CPU's mapping and the driver's (found among the process's mappings)
+    // are both moved. False when the driver's mapping cannot be found
+    // (nothing changes).
+    bool useRing(size_t partBytes, int slots);
+    // Before part k is touched: it takes its slot, and the part that held the
+    // slot before (k - slots) reads as zeros from then on. The caller makes
+    // sure nobody uses that part any more, nor part k yet.
+    bool takePart(int k);
+    bool ringInUse() const { return mRingFd >= 0; }
+
     // With a context current: an RGBA texture whose storage is this memory,
     // left bound; 0 when the driver does not take it
     // (tried once per process on a small texture first, whose rows must land
@@ -59,8 +73,16 @@ private:
     GLuint import(GLuint* memoryObject) const;
     static bool probe();
 
+    // Maps part k of the pixels at `base` onto `fd` at `offset`.
+    bool mapPart(unsigned char* base, int k, int fd, size_t offset, bool populate) const;
+    unsigned char* findDriverPixels() const;
+
     size_t mDiscarded = 0;  // pixel bytes given back so far (whole pages)
     int mFd = -1;
+    int mRingFd = -1;
+    size_t mPartBytes = 0;
+    int mSlots = 0;
+    unsigned char* mDriverPixels = nullptr;  // the driver's mapping of mPixels
     void* mMapping = nullptr;
     size_t mFileSize = 0;
     unsigned char* mPixels = nullptr;

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
+#include "core/egl/EglNativeSeam.h"
 #include "core/egl/HalPixelFormat.h"
 #include "core/egl/EglWindowSurface.h"
 #include "graphic_buffer_usage.h"
@@ -303,6 +304,70 @@ TEST_F(GraphicBufferSyncTest, RgbaRowsLaidOutAsTheDriversShareOneStorage) {
     GlBufferView narrowView(display(), narrow);
     ASSERT_TRUE(narrowView.ok());
     EXPECT_FALSE(Seam::sharesGpuStorage(narrow));
+}
+
+// A streamed picture's bands taking turns in a ring of two: through every
+// band the GPU sees what the CPU wrote there (and the CPU what the GPU drew),
+// the band before keeps its rows, and the band that handed its memory on
+// reads as zeros on both sides. Sizes whose bands are not whole pages have
+// no ring.
+TEST_F(GraphicBufferSyncTest, SharedPictureBandsTakeTurnsInARing) {
+    const int w = 64, bandRows = 64, bands = 5, h = bandRows * bands - 8;
+    std::unique_ptr<EglSharedPicture> picture = EglNativeSeam::get().createSharedPicture(w, h);
+    ASSERT_NE(picture, nullptr);
+    EXPECT_FALSE(picture->takeBand(0));
+    EXPECT_FALSE(picture->useBandRing(3, 2));
+    ASSERT_TRUE(picture->useBandRing(bandRows, 2));
+    GlTarget target;
+    ASSERT_TRUE(GlTest_makeTarget(1, 1, &target));
+    glFramebufferTexture2D(GL_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_TEXTURE_2D, picture->texture(),
+                           0);
+    ASSERT_EQ(glCheckFramebufferStatus(GL_FRAMEBUFFER), (GLenum)GL_FRAMEBUFFER_COMPLETE);
+    const size_t rowBytes = w * 4;
+    auto rowsIn = [&](int band) { return std::min(bandRows, h - band * bandRows); };
+    // What the CPU writes into a band (zeros for -1).
+    auto pattern = [&](int band, int seed) {
+        std::vector<uint8_t> pixels(rowsIn(band) * rowBytes);
+        for (size_t i = 0; seed >= 0 && i < pixels.size(); ++i)
+            pixels[i] = (uint8_t)(seed + i / rowBytes * 3 + i % 7);
+        return pixels;
+    };
+    auto slice = [&](const std::vector<uint8_t>& picture, int band) {
+        auto first = picture.begin() + band * bandRows * rowBytes;
+        return std::vector<uint8_t>(first, first + rowsIn(band) * rowBytes);
+    };
+    auto cpuRows = [&](int band) {
+        std::vector<uint8_t> got;
+        for (int y = band * bandRows; y < band * bandRows + rowsIn(band); ++y)
+            got.insert(got.end(), picture->row(y), picture->row(y) + rowBytes);
+        return got;
+    };
+    for (int band = 0; band < bands; ++band) {
+        ASSERT_TRUE(picture->takeBand(band)) << band;
+        const std::vector<uint8_t> rows = pattern(band, band * 40);
+        for (int y = 0; y < rowsIn(band); ++y)
+            memcpy(picture->row(band * bandRows + y), &rows[y * rowBytes], rowBytes);
+        const std::vector<uint8_t> seen = GlTest_readPixels(w, h);
+        EXPECT_EQ(slice(seen, band), rows) << band;
+        if (band < 1) continue;
+        EXPECT_EQ(slice(seen, band - 1), pattern(band - 1, (band - 1) * 40)) << band;
+        if (band < 2) continue;
+        EXPECT_EQ(slice(seen, band - 2), pattern(band - 2, -1)) << band;
+        EXPECT_EQ(cpuRows(band - 2), pattern(band - 2, -1)) << band;
+    }
+    // The GPU's rendering into the last band reaches the CPU.
+    glEnable(GL_SCISSOR_TEST);
+    glScissor(0, (bands - 1) * bandRows, w, h - (bands - 1) * bandRows);
+    glClearColor(1, 0, 0, 1);
+    glClear(GL_COLOR_BUFFER_BIT);
+    glDisable(GL_SCISSOR_TEST);
+    glFinish();
+    std::vector<uint8_t> red(rowsIn(bands - 1) * rowBytes);
+    for (size_t i = 0; i < red.size(); ++i) red[i] = i % 4 == 0 || i % 4 == 3 ? 255 : 0;
+    EXPECT_EQ(cpuRows(bands - 1), red);
+    EXPECT_EQ(glGetError(), (GLenum)GL_NO_ERROR);
+    GlTest_deleteTarget(&target);
+    picture.reset();
 }
 
 // Work flushed by one thread is complete for a lock on another thread without
