@@ -111,6 +111,14 @@ bool AtomicFile::open(const std::string& path, std::string* error) {
 bool AtomicFile::write(const unsigned char* bytes, size_t length) {
     if (mFd < 0 || mReason != 0) return false;
     if (!writeAll(mFd, bytes, length)) mReason = errno;
+    mWritten += length;
+    // The disk starts on what is written while the rest is still being
+    // made, so that the sync at the end waits only for the last of it.
+    if (mReason == 0 && mWritten - mSyncStarted >= kSyncChunk) {
+        sync_file_range(mFd, (off_t)mSyncStarted, (off_t)(mWritten - mSyncStarted),
+                        SYNC_FILE_RANGE_WRITE);
+        mSyncStarted = mWritten;
+    }
     return mReason == 0;
 }
 

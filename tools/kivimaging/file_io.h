@@ -44,6 +44,9 @@ private:
     std::string mPath, mFolder, mTemporary;
     int mFd = -1;
     int mReason = 0;  // the first write's failure (errno)
+    static constexpr size_t kSyncChunk = 1 << 20;
+    size_t mWritten = 0;
+    size_t mSyncStarted = 0;  // bytes handed to the disk so far
 };
 
 // Whether two paths name the same existing file (hard links and symbolic
