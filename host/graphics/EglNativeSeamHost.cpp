@@ -121,7 +121,10 @@ public:
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: swap of a surface that is not current");
             return EGL_FALSE;
         }
-        std::vector<unsigned char> frame((size_t)target.width * target.height * 4);
+        // Kept by the thread that swaps: a fresh frame every swap costs a
+        // page fault a page.
+        thread_local std::vector<unsigned char> frame;
+        frame.resize((size_t)target.width * target.height * 4);
         GLint framebuffer = 0;
         GLint alignment = 4;
         glGetIntegerv(GL_FRAMEBUFFER_BINDING, &framebuffer);

@@ -127,16 +127,28 @@ void GraphicBuffer::onEglImageDestroyed() {
 status_t GraphicBuffer::writeRgbaFrame(const unsigned char* rgba, uint32_t frameWidth,
                                        uint32_t frameHeight, bool bottomUp) {
     if (rgba == nullptr) return BAD_VALUE;
-    void* ignored = nullptr;
-    status_t status = lock(USAGE_SW_READ_OFTEN | USAGE_SW_WRITE_OFTEN, &ignored);
-    if (status != NO_ERROR) return status;
     const size_t w = (size_t)width, h = (size_t)height;
+    const bool covers = frameWidth >= w && frameHeight >= h;
+    void* ignored = nullptr;
+    // A frame that covers the buffer needs none of its old pixels.
+    status_t status =
+        lock(covers ? USAGE_SW_WRITE_OFTEN : USAGE_SW_READ_OFTEN | USAGE_SW_WRITE_OFTEN, &ignored);
+    if (status != NO_ERROR) return status;
+    const PixelRows memory = GraphicBufferMapper::rowsOf(*mStorage);
+    if (covers && memory.fourcc == VC_FORMAT_RGBA) {
+        // Straight into the buffer's rows: a swap pays one copy, not a
+        // fresh picture and a move (every preview and recorded frame).
+        for (size_t row = 0; row < h; ++row) {
+            const size_t source = bottomUp ? frameHeight - 1 - row : row;
+            memcpy(memory.data + row * (size_t)memory.rowPixels * 4, rgba + source * frameWidth * 4,
+                   w * 4);
+        }
+        return unlock();
+    }
     std::vector<unsigned char> full(w * h * 4), scratch[2];
     const PixelRows picture = {full.data(), VC_FORMAT_RGBA, width, height, width};
-    const PixelRows memory = GraphicBufferMapper::rowsOf(*mStorage);
     // What the frame does not cover keeps the buffer's pixels.
-    bool ok = (frameWidth >= w && frameHeight >= h) ||
-              GraphicBufferMapper::move(memory, picture, scratch);
+    bool ok = covers || GraphicBufferMapper::move(memory, picture, scratch);
     const size_t rows = std::min<size_t>(frameHeight, h),
                  bytes = std::min<size_t>(frameWidth, w) * 4;
     for (size_t row = 0; ok && row < rows; ++row) {
