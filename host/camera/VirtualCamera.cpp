@@ -8,6 +8,7 @@
 #include <utils/Errors.h>
 
 #include "core/egl/EglClock.h"
+#include "kivhost/BackgroundThread.h"
 #include "vccore/vc_log.h"
 
 namespace kivhost {
@@ -145,6 +146,7 @@ void VirtualCamera::run(double fps) {
     const auto period =
         std::chrono::duration_cast<Clock::duration>(std::chrono::duration<double>(1.0 / fps));
     auto next = Clock::now();
+    BackgroundThread_enter();
     std::unique_lock<std::mutex> lock(mLock);
     while (!mStop) {
         if (mBurst > 0) {

@@ -17,6 +17,7 @@ extern "C" {}
 
 #include "HostVideoLibrary.h"
 #include "core/egl/HalPixelFormat.h"
+#include "kivhost/BackgroundThread.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_log.h"
@@ -178,7 +179,13 @@ int VideoEncoder::start() {
         s.closed = true;  // nothing to finish
         return VC_REPORT(VC_ERROR_UNSUPPORTED);
     }
-    const int opened = s.writer->open(mPath, mSettings);
+    // libx264 starts its own threads as it opens; opened from a background
+    // thread, they are background threads too.
+    int opened = 0;
+    std::thread([&] {
+        BackgroundThread_enter();
+        opened = s.writer->open(mPath, mSettings);
+    }).join();
     if (opened != 0) {
         s.closed = true;  // nothing to finish
         return opened;
@@ -303,6 +310,7 @@ bool VideoEncoder::takeFrame() {
 
 void VideoEncoder::intakeLoop() {
     State& s = *mState;
+    BackgroundThread_enter();
     auto closing = [&] {
         std::lock_guard<std::mutex> guard(s.lock);
         return s.closing;
@@ -332,6 +340,7 @@ void VideoEncoder::intakeLoop() {
 
 void VideoEncoder::encodeLoop() {
     State& s = *mState;
+    BackgroundThread_enter();
     for (;;) {
         State::Job job;
         {
