@@ -7,6 +7,9 @@
 
 #include <memory>
 
+#include <gui/BufferItemConsumer.h>
+#include <gui/BufferQueue.h>
+
 #include "core/KivImaging.h"
 #include "host/media/VideoEncoderTestSeam.h"
 #include "kivhost/VideoEncoder.h"
@@ -220,7 +223,7 @@ TEST_F(RecordingTest, ANewProducerWhileRecordingTakesOverOnTheNextFrame) {
 
 // A recording that fails ends, its GL side goes the frame after, the
 // preview goes on, and recording again into a new encoder works.
-enum Ending { ENCODER_CLOSED, MAKE_CURRENT_FAILED };
+enum Ending { ENCODER_CLOSED, MAKE_CURRENT_FAILED, SWAP_FAILED };
 
 class RecordingEndTest : public RecordingTest, public ::testing::WithParamInterface<Ending> {};
 
@@ -228,15 +231,30 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
     LivePreview live;
     ASSERT_NO_FATAL_FAILURE(start(live));
     // A size of its own, so that its surface is the one a fault can pick.
-    ASSERT_NO_FATAL_FAILURE(openEncoder(kW / 2, kH / 2));
-    ASSERT_EQ(live.manager->setRecordingSurface(encoder->getProducer()), 0);
+    const int w = kW / 2, h = kH / 2;
+    android::sp<android::IGraphicBufferProducer> target;
+    android::sp<android::BufferItemConsumer> stuck;
+    if (GetParam() == SWAP_FAILED) {
+        // A consumer that takes nothing and a producer that may not wait:
+        // once the queue's three slots hold frames, a swap finds no buffer.
+        android::sp<android::IGraphicBufferConsumer> consumer;
+        android::BufferQueue::createBufferQueue(&target, &consumer);
+        consumer->setDefaultBufferSize(w, h);
+        ASSERT_EQ(target->setDequeueTimeout(0), android::NO_ERROR);
+        stuck = new android::BufferItemConsumer(consumer, 0);
+    } else {
+        ASSERT_NO_FATAL_FAILURE(openEncoder(w, h));
+        target = encoder->getProducer();
+    }
+    auto queued = [&] { return stuck != nullptr ? stuck->getQueueStats().queued : recorded(); };
+    ASSERT_EQ(live.manager->setRecordingSurface(target), 0);
     for (int i = 0; i < 4; ++i) ASSERT_NO_FATAL_FAILURE(step(live));
-    ASSERT_EQ(recorded(), 3u);
+    ASSERT_EQ(queued(), 3u);
     log.clear();
     if (GetParam() == ENCODER_CLOSED) {
         EXPECT_EQ(encoder->close(), 0);
-    } else {
-        GlFault_failMakeCurrents(1, kW / 2, kH / 2);
+    } else if (GetParam() == MAKE_CURRENT_FAILED) {
+        GlFault_failMakeCurrents(1, w, h);
     }
     const uint64_t shown = live.framesShown();
     ASSERT_NO_FATAL_FAILURE(step(live));  // the recording ends
@@ -247,6 +265,15 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
         EXPECT_TRUE(
             log.matches({"W EGL: The recording surface has most likely been deleted "
                          "(NO_INIT). Stopping record."}));
+    } else if (GetParam() == SWAP_FAILED) {
+        EXPECT_TRUE(log.matches({
+            "E EglNativeSeam: no buffer to swap into",
+            "E EGL Error: 0x3000 'EGL_SUCCESS' - eglSwapBuffers(display, mEglSurface) at "
+            "core/egl/EglWindowSurface:#",
+            "E VC_ERROR_UNKNOWN (-1): core/egl/EglWindowSurface:#",
+            "E EGL: Call to eglSwapBuffers() failed [recording]",
+            "E VC_ERROR_UNKNOWN (-1): core/egl/OpenGLManager:#",
+        }));
     } else {
         EXPECT_TRUE(log.matches({
             "E EGL Error: 0x300d 'EGL_BAD_SURFACE' - result = eglMakeCurrent(display, "
@@ -256,7 +283,7 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
             "E EGL: It looks like the SurfaceTexture was abandonned. Stopping record.",
         }));
     }
-    EXPECT_EQ(recorded(), 3u);
+    EXPECT_EQ(queued(), 3u);
     EXPECT_EQ(live.framesShown(), shown + 3);
     const std::vector<uint8_t> frame = live.latestFrame();
     ASSERT_FALSE(frame.empty());
@@ -275,7 +302,7 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Endings, RecordingEndTest,
-                         ::testing::Values(ENCODER_CLOSED, MAKE_CURRENT_FAILED));
+                         ::testing::Values(ENCODER_CLOSED, MAKE_CURRENT_FAILED, SWAP_FAILED));
 
 // Start and stop many times with the pipeline running: nothing leaks (the
 // sanitizer builds check) and each recording holds its own frames.

@@ -141,26 +141,53 @@ TEST_F(ManagerTest, RequestedRenderComes16MsAfterTheLastOneBegan) {
     live.release();
 }
 
-TEST_F(ManagerTest, RequestRenderDuringTheFirstTenFramesIsIgnored) {
+// requestRender() changes nothing during the first ten frames (the
+// initialising one waits for the camera's first frame, which a request would
+// end) nor while recording (the pacing wait runs its whole period).
+class IgnoredRequestTest : public ManagerTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(IgnoredRequestTest, RequestRenderChangesNothing) {
+    const bool recording = GetParam();
     LivePreview live;
-    ASSERT_NO_FATAL_FAILURE(start(live, false));
-    // The initialising frame waits for the camera's first frame; a request
-    // now would end that wait (the camera windows are woken too).
-    ASSERT_TRUE(clock.waitForWaiters(1));
+    android::sp<android::HostWindow> recorder = new android::HostWindow(kW, kH);
+    if (recording) {
+        ASSERT_NO_FATAL_FAILURE(start(live));
+        ASSERT_EQ(live.manager->setRecordingSurface(recorder->getIGraphicBufferProducer()), 0);
+        ASSERT_NO_FATAL_FAILURE(step(live));  // the recording surface is built
+        ASSERT_NO_FATAL_FAILURE(step(live));
+        ASSERT_EQ(recorder->queuedTotal(), 1u);
+        ASSERT_EQ(live.camera[0]->queueFrame(), 0);
+        clock.advanceMs(5);
+    } else {
+        ASSERT_NO_FATAL_FAILURE(start(live, false));
+        ASSERT_TRUE(clock.waitForWaiters(1));
+    }
+    const size_t waits = clock.waitsBegun();
+    const uint64_t shown = live.framesShown();
     live.manager->requestRender();
     // Proving that nothing happens takes a while of real time: a fifth of a
-    // second is far more than an honoured request needs to show a frame.
+    // second is far more than an honoured request needs to end the wait.
     for (int i = 0; i < 200; ++i) {
-        ASSERT_EQ(live.framesShown(), 0u);
+        ASSERT_EQ(clock.waitsBegun(), waits);
+        ASSERT_EQ(live.framesShown(), shown);
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
-    EXPECT_EQ(clock.waiters(), 1u);
-    ASSERT_EQ(live.camera[0]->queueFrame(), 0);
-    ASSERT_TRUE(clock.waitForWaitsBegun(2));
-    EXPECT_EQ(live.framesShown(), 11u);
-    EXPECT_EQ(frameNumber(live.latestFrame()), 0);
+    if (recording) {
+        clock.advanceMs(35);  // 40 ms into the period: still waiting
+        EXPECT_EQ(clock.waitsBegun(), waits);
+        clock.advanceMs(1);
+        ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
+        EXPECT_EQ(recorder->queuedTotal(), 2u);
+    } else {
+        ASSERT_EQ(live.camera[0]->queueFrame(), 0);
+        ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
+        EXPECT_EQ(frameNumber(live.latestFrame()), 0);
+    }
+    EXPECT_EQ(live.framesShown(), recording ? shown + 1 : 11u);
     live.release();
 }
+
+INSTANTIATE_TEST_SUITE_P(WhileUnpacedOrRecording, IgnoredRequestTest, ::testing::Bool());
 
 TEST_F(ManagerTest, StoppedPreviewKeepsLatchingButShowsNothing) {
     LivePreview live;
