@@ -5,6 +5,7 @@
 #include <regex>
 
 #include "cli_fixture.h"
+#include "kivhost/VirtualCamera.h"
 #include "support/camera_frames.h"
 #include "support/look_reference.h"
 #include "support/video_files.h"
@@ -59,6 +60,28 @@ TEST_F(CliLiveTest, AVideoFilePlaysThroughTheEffectIntoARecording) {
     }
 }
 
+// The intermediate-image mode: a preview taller than 1080 rows is drawn at
+// 1080 rows (width ceil(96 * 1080 / 1200)) and scaled up; the recording keeps
+// the asked size and shows the effect over the camera's frame (the upscale
+// of 87 columns to 96 costs detail: 24 dB PSNR instead of 28).
+TEST_F(CliLiveTest, IntermediateModeDrawsTallSizesAt1080Rows) {
+    const int w = 96, h = 1200;
+    const CliResult r = run({"live", "--mode", "fbo", "--size", "96x1200", "-e", "Sepia",
+                             "--frames", "14", "--record", path("rec.mp4"), "-v"});
+    ASSERT_EQ(r.status, 0) << r.err;
+    EXPECT_NE(r.err.find("bool OpenGLManager::initializeRecordingFBO() : 87 x 1080"),
+              std::string::npos);
+    DecodedVideo video;
+    ASSERT_TRUE(VideoFiles_decode(path("rec.mp4"), &video));
+    EXPECT_EQ(std::make_pair(video.width, video.height), std::make_pair(w, h));
+    ASSERT_FALSE(video.rgba.empty());
+    const std::vector<uint8_t>& last = video.rgba.back();
+    const int64_t n = kivhost::VirtualCamera_decodeFrameNumber(last.data(), w, h, false);
+    ASSERT_GE(n, 0);
+    const lookref::Picture camera(w, h, CameraFrames_rgba(n, w, h));
+    EXPECT_GE(VideoFiles_psnr(last, lookref::render(kSepia, camera, nullptr), 4), 24.0);
+}
+
 TEST_F(CliLiveTest, PreviewPicturesAPictureAndASnapshot) {
     const CliResult r = run({"live", "--size", "96x64", "--frames", "20", "--preview",
                              path("frames"), "--picture-at", "13", "-o", path("pic.jpg"),
@@ -102,6 +125,7 @@ TEST_F(CliLiveTest, RefusedArguments) {
         {{"--picture-at", "3"}, 2, "--picture-at needs -o FILE after it"},
         {{"--snapshot-at", "3", "-o", "x.bmp"}, 2, "'x.bmp' must end in .png, .jpg or .jpeg"},
         {{"-e", "NoSuchEffect"}, 2, "NoSuchEffect"},
+        {{"--mode", "2"}, 2, "--mode must be direct or fbo"},
         {{"--record", "/nonexistent/out.mp4"},
          1,
          "kivimaging: cannot write the recording '/nonexistent/out.mp4'"},

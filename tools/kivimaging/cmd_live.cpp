@@ -42,7 +42,7 @@ const char kHelp[] =
     "Usage: kivimaging live [-e EFFECT] [-p PARAMETERS] [--camera bars|FOLDER|VIDEO]\n"
     "         [--size WxH] [--fps N] [--frames N | --seconds S] [--record OUT.mp4]\n"
     "         [--record-interval MS] [--preview OUT.mp4|DIR] [--picture-at N -o PICTURE.jpg]\n"
-    "         [--snapshot-at N -o SNAP.png] [--switch-every N]\n"
+    "         [--snapshot-at N -o SNAP.png] [--switch-every N] [--mode direct|fbo]\n"
     "\n"
     "Runs the live pipeline: a virtual camera feeds the render manager, which\n"
     "draws the effect into a preview at about 24 frames a second.\n"
@@ -63,6 +63,11 @@ const char kHelp[] =
     "                           through the effect (.jpg or .png)\n"
     "  --snapshot-at N -o FILE  at rendered frame N, a snapshot of the preview\n"
     "  --switch-every N         move on to the next effect every N rendered frames\n"
+    "  --mode direct|fbo        draw the effect straight into the preview (the\n"
+    "                           default), or into an intermediate image that is\n"
+    "                           copied to the preview and the recording; that image\n"
+    "                           has at most 1080 rows (taller sizes are drawn at\n"
+    "                           1080 rows and scaled up; the recording keeps --size)\n"
     "  -v, --verbose            show the library's log on standard error\n"
     "\n"
     "At the end it prints: frames: R rendered, D dropped; interval p50 X ms, p99 Y ms;\n"
@@ -77,7 +82,7 @@ const OptionSpec kOptions[] = {
     {0, "fps", true},         {0, "frames", true},          {0, "seconds", true},
     {0, "record", true},      {0, "record-interval", true}, {0, "preview", true},
     {0, "picture-at", true},  {0, "snapshot-at", true},     {0, "switch-every", true},
-    {0, "picture-out", true}, {0, "snapshot-out", true},
+    {0, "picture-out", true}, {0, "snapshot-out", true},    {0, "mode", true},
 };
 
 // The unpaced frames the manager draws at start-up.
@@ -176,6 +181,7 @@ struct Options {
     int pictureAt = 0, snapshotAt = 0;
     std::string pictureOut, snapshotOut;
     int switchEvery = 0;
+    OpenGLManagerMode mode = OPENGL_MANAGER_DIRECT;
 };
 
 int parseOptions(const ParsedArgs& args, Options* o) {
@@ -234,6 +240,11 @@ int parseOptions(const ParsedArgs& args, Options* o) {
     if (args.has("switch-every") &&
         !parseInt(args.get("switch-every"), 1, 10000000, &o->switchEvery)) {
         return bad("--switch-every must be a number from 1");
+    }
+    if (args.has("mode")) {
+        const std::string mode = args.get("mode");
+        if (mode != "direct" && mode != "fbo") return bad("--mode must be direct or fbo");
+        o->mode = mode == "fbo" ? OPENGL_MANAGER_INTERMEDIATE : OPENGL_MANAGER_DIRECT;
     }
     return kExitOk;
 }
@@ -402,7 +413,7 @@ int cmdLive(int argc, char** argv) {
 
     kivhost::VirtualCamera camera(std::move(source), o.width, o.height);
     sp<android::HostWindow> preview = new android::HostWindow(o.width, o.height);
-    sp<OpenGLManager> manager = new OpenGLManager(OPENGL_MANAGER_DIRECT, DISPLAY_DEVICE_GPU);
+    sp<OpenGLManager> manager = new OpenGLManager(o.mode, DISPLAY_DEVICE_GPU);
     manager->setCameraSize(o.width, o.height, 0, 0);
     manager->setPreviewWindow(preview, CAMERA_LAYOUT_SINGLE);
     manager->setFilter(&effects[0]->imaging);
