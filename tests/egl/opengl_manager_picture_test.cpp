@@ -44,10 +44,6 @@ ImagePtr picture(uint64_t index, int w, int h, bool data = true) {
     return image;
 }
 
-int64_t frameNumber(const std::vector<uint8_t>& rgba) {
-    return LivePreview_frameNumber(rgba, kW, kH);
-}
-
 class PictureTest : public ::testing::Test {
 protected:
     // Asks for a capture and runs the frame that serves it; true once the
@@ -137,7 +133,7 @@ TEST_P(ScreenCaptureTest, IsTheRenderedEffect) {
     ASSERT_EQ(f.height, kH);
     const std::vector<uint8_t> shown = live.latestFrame();
     // The frame latched for that render: the camera's third.
-    ASSERT_EQ(frameNumber(shown), 2);
+    ASSERT_EQ(LivePreview_frameNumber(shown), 2);
     lookref::expectLook(401, lookref::Picture(kW, kH, CameraFrames_rgba(2, kW, kH)),
                         screenshot ? f.bytes.data() : LivePreview_flipRows(f.bytes, kW, kH).data(),
                         screenshot ? "screenshot" : "snapshot");
@@ -210,7 +206,7 @@ TEST_F(PictureTest, PicturesStayUntilTheNextAcceptedHandOver) {
     ASSERT_TRUE(capture(live, CAPTURE_PICTURE));
     ASSERT_EQ(got.frames().size(), 2u);
     for (const CollectedFrame& f : got.frames()) {
-        EXPECT_EQ(frameNumber(f.bytes), 3);
+        EXPECT_EQ(LivePreview_frameNumber(f.bytes), 3);
     }
     live.release();
     EXPECT_EQ(
@@ -253,7 +249,7 @@ protected:
         if ((feed0 && live->camera[0]->queueFrame() != 0) ||
             (feed1 && live->camera[1]->queueFrame() != 0))
             return -3;
-        return live->step(clock, 41, false) ? frameNumber(live->latestFrame()) : -2;
+        return live->step(clock, 41, false) ? LivePreview_frameNumber(live->latestFrame()) : -2;
     }
     std::unique_ptr<LivePreview> live;
     SecondCamera secondLook;
@@ -335,7 +331,7 @@ TEST_F(DualTest, PicturesOfTwoCamerasWithoutDataAreTheCamerasFrames) {
     ASSERT_TRUE(capture(*live, CAPTURE_PICTURE));
     ASSERT_EQ(got.frames().size(), 1u);
     // The look shows camera 1, two frames ahead: frame 3 for that render.
-    EXPECT_EQ(frameNumber(got.frames()[0].bytes), 3);
+    EXPECT_EQ(LivePreview_frameNumber(got.frames()[0].bytes), 3);
     EXPECT_EQ(log.count("The first picture has no data. Using preview dimensions and data: 64x48"),
               1u);
     EXPECT_EQ(log.count("The second picture has no data. Using preview dimensions and data: 64x48"),

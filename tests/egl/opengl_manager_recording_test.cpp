@@ -37,12 +37,6 @@ const double kMinPsnr = 28.0;
 
 using kivhost::VideoEncoder;
 
-struct Effect {
-    explicit Effect(int id) : imaging(KivImaging_create(id, nullptr)) {}
-    ~Effect() { KivImaging_destroy(imaging.getFilter()); }
-    KivImaging imaging;
-};
-
 class RecordingTest : public ::testing::Test {
 public:
     void start(LivePreview& live) {
@@ -105,7 +99,7 @@ TEST_P(RecordingModeTest, EveryFrameIsRecordedAsTheEffectOverItsCameraFrame) {
     LivePreviewSetup setup;
     setup.mode = GetParam();
     LivePreview live(setup);
-    Effect sepia(kSepia);
+    LivePreviewEffect sepia(kSepia);
     live.manager->setFilter(&sepia.imaging);
     ASSERT_NO_FATAL_FAILURE(start(live));
     ASSERT_NO_FATAL_FAILURE(openEncoder());
@@ -166,8 +160,7 @@ TEST_F(RecordingTest, MotionRecordsOneFrameForEachRequestThenNone) {
     // Frames 2, 3 and 4 (the first after the GL side was built), then 9.
     const int64_t frames[] = {2, 3, 4, 9};
     for (int i = 0; i < 4; ++i) {
-        EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[i].data(), kW, kH, false),
-                  frames[i]);
+        EXPECT_EQ(LivePreview_frameNumber(video.rgba[i]), frames[i]);
     }
 }
 
@@ -213,12 +206,12 @@ TEST_F(RecordingTest, ANewProducerWhileRecordingTakesOverOnTheNextFrame) {
     live.release();
     const DecodedVideo first = closeAndDecode();
     ASSERT_EQ(first.rgba.size(), 1u);
-    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(first.rgba[0].data(), kW, kH, false), 2);
+    EXPECT_EQ(LivePreview_frameNumber(first.rgba[0]), 2);
     ASSERT_EQ(second->close(), 0);
     DecodedVideo video;
     ASSERT_TRUE(VideoFiles_decode(second->path(), &video));
     ASSERT_EQ(video.rgba.size(), 2u);
-    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[0].data(), kW, kH, false), 4);
+    EXPECT_EQ(LivePreview_frameNumber(video.rgba[0]), 4);
 }
 
 // A recording that fails ends, its GL side goes the frame after, the
@@ -287,7 +280,7 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
     EXPECT_EQ(live.framesShown(), shown + 3);
     const std::vector<uint8_t> frame = live.latestFrame();
     ASSERT_FALSE(frame.empty());
-    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(frame.data(), kW, kH, false), 7);
+    EXPECT_EQ(LivePreview_frameNumber(frame), 7);
 
     encoder.reset();
     ASSERT_NO_FATAL_FAILURE(openEncoder());
@@ -298,7 +291,7 @@ TEST_P(RecordingEndTest, TheRecordingEndsAndThePreviewGoesOn) {
     live.release();
     DecodedVideo video = closeAndDecode();
     ASSERT_EQ(video.rgba.size(), 1u);
-    EXPECT_EQ(kivhost::VirtualCamera_decodeFrameNumber(video.rgba[0].data(), kW, kH, false), 9);
+    EXPECT_EQ(LivePreview_frameNumber(video.rgba[0]), 9);
 }
 
 INSTANTIATE_TEST_SUITE_P(Endings, RecordingEndTest,

@@ -35,10 +35,6 @@ namespace {
 
 const int kW = 64, kH = 48;
 
-int64_t frameNumber(const std::vector<uint8_t>& rgba) {
-    return LivePreview_frameNumber(rgba, kW, kH);
-}
-
 // Each test owns the clock (installed before the render thread starts) and
 // the log capture.
 class ManagerTest : public ::testing::Test {
@@ -137,7 +133,7 @@ TEST_F(ManagerTest, RequestedRenderComes16MsAfterTheLastOneBegan) {
     clock.advanceMs(1);
     ASSERT_TRUE(clock.waitForWaitsBegun(waits + 2));
     EXPECT_EQ(live.framesShown(), 12u);
-    EXPECT_EQ(frameNumber(live.latestFrame()), 1);
+    EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 1);
     live.release();
 }
 
@@ -181,7 +177,7 @@ TEST_P(IgnoredRequestTest, RequestRenderChangesNothing) {
     } else {
         ASSERT_EQ(live.camera[0]->queueFrame(), 0);
         ASSERT_TRUE(clock.waitForWaitsBegun(waits + 1));
-        EXPECT_EQ(frameNumber(live.latestFrame()), 0);
+        EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 0);
     }
     EXPECT_EQ(live.framesShown(), recording ? shown + 1 : 11u);
     live.release();
@@ -207,14 +203,16 @@ TEST_F(ManagerTest, FlushedCameraDrainsToTheNewestFrameEveryOtherRender) {
     // latches the oldest queued frame, the next one drains to the newest.
     ASSERT_EQ(live.camera[0]->queueFrame(), 0);
     ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(frameNumber(live.latestFrame()), 1);
+    EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 1);
     ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(frameNumber(live.latestFrame()), 3);
+    EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 3);
     ASSERT_EQ(live.camera[0]->queueFrame(), 0);
     ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(frameNumber(live.latestFrame()), 4) << "4 and 5 queued, the oldest latched";
+    EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 4)
+        << "4 and 5 queued, the oldest latched";
     ASSERT_NO_FATAL_FAILURE(step(live));
-    EXPECT_EQ(frameNumber(live.latestFrame()), 6) << "5 and 6 queued, drained to the newest";
+    EXPECT_EQ(LivePreview_frameNumber(live.latestFrame()), 6)
+        << "5 and 6 queued, drained to the newest";
     live.release();
 }
 
@@ -286,7 +284,25 @@ LivePreviewSetup intermediate() {
     return s;
 }
 
+// `failures` make-currents of the preview fail in a row: each waits out a
+// frame period and tries again; the fiftieth stops the thread.
+void failMakeCurrents(LivePreview& live, ManagerTest& t, int failures) {
+    ASSERT_NO_FATAL_FAILURE(t.start(live));
+    GlFault_failMakeCurrents(failures);
+    for (int i = 1; i < 50 && i <= failures; ++i) ASSERT_NO_FATAL_FAILURE(t.step(live, 41, false));
+    if (failures < 50) {
+        ASSERT_NO_FATAL_FAILURE(t.step(live, 41, false));
+        EXPECT_EQ(live.framesShown(), 12u);
+    } else {
+        t.clock.advanceMs(41);
+        ASSERT_NO_FATAL_FAILURE(t.expectStopped());
+        EXPECT_EQ(live.framesShown(), 11u);
+    }
+    GlFault_failMakeCurrents(0);
+}
+
 const int D = VF_LOG_DEBUG, W = VF_LOG_WARNING, E = VF_LOG_ERROR;
+const char kTooMany[] = "EGL ERROR: eglMakeCurrent() failed too many times. Now requesting stop.";
 
 TEST_P(LogTest, LinesAndLevels) {
     const LogCase& c = GetParam();
@@ -373,6 +389,30 @@ INSTANTIATE_TEST_SUITE_P(
                  // The frame counted, the next render sees the stop.
                  {D, "EGL: render() - ready", 1},
                  {D, "In RenderThread::destroy current thread ", 1, true}}},
+        LogCase{"failing swap",
+                {},
+                [](LivePreview& live, ManagerTest& t) {
+                    ASSERT_NO_FATAL_FAILURE(t.start(live));
+                    // The display drops the window: the swap has no buffer to go to.
+                    live.preview->abandon();
+                    ASSERT_EQ(live.camera[0]->queueFrame(), 0);
+                    t.clock.advanceMs(41);
+                    ASSERT_NO_FATAL_FAILURE(t.expectStopped());
+                },
+                {{W, "EGL: eglSwapBuffers failed.", 1},
+                 {E, "EGL: Last call to swapBuffers failed. Now requesting stop.", 1}}},
+        LogCase{"49 failed make-currents",
+                {},
+                [](LivePreview& live, ManagerTest& t) { failMakeCurrents(live, t, 49); },
+                {{E, "EGL: Call to eglMakeCurrent() failed 49 time(s)", 1},
+                 {E, "EGL: Call to eglMakeCurrent() failed 50 time(s)", 0},
+                 {E, kTooMany, 0}}},
+        LogCase{"50 failed make-currents",
+                {},
+                [](LivePreview& live, ManagerTest& t) { failMakeCurrents(live, t, 50); },
+                {{E, "EGL: Call to eglMakeCurrent() failed 49 time(s)", 1},
+                 {E, "EGL: Call to eglMakeCurrent() failed 50 time(s)", 1},
+                 {E, kTooMany, 1}}},
         LogCase{"intermediate image",
                 intermediate(),
                 [](LivePreview& live, ManagerTest& t) { ASSERT_NO_FATAL_FAILURE(t.start(live)); },
@@ -466,52 +506,6 @@ TEST_F(ManagerTest, DestroyThatDoesNotFinishGivesUpAfter2500And250Ms) {
     ASSERT_EQ(released.wait_for(std::chrono::seconds(20)), std::future_status::ready);
     EXPECT_EQ(log.count("EGL ERROR: Timed out while waiting for destroy."), 1u);
     EXPECT_EQ(log.count("EGL: RenderThread is finally destroyed!"), 1u);
-    live.release();
-}
-
-class MakeCurrentTest : public ManagerTest, public ::testing::WithParamInterface<int> {};
-
-TEST_P(MakeCurrentTest, FiftyFailuresInARowStopTheThread) {
-    const int failures = GetParam();
-    LivePreview live;
-    ASSERT_NO_FATAL_FAILURE(start(live));
-    GlFault_failMakeCurrents(failures);
-    // Each failure waits out a frame period and tries again.
-    for (int i = 1; i < 50 && i <= failures; ++i) ASSERT_NO_FATAL_FAILURE(step(live, 41, false));
-    if (failures < 50) {
-        ASSERT_NO_FATAL_FAILURE(step(live, 41, false));
-        EXPECT_EQ(live.framesShown(), 12u);
-        EXPECT_EQ(
-            log.count("EGL ERROR: eglMakeCurrent() failed too many times. Now requesting stop."),
-            0u);
-    } else {
-        clock.advanceMs(41);
-        ASSERT_NO_FATAL_FAILURE(expectStopped());
-        EXPECT_EQ(live.framesShown(), 11u);
-        EXPECT_EQ(
-            log.count("EGL ERROR: eglMakeCurrent() failed too many times. Now requesting stop."),
-            1u);
-    }
-    EXPECT_EQ(log.count("EGL: Call to eglMakeCurrent() failed 49 time(s)"),
-              failures >= 49 ? 1u : 0u);
-    EXPECT_EQ(log.count("EGL: Call to eglMakeCurrent() failed 50 time(s)"),
-              failures >= 50 ? 1u : 0u);
-    GlFault_failMakeCurrents(0);
-    live.release();
-}
-
-INSTANTIATE_TEST_SUITE_P(Counts, MakeCurrentTest, ::testing::Values(49, 50));
-
-TEST_F(ManagerTest, FailingSwapStopsTheThread) {
-    LivePreview live;
-    ASSERT_NO_FATAL_FAILURE(start(live));
-    // The display drops the window: the next swap has no buffer to go to.
-    live.preview->abandon();
-    ASSERT_EQ(live.camera[0]->queueFrame(), 0);
-    clock.advanceMs(41);
-    ASSERT_NO_FATAL_FAILURE(expectStopped());
-    EXPECT_EQ(log.count("EGL: eglSwapBuffers failed."), 1u);
-    EXPECT_EQ(log.count("EGL: Last call to swapBuffers failed. Now requesting stop."), 1u);
     live.release();
 }
 

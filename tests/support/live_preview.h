@@ -70,9 +70,9 @@ struct LivePreviewEffect {
     KivImaging imaging;
 };
 
-// The generator's frame number in a shown RGBA frame (top row first); -1
-// when there is none.
-int64_t LivePreview_frameNumber(const std::vector<uint8_t>& rgba, int width, int height);
+// The generator's frame number in a shown RGBA frame (top row first; the
+// setup's default size unless given); -1 when there is none.
+int64_t LivePreview_frameNumber(const std::vector<uint8_t>& rgba, int width = 64, int height = 48);
 
 // An RGBA picture upside down (rows swapped).
 std::vector<uint8_t> LivePreview_flipRows(const std::vector<uint8_t>& rgba, int width, int height);
