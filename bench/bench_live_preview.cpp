@@ -3,11 +3,14 @@
 // (KIV_BENCH_LIVE_SECONDS to try a shorter run), at 1280x720 and 1920x1080,
 // with NoEffect and Sepia. It reports the frames rendered, the camera frames
 // never rendered (dropped by the catch-up), the preview's frame intervals
-// (p50, p99) and the CPU the render thread and the GL's rasteriser threads
-// spend per frame. The peer is the bare GL work of one frame done directly on
-// a thread of its own, fed by the same camera: latch (a GLConsumer), the same
-// shader over a quad, and the swap into a window; its CPU per frame is
-// measured the same way, in a run after each of ours.
+// (p50, p99: between the times the frames were queued into the window, as a
+// display would take them, not when this program's reader woke up, whose own
+// scheduling delay is not the preview's cadence) and the CPU the render
+// thread and the GL's rasteriser threads spend per frame. The peer is the
+// bare GL work of one frame done directly on a thread of its own, fed by the
+// same camera: latch (a GLConsumer), the same shader over a quad, and the
+// swap into a window; its CPU per frame is measured the same way, in a run
+// after each of ours.
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
 #include <GLES2/gl2ext.h>

@@ -1,11 +1,12 @@
 // The live pipeline with recording at 1280x720: the virtual camera's bars at
 // 24 frames a second for 20 s through Sepia into a preview window this
 // program reads, and into the host video encoder through the manager's
-// recording path. It reports the preview's frame intervals (p50, p99), the
-// camera frames never rendered and the frames recorded. Then the encoder's
-// cost a frame: frames kept from that preview, as many as were recorded,
-// encoded by the host encoder alone and by the ffmpeg program alone with the
-// same libx264 settings, in turns, three runs each.
+// recording path. It reports the preview's frame intervals (p50, p99, between
+// the frames' queue times, as in bench_live_preview), the camera frames never
+// rendered and the frames recorded. Then the encoder's cost a frame: frames
+// kept from that preview, as many as were recorded, encoded by the host
+// encoder alone and by the ffmpeg program alone with the same libx264
+// settings, in turns, three runs each.
 #include <android/log.h>
 #include <benchmark/benchmark.h>
 #include <stdio.h>
