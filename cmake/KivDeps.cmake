@@ -19,6 +19,9 @@ add_library(kiv_android INTERFACE)
 target_include_directories(kiv_android SYSTEM INTERFACE ${KIV_ANDROID_INCLUDE})
 target_link_libraries(kiv_android INTERFACE ${KIV_ANDROID_UTILS} ${KIV_ANDROID_LOG} Threads::Threads ${CMAKE_DL_LIBS})
 target_link_options(kiv_android INTERFACE "LINKER:-rpath,${KIV_ANDROID_LIBDIR}")
+# A client of the public headers needs libutils too (KivInstall).
+set(KIV_UTILS_INCLUDE ${KIV_ANDROID_INCLUDE})
+set(KIV_UTILS_LIBRARY ${KIV_ANDROID_UTILS})
 
 pkg_check_modules(KIV_EGL REQUIRED IMPORTED_TARGET egl)
 pkg_check_modules(KIV_GLES REQUIRED IMPORTED_TARGET glesv2)

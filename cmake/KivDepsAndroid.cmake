@@ -31,6 +31,10 @@ function(kiv_device_dependency name header)
 endfunction()
 
 kiv_device_dependency(PLATFORM utils/RefBase.h utils cutils ui gui log nativewindow jnigraphics)
+# A client of the public headers needs libutils and system/window.h too
+# (KivInstall).
+set(KIV_UTILS_INCLUDE ${KIV_PLATFORM_INCLUDE})
+set(KIV_UTILS_LIBRARY ${KIV_PLATFORM_utils})
 kiv_device_dependency(EGL EGL/egl.h EGL)
 kiv_device_dependency(GLES GLES2/gl2.h GLESv2)
 kiv_device_dependency(TURBOJPEG turbojpeg.h turbojpeg)

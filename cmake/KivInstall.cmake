@@ -1,7 +1,9 @@
 # What `cmake --install` puts into a prefix: libkivimaging.so, the headers a
 # client compiles against, the kivimaging program, a CMake package
 # (find_package(kivimaging CONFIG) -> kivimaging::kivimaging), a pkg-config
-# file and the README. Nothing installed refers back to the build or source
+# file and the README. On a host, also the host's stand-ins that a live
+# pipeline needs (a preview window, a virtual camera, the platform's window
+# header), which a device has from its platform. Nothing installed refers back to the build or source
 # tree, and the package and pkg-config files find the prefix from where they
 # are, so an installed tree can be moved.
 include(GNUInstallDirs)
@@ -15,6 +17,8 @@ set(KIV_PUBLIC_HEADERS
   core/KivImaging.h                      # effect C API over one effect (KivImaging_*)
   core/VFilterBufferedProcessor.h        # offline processor (BufferedProcessor_*)
   include/kivimaging/KivFilterPlugin.h   # SDK of downloadable filter libraries
+  include/kivimaging/OpenGLManager.h     # live render manager a camera client drives
+  include/kivimaging/OnFrameListener.h   # what a client implements to receive pictures
 )
 # The image core's C API keeps its vccore/ folder: its headers include each
 # other by that name.
@@ -30,6 +34,33 @@ set_target_properties(kivimaging PROPERTIES
 target_include_directories(kivimaging INTERFACE
   $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>
   $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/kivimaging>)
+
+# OpenGLManager.h stands on libutils (RefBase, sp, Mutex): a client compiles
+# against its headers and links it (Debian's on a host, the device's own in a
+# device build; KivDeps says which). The package's config file adds them to
+# the imported target, the pkg-config file to its flags.
+get_filename_component(kiv_utils_dir ${KIV_UTILS_LIBRARY} DIRECTORY)
+set(KIV_PC_PLATFORM_CFLAGS " -isystem ${KIV_UTILS_INCLUDE}")
+set(KIV_PC_PLATFORM_LIBS " -L${kiv_utils_dir} -lutils")
+# Debian keeps libutils out of the loader's path; a device has it in /system.
+if(NOT ANDROID)
+  string(APPEND KIV_PC_PLATFORM_LIBS " -Wl,-rpath,${kiv_utils_dir}")
+endif()
+
+# On a host the library itself implements the platform's window, so it brings
+# that header (system/window.h, searched before libutils' folder) and the
+# host's stand-ins for a display and a camera. Installed nowhere else.
+if(NOT ANDROID)
+  set(kiv_platform_dir ${CMAKE_INSTALL_INCLUDEDIR}/kivimaging/platform)
+  target_include_directories(kivimaging BEFORE INTERFACE $<INSTALL_INTERFACE:${kiv_platform_dir}>)
+  string(PREPEND KIV_PC_PLATFORM_CFLAGS " -I\${includedir}/kivimaging/platform")
+  install(FILES ${PROJECT_SOURCE_DIR}/host/include/system/window.h DESTINATION ${kiv_platform_dir}/system)
+  install(FILES ${PROJECT_SOURCE_DIR}/host/include/nativebase/nativebase.h
+          DESTINATION ${kiv_platform_dir}/nativebase)
+  install(FILES ${PROJECT_SOURCE_DIR}/host/include/kivhost/PreviewWindow.h
+                ${PROJECT_SOURCE_DIR}/host/include/kivhost/VirtualCamera.h
+          DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/kivimaging/kivhost)
+endif()
 
 # VFilterBufferedProcessor.h takes JNI types. A device's sysroot has jni.h; on
 # a host the client is pointed at the JDK the library was built with.

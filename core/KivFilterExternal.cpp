@@ -11,7 +11,7 @@
 #include "core/egl/EglProgram.h"
 #include "core/egl/EglRecycler.h"
 #include "kivimaging/KivFilterPlugin.h"
-#include "kivplatform/device_path.h"
+#include "core/KivDevicePath.h"
 #include "vccore/vc_error.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"

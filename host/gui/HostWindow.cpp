@@ -1,5 +1,7 @@
 #include <gui/HostWindow.h>
 
+#include <string.h>
+
 namespace android {
 
 HostWindow::Queue HostWindow::makeQueue(uint32_t width, uint32_t height, PixelFormat format) {
@@ -53,6 +55,28 @@ status_t HostWindow::releaseFrame(const sp<GraphicBuffer>& buffer) {
         mAcquired.erase(found);
     }
     return mConsumer->releaseBuffer(item);
+}
+
+std::vector<uint8_t> HostWindow::latestFrame() {
+    sp<GraphicBuffer> frame, next;
+    while (acquireFrame(&next, nullptr, nullptr) == NO_ERROR) {
+        if (frame != nullptr) releaseFrame(frame);
+        frame = next;
+    }
+    if (frame == nullptr) return {};
+    std::vector<uint8_t> rgba((size_t)frame->getWidth() * frame->getHeight() * 4);
+    void* address = nullptr;
+    if (frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &address) == NO_ERROR) {
+        const size_t row = (size_t)frame->getWidth() * 4;
+        for (uint32_t y = 0; y < frame->getHeight(); ++y) {
+            memcpy(&rgba[y * row], (uint8_t*)address + (size_t)y * frame->getStride() * 4, row);
+        }
+        frame->unlock();
+    } else {
+        rgba.clear();
+    }
+    releaseFrame(frame);
+    return rgba;
 }
 
 void HostWindow::abandon() {

@@ -1,4 +1,4 @@
-#include "kivplatform/device_path.h"
+#include "core/KivDevicePath.h"
 
 #include <stdio.h>
 #include <stdlib.h>

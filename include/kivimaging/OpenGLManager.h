@@ -17,6 +17,9 @@
 //
 // All GL work happens on the render thread; the setters only store values
 // that the next frame reads.
+//
+// A client also includes <kivimaging/KivImaging.h> for the effect it hands
+// to setFilter(), and the platform's <system/window.h> for the windows.
 #ifndef KIVIMAGING_OPENGLMANAGER_H
 #define KIVIMAGING_OPENGLMANAGER_H
 
@@ -28,8 +31,11 @@
 #include <utils/RefBase.h>
 #include <utils/StrongPointer.h>
 
+#include "kivimaging/OnFrameListener.h"
+
+// Only named here: the platform's window, the library's internals and the
+// effect handle of KivImaging.h.
 struct ANativeWindow;
-class VCImage;
 class ANWCondition;
 class AsyncImageConverter;
 class EglEnvironment;
@@ -41,7 +47,6 @@ class EglWindow;
 class EglWindowSurface;
 class KivFilter;
 class KivImaging;
-class OnFrameListener;
 namespace android {
 class IGraphicBufferProducer;
 }

@@ -3,8 +3,9 @@
 # and a sysroot of empty NDK, platform and third-party files. Only the
 # configuration is made, then the generated graph is checked: host/, the tools
 # and the tests are not built, nothing of the host (Debian's AOSP packages, the
-# JDK, the host's library folders) reaches any compile or link line, and
-# libkivimaging links the device's platform libraries.
+# JDK, the host's library folders) reaches any compile or link line,
+# libkivimaging links the device's platform libraries, and the package a client
+# finds carries the device's libutils and none of the host's stand-ins.
 set(toolchain ${WORK_DIR}/toolchain)
 set(sysroot ${toolchain}/sysroot/usr)
 set(platform ${WORK_DIR}/platform)
@@ -69,6 +70,21 @@ string(REGEX MATCH "\nbuild jni/libkivimaging\\.so[^\n]*\n([^\n]+\n)*" library "
 foreach(lib -lutils -lcutils -lui -lgui -llog -lnativewindow -ljnigraphics -lEGL -lGLESv2)
   if(NOT library MATCHES " ${lib} ")
     message(FATAL_ERROR "libkivimaging does not link ${lib}:\n${library}")
+  endif()
+endforeach()
+
+file(READ ${build}/kivimaging-config.cmake config)
+file(READ ${build}/kivimaging.pc pc)
+file(READ ${build}/cmake_install.cmake installs)
+foreach(check "config:\"${platform}/include\"" "config:\"${platform}/lib/libutils.so\""
+              "pc:-isystem ${platform}/include" "pc:-L${platform}/lib -lutils\n"
+              "!config:/usr/" "!pc:/usr/" "!pc:rpath" "!installs:${SOURCE_DIR}/host/")
+  string(REGEX MATCH "^(!?)([a-z]+):(.*)$" check "${check}")
+  string(FIND "${${CMAKE_MATCH_2}}" "${CMAKE_MATCH_3}" at)
+  if(CMAKE_MATCH_1 AND at GREATER -1)
+    message(FATAL_ERROR "the device package's ${CMAKE_MATCH_2} has ${CMAKE_MATCH_3}")
+  elseif(NOT CMAKE_MATCH_1 AND at EQUAL -1)
+    message(FATAL_ERROR "the device package's ${CMAKE_MATCH_2} lacks ${CMAKE_MATCH_3}")
   endif()
 endforeach()
 message(STATUS "device configuration: ${build}")

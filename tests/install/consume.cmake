@@ -3,7 +3,8 @@
 # installed), then builds two clients against the installed tree alone, one
 # through find_package(kivimaging CONFIG) and one through pkg-config, and runs
 # each: the example Solarize plug-in, built from the installed SDK header, over
-# a buffer through the C API, pixels checked.
+# a buffer through the C API, pixels checked; and a live render manager drawing
+# an effect into the host's preview window, shown frame and screenshot checked.
 
 # run(<what> [ENV var=value...] COMMAND ...): the output lands in run_output.
 function(run what)
@@ -68,7 +69,7 @@ set(flags ${SANITIZE})
 # find_package client.
 set(src ${WORK_DIR}/cmake-client)
 set(bin ${WORK_DIR}/cmake-client-build)
-file(COPY ${CLIENT_DIR}/consumer.c ${PLUGIN} DESTINATION ${src})
+file(COPY ${CLIENT_DIR}/consumer.c ${CLIENT_DIR}/live_client.cpp ${PLUGIN} DESTINATION ${src})
 file(COPY_FILE ${CLIENT_DIR}/project.cmake ${src}/CMakeLists.txt)
 run("configure the find_package client" COMMAND ${CMAKE_COMMAND} -G Ninja -S ${src} -B ${bin}
   ${compilers} -DCMAKE_BUILD_TYPE=Release -DCMAKE_PREFIX_PATH=${prefix} -DKIV_EXPECTED_PREFIX=${prefix}
@@ -76,6 +77,8 @@ run("configure the find_package client" COMMAND ${CMAKE_COMMAND} -G Ninja -S ${s
 run("build the find_package client" COMMAND ${CMAKE_COMMAND} --build ${bin} -j 2)
 install_plugin(${bin}/libsolarize.so ${bin}/sysroot)
 run("run the find_package client" ENV KIV_SYSROOT=${bin}/sysroot COMMAND ${bin}/client ${effect})
+message(STATUS "find_package: ${run_output}")
+run("run the find_package live client" COMMAND ${bin}/live_client)
 message(STATUS "find_package: ${run_output}")
 
 # pkg-config client, pointed at the installed tree only.
@@ -99,7 +102,11 @@ run("build the pkg-config plug-in" COMMAND ${CXX_COMPILER} ${flags} -shared -fPI
   ${PLUGIN} ${cflags} -o ${bin}/libsolarize.so)
 run("build the pkg-config client" COMMAND ${C_COMPILER} ${flags} -Wall -Wextra -Werror
   ${CLIENT_DIR}/consumer.c ${cflags_libs} -o ${bin}/client)
+run("build the pkg-config live client" COMMAND ${CXX_COMPILER} ${flags} -Wall -Wextra -Werror
+  ${CLIENT_DIR}/live_client.cpp ${cflags_libs} -o ${bin}/live_client)
 install_plugin(${bin}/libsolarize.so ${bin}/sysroot)
 run("run the pkg-config client" ENV KIV_SYSROOT=${bin}/sysroot LD_LIBRARY_PATH=${prefix}/${LIBDIR}
   COMMAND ${bin}/client ${effect})
+message(STATUS "pkg-config: ${run_output}")
+run("run the pkg-config live client" ENV LD_LIBRARY_PATH=${prefix}/${LIBDIR} COMMAND ${bin}/live_client)
 message(STATUS "pkg-config: ${run_output}")

@@ -1,7 +1,5 @@
 #include "support/live_preview.h"
 
-#include <ui/GraphicBuffer.h>
-
 #include <cstring>
 
 using android::sp;
@@ -39,25 +37,7 @@ bool LivePreview::start(bool firstFrame) {
 }
 
 std::vector<uint8_t> LivePreview::latestFrame() {
-    sp<android::GraphicBuffer> frame, next;
-    while (preview->acquireFrame(&next, nullptr, nullptr) == android::NO_ERROR) {
-        if (frame != nullptr) preview->releaseFrame(frame);
-        frame = next;
-    }
-    if (frame == nullptr) return {};
-    std::vector<uint8_t> rgba((size_t)frame->getWidth() * frame->getHeight() * 4);
-    void* address = nullptr;
-    if (frame->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &address) == android::NO_ERROR) {
-        const size_t row = (size_t)frame->getWidth() * 4;
-        for (uint32_t y = 0; y < frame->getHeight(); ++y) {
-            memcpy(&rgba[y * row], (uint8_t*)address + (size_t)y * frame->getStride() * 4, row);
-        }
-        frame->unlock();
-    } else {
-        rgba.clear();
-    }
-    preview->releaseFrame(frame);
-    return rgba;
+    return preview->latestFrame();
 }
 
 ::testing::AssertionResult LivePreview::startPaced(ManualClock& clock) {

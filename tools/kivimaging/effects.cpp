@@ -14,7 +14,7 @@
 #include "core/KivFilterName.h"
 #include "core/KivImaging.h"
 #include "core/KivParameterOption.h"
-#include "kivplatform/device_path.h"
+#include "core/KivDevicePath.h"
 
 namespace kivcli {
 namespace {

@@ -30,6 +30,10 @@ public:
     status_t acquireFrame(sp<GraphicBuffer>* buffer, uint64_t* frameNumber, int64_t* timestamp);
     status_t releaseFrame(const sp<GraphicBuffer>& buffer);
 
+    // The newest queued frame, RGBA rows top first, with the older ones
+    // released unread; empty when none is queued or it cannot be read.
+    std::vector<uint8_t> latestFrame();
+
     // The consumer goes away, as a display that dropped the window: the
     // producer gets NO_INIT from then on.
     void abandon();

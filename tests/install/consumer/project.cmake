@@ -14,6 +14,12 @@ add_executable(client consumer.c)
 set_source_files_properties(consumer.c PROPERTIES LANGUAGE CXX)
 target_link_libraries(client PRIVATE kivimaging::kivimaging)
 
+# The live render manager, with the host's preview window and camera: the
+# package must carry libutils' headers and library for it.
+add_executable(live_client live_client.cpp)
+target_link_libraries(live_client PRIVATE kivimaging::kivimaging)
+target_compile_options(live_client PRIVATE -Wall -Wextra -Werror)
+
 # A plug-in needs the SDK header, not the library.
 add_library(solarize SHARED solarize.cpp)
 set_target_properties(solarize PROPERTIES CXX_VISIBILITY_PRESET hidden)
