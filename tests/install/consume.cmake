@@ -96,8 +96,13 @@ foreach(header ${headers})
   string(APPEND unit "#include <${header}>\n")
 endforeach()
 file(WRITE ${bin}/all_headers.cpp "${unit}")
-run("compile every header with pkg-config's flags" COMMAND ${CXX_COMPILER} -fsyntax-only -Wall -Werror
-  ${bin}/all_headers.cpp ${cflags})
+# With clang too (scripts/setup-deps installs it): it refuses what g++ lets
+# pass, such as a class named as a struct.
+find_program(clangxx clang++ REQUIRED)
+foreach(compiler ${CXX_COMPILER} ${clangxx})
+  run("compile every header with pkg-config's flags" COMMAND ${compiler} -fsyntax-only -Wall -Werror
+    ${bin}/all_headers.cpp ${cflags})
+endforeach()
 run("build the pkg-config plug-in" COMMAND ${CXX_COMPILER} ${flags} -shared -fPIC -fvisibility=hidden
   ${PLUGIN} ${cflags} -o ${bin}/libsolarize.so)
 run("build the pkg-config client" COMMAND ${C_COMPILER} ${flags} -Wall -Wextra -Werror
