@@ -74,7 +74,22 @@ int KivBandPipeline::onDecoded(void* self, const unsigned char* rgba, int first,
     return static_cast<KivBandPipeline*>(self)->storeRows(rgba, first, rows);
 }
 
-int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
+unsigned char* KivBandPipeline::onPlace(void* self, int first, int rows) {
+    KivBandPipeline* pipeline = static_cast<KivBandPipeline*>(self);
+    const int rc = pipeline->makeRoom(first, rows);
+    if (rc != 0) {
+        pipeline->fail(rc);
+        return nullptr;
+    }
+    return pipeline->mSource.row(first);
+}
+
+int KivBandPipeline::onPlaced(void* self, const unsigned char*, int first, int rows) {
+    static_cast<KivBandPipeline*>(self)->rowsStored(first + rows);
+    return 0;
+}
+
+int KivBandPipeline::makeRoom(int first, int rows) {
     // Decoded rows never straddle bands (bands are whole multiples of them).
     const int band = first / mBandRows;
     const bool newBand = mSourceSlots > 0 && first % mBandRows == 0;
@@ -93,36 +108,47 @@ int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
         if (mStatus != 0) return mStatus;
     }
     if (newBand && !mSource.takeBand(band)) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
+    return 0;
+}
+
+void KivBandPipeline::rowsStored(int end) {
+    std::lock_guard<std::mutex> guard(mLock);
+    mDecoded = end;
+    mChanged.notify_all();
+}
+
+int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
+    const int room = makeRoom(first, rows);
+    if (room != 0) return room;
     const int w = mPicture.width;
     const size_t rowBytes = (size_t)w * 4;
-    const unsigned char* rowsToCopy = rgba;
-    if (mPicture.throughNv21) {
-        // As the whole picture would: decoded RGBA to NV21, which the GPU
-        // side turns back into RGBA with the image core's equations.
-        const bool direct = mSource.pitch() == rowBytes;
-        mNv21.resize(VCImage_requiredSize(w, rows, VC_FORMAT_NV21));
-        if (!direct) mRgba.resize(rowBytes * rows);
-        unsigned char* back = direct ? mSource.row(first) : mRgba.data();
-        ImageHandle from = wrap(const_cast<unsigned char*>(rgba), w, rows, VC_FORMAT_RGBA);
-        ImageHandle nv21 = wrap(mNv21.data(), w, rows, VC_FORMAT_NV21);
-        ImageHandle to = wrap(back, w, rows, VC_FORMAT_RGBA);
-        if (from == nullptr || nv21 == nullptr || to == nullptr ||
-            VCImage_convert(from.get(), nv21.get()) != 0 ||
-            VCImage_convert(nv21.get(), to.get()) != 0) {
-            return VC_REPORT(VC_ERROR_ALLOC_FAILED);
-        }
-        rowsToCopy = direct ? nullptr : back;
+    // As the whole picture would: decoded RGBA to NV21, which the GPU side
+    // turns back into RGBA with the image core's equations.
+    const bool direct = mSource.pitch() == rowBytes;
+    mNv21.resize(VCImage_requiredSize(w, rows, VC_FORMAT_NV21));
+    if (!direct) mRgba.resize(rowBytes * rows);
+    unsigned char* back = direct ? mSource.row(first) : mRgba.data();
+    ImageHandle from = wrap(const_cast<unsigned char*>(rgba), w, rows, VC_FORMAT_RGBA);
+    ImageHandle nv21 = wrap(mNv21.data(), w, rows, VC_FORMAT_NV21);
+    ImageHandle to = wrap(back, w, rows, VC_FORMAT_RGBA);
+    if (from == nullptr || nv21 == nullptr || to == nullptr ||
+        VCImage_convert(from.get(), nv21.get()) != 0 ||
+        VCImage_convert(nv21.get(), to.get()) != 0) {
+        return VC_REPORT(VC_ERROR_ALLOC_FAILED);
     }
-    for (int i = 0; rowsToCopy != nullptr && i < rows; ++i)
-        memcpy(mSource.row(first + i), rowsToCopy + i * rowBytes, rowBytes);
-    std::lock_guard<std::mutex> guard(mLock);
-    mDecoded = first + rows;
-    mChanged.notify_all();
+    for (int i = 0; !direct && i < rows; ++i)
+        memcpy(mSource.row(first + i), back + i * rowBytes, rowBytes);
+    rowsStored(first + rows);
     return 0;
 }
 
 void KivBandPipeline::decode(VCStreamReader* reader) {
-    int rc = VCStreamReader_readBands(reader, kDecodeRows, onDecoded, this);
+    // RGBA rows are decoded straight into the source; rows that cross NV21
+    // go through a band of the reader's own.
+    int rc = mPicture.throughNv21
+                 ? VCStreamReader_readBands(reader, kDecodeRows, onDecoded, this)
+                 : VCStreamReader_readBandsInPlace(reader, kDecodeRows, mSource.pitch(), onPlace,
+                                                   onPlaced, this);
     if (rc != 0) fail(rc);
 }
 

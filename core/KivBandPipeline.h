@@ -93,6 +93,13 @@ public:
 
 private:
     static int onDecoded(void* self, const unsigned char* rgba, int first, int rows);
+    static unsigned char* onPlace(void* self, int first, int rows);
+    static int onPlaced(void* self, const unsigned char* rgba, int first, int rows);
+    // Waits until rows [first, first + rows) of the source may be written
+    // (giving them their band's memory); 0 or the failure.
+    int makeRoom(int first, int rows);
+    void rowsStored(int end);
+    // Rows decoded to RGBA, through NV21 into the source.
     int storeRows(const unsigned char* rgba, int first, int rows);
     void decode(VCStreamReader* reader);
     void encode(VCStreamWriter* writer);

@@ -13,6 +13,7 @@
 #include "vccore/vc_file.h"
 #include "vccore/vc_log.h"
 #include "vccore/vc_picture.h"
+#include "vccore/vc_stream.h"
 
 using namespace jpegtest;
 
@@ -442,3 +443,66 @@ TEST(VcPng, DecodesEveryColourTypeKeepingColourUnderTransparency) {
 }
 
 }  // namespace
+
+// Stream rows decoded where the caller places them (straight into its memory
+// for JPEG, through a copy for PNG): the rows of the packed decoding at the
+// caller's pitch, the band told each time; a place refused stops the picture.
+TEST(VcStream, RowsLandWhereTheCallerPlacesThem) {
+    REQUIRE_GENERAL_CODECS();
+    const int w = 50, h = 40, pitch = w * 4 + 12;
+    ImagePtr source = makeRgba(w, h);
+    size_t pngLength = 0;
+    unsigned char* png = VCPicture_encodePng(source.get(), &pngLength);
+    const Bytes inputs[] = {encodeBytes(source.get(), 90), Bytes(png, png + pngLength)};
+    free(png);
+    struct Placing {
+        Bytes rows;             // pitch apart
+        std::vector<int> told;  // first rows the band was told of
+        int refuseAt = -1;
+    };
+    auto place = [](void* user, int first, int) -> unsigned char* {
+        Placing* p = static_cast<Placing*>(user);
+        return first == p->refuseAt ? nullptr : p->rows.data() + (size_t)first * pitch;
+    };
+    auto told = [](void* user, const unsigned char* rgba, int first, int) {
+        Placing* p = static_cast<Placing*>(user);
+        EXPECT_EQ(rgba, p->rows.data() + (size_t)first * pitch);
+        p->told.push_back(first);
+        return 0;
+    };
+    for (const Bytes& input : inputs) {
+        Bytes packed(w * h * 4);
+        auto copy = [](void* user, const unsigned char* rgba, int first, int rows) {
+            memcpy(static_cast<unsigned char*>(user) + first * w * 4, rgba, rows * w * 4);
+            return 0;
+        };
+        VCStreamReader* reader = VCStreamReader_open(input.data(), input.size());
+        int width = 0, height = 0;
+        ASSERT_EQ(0, VCStreamReader_readHeader(reader, &width, &height));
+        ASSERT_EQ(0, VCStreamReader_readBands(reader, 16, copy, packed.data()));
+        VCStreamReader_close(reader);
+
+        const struct {
+            int refuseAt;
+            size_t pitch;
+            int status;
+            std::vector<int> told;
+        } cases[] = {{-1, pitch, 0, {0, 16, 32}},
+                     {16, pitch, VC_ERROR_INVALID_STATE, {0}},
+                     {-1, w * 4 - 1, VC_ERROR_INVALID_STATE, {}}};
+        for (const auto& c : cases) {
+            Placing placing{Bytes(pitch * h, 0xEE), {}, c.refuseAt};
+            reader = VCStreamReader_open(input.data(), input.size());
+            ASSERT_EQ(0, VCStreamReader_readHeader(reader, &width, &height));
+            EXPECT_EQ(c.status,
+                      VCStreamReader_readBandsInPlace(reader, 16, c.pitch, place, told, &placing));
+            EXPECT_EQ(VC_DECODE_OK, VCStreamReader_failure(reader));
+            VCStreamReader_close(reader);
+            EXPECT_EQ(c.told, placing.told);
+            for (int y = 0; c.status == 0 && y < h; ++y) {
+                EXPECT_EQ(0, memcmp(&placing.rows[y * pitch], &packed[y * w * 4], w * 4)) << y;
+                EXPECT_EQ(0xEE, placing.rows[y * pitch + w * 4]) << y;  // the padding untouched
+            }
+        }
+    }
+}

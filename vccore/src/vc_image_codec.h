@@ -50,6 +50,19 @@ public:
     // or a band fails.
     virtual bool readRgbaBands(unsigned char* rgba, int rows,
                                const std::function<bool(int, int)>& band) = 0;
+    // Readers that can decode straight into the caller's memory: as
+    // readRgbaBands, but each band goes where place(firstRow, count) says,
+    // rows `pitch` bytes apart (a null place stops it, returning false).
+    virtual bool decodesInPlace() const { return false; }
+    virtual bool readRgbaBandsInPlace(int rows, size_t pitch,
+                                      const std::function<unsigned char*(int, int)>& place,
+                                      const std::function<bool(int, int)>& band) {
+        (void)rows;
+        (void)pitch;
+        (void)place;
+        (void)band;
+        return false;
+    }
     // Why the last call returned false; VC_DECODE_OK when it was a band's
     // own refusal.
     virtual VCDecodeFailure failure() const = 0;

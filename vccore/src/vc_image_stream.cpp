@@ -1,5 +1,6 @@
 // Band-by-band decoding and encoding over the general codecs.
 #include <stdlib.h>
+#include <string.h>
 
 #include "vc_image_codec.h"
 #include "vccore/vc_error.h"
@@ -72,6 +73,42 @@ extern "C" int VCStreamReader_readBands(VCStreamReader* stream, int rows, VCStre
     });
     free(rgba);
     if (refused != 0) return refused;
+    return ok ? 0 : readerFailed(stream);
+}
+
+extern "C" int VCStreamReader_readBandsInPlace(VCStreamReader* stream, int rows, size_t pitch,
+                                               VCStreamPlace place, VCStreamBand band, void* user) {
+    if (stream == nullptr || place == nullptr || band == nullptr) return VC_ERROR_NULL_PARAM;
+    if (stream->width < 1 || rows < 1 || pitch < static_cast<size_t>(stream->width) * 4)
+        return VC_ERROR_INVALID_STATE;
+    const size_t rowBytes = static_cast<size_t>(stream->width) * 4;
+    unsigned char* placed = nullptr;
+    int refused = 0;
+    auto where = [&](int first, int count) {
+        placed = place(user, first, count);
+        return placed;
+    };
+    bool ok;
+    if (stream->reader->decodesInPlace()) {
+        ok = stream->reader->readRgbaBandsInPlace(rows, pitch, where, [&](int first, int count) {
+            refused = band(user, placed, first, count);
+            return refused == 0;
+        });
+    } else {
+        unsigned char* rgba = static_cast<unsigned char*>(malloc(rowBytes * rows));
+        if (rgba == nullptr) return readerFailed(stream, VC_DECODE_NO_MEMORY);
+        ok = stream->reader->readRgbaBands(rgba, rows, [&](int first, int count) {
+            if (where(first, count) == nullptr) return false;
+            for (int i = 0; i < count; ++i)
+                memcpy(placed + i * pitch, rgba + i * rowBytes, rowBytes);
+            refused = band(user, placed, first, count);
+            return refused == 0;
+        });
+        free(rgba);
+    }
+    if (refused != 0) return refused;
+    if (!ok && placed == nullptr && stream->reader->failure() == VC_DECODE_OK)
+        return VC_ERROR_INVALID_STATE;
     return ok ? 0 : readerFailed(stream);
 }
 

@@ -71,6 +71,23 @@ public:
                finish();
     }
 
+    bool decodesInPlace() const override { return true; }
+    bool readRgbaBandsInPlace(int rows, size_t pitch,
+                              const std::function<unsigned char*(int, int)>& place,
+                              const std::function<bool(int, int)>& band) override {
+        if (!mHeaderRead || rows < 1 || !start()) return false;
+        mPitch = pitch;
+        const bool ok = VCPictureReader_forEachBand(
+                            static_cast<int>(mInfo.image_height), rows,
+                            [&](int first, int count) {
+                                unsigned char* at = place(first, count);
+                                return at != nullptr && readRows(at, count) && band(first, count);
+                            }) &&
+                        finish();
+        mPitch = 0;
+        return ok;
+    }
+
     VCDecodeFailure failure() const override { return mError.failure; }
 
     JpegReader(const JpegReader&) = delete;
@@ -168,8 +185,9 @@ private:
     }
 
     // The next `count` rows, at the start of `rgba`.
+    // Rows mPitch bytes apart, or packed when it is 0.
     bool readRows(unsigned char* rgba, int count) {
-        const size_t stride = static_cast<size_t>(mInfo.output_width) * 4;
+        const size_t stride = mPitch != 0 ? mPitch : static_cast<size_t>(mInfo.output_width) * 4;
         JSAMPROW pointers[kMaxRowsPerRead];
         if (setjmp(mError.jump)) return false;
         for (int done = 0; done < count;) {
@@ -198,6 +216,7 @@ private:
     bool mCreated = false;
     bool mHeaderRead = false;
     bool mCmyk = false;
+    size_t mPitch = 0;
 };
 
 // RGBA rows into a 4:2:0 JPEG through libjpeg's scanline interface, with the

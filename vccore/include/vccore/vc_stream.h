@@ -35,6 +35,15 @@ typedef int (*VCStreamBand)(void* user, const unsigned char* rgba, int firstRow,
 // last band). 0, the band's own non-zero result, or VC_ERROR_CODEC_FAILED
 // (reason in VCPicture_lastFailure).
 int VCStreamReader_readBands(VCStreamReader* reader, int rows, VCStreamBand band, void* user);
+// As VCStreamReader_readBands, but each band is decoded straight into the
+// caller's memory where the reader can (else through a band of its own and a
+// copy): place(user, firstRow, rows) says where row firstRow goes, the rows
+// `pitch` bytes apart (at least width * 4); `band` follows once they are
+// there (its rows are that memory). A null place stops the decoding: VC_ERROR_INVALID_STATE, the
+// caller knowing why.
+typedef unsigned char* (*VCStreamPlace)(void* user, int firstRow, int rows);
+int VCStreamReader_readBandsInPlace(VCStreamReader* reader, int rows, size_t pitch,
+                                    VCStreamPlace place, VCStreamBand band, void* user);
 // Why the reader's last call failed (on whichever thread it ran);
 // VC_DECODE_OK when it did not, or when a band stopped it.
 VCDecodeFailure VCStreamReader_failure(const VCStreamReader* reader);
