@@ -274,6 +274,11 @@ bool VideoEncoder::takeFrame() {
                                                      mSettings.width, mSettings.height, &s.scratch);
     }
     const int64_t spent = steadyNanos() - start;
+    // What a dropped frame's warning says, read while the buffer is still
+    // ours: once released the producer may reallocate it.
+    const sp<GraphicBuffer>& b = item.mGraphicBuffer;
+    const uint32_t width = b->getWidth(), height = b->getHeight();
+    const int format = b->getPixelFormat();
     s.consumer->releaseBuffer(item);
 
     std::lock_guard<std::mutex> guard(s.lock);
@@ -283,12 +288,10 @@ bool VideoEncoder::takeFrame() {
             s.pool.push_back(frame);
             if (!s.warnedFormat) {
                 s.warnedFormat = true;
-                const sp<GraphicBuffer>& b = item.mGraphicBuffer;
                 VF_LogMsg(VF_LOG_WARNING,
                           "VideoEncoder: %s: a %ux%u frame of format %d cannot go into the "
                           "%dx%d video; dropped",
-                          mPath.c_str(), b->getWidth(), b->getHeight(), b->getPixelFormat(),
-                          mSettings.width, mSettings.height);
+                          mPath.c_str(), width, height, format, mSettings.width, mSettings.height);
             }
         }
         return true;
