@@ -98,11 +98,7 @@ TEST(BufferedProcessorApi, StatusCodesWithoutContextOrBuffers) {
     VFilterBufferedProcessorImpl p;
     Bytes in(16 * 4, 7), out(16 * 4, 0xAB);
     const std::string kState = "E VC_ERROR_INVALID_STATE (-7): core/VFilterBufferedProcessorImpl:#";
-    const struct {
-        std::function<int()> call;
-        int status;
-        std::vector<std::string> lines;
-    } rows[] = {
+    LogCapture_expectRows({
         {[&] { return p.doProcessRGBA(nullptr, 4, 4, out.data(), VC_FORMAT_RGBA); }, -3, {}},
         {[&] { return p.doProcessRGBA(in.data(), 4, 4, nullptr, VC_FORMAT_BGRA); }, -3, {}},
         {[&] { return p.doProcessNV21(nullptr, 4, 4, out.data()); }, -3, {}},
@@ -111,12 +107,7 @@ TEST(BufferedProcessorApi, StatusCodesWithoutContextOrBuffers) {
          -7,
          {kState, kState}},
         {[&] { return p.doProcessNV21(in.data(), 4, 4, out.data()); }, -7, {kState, kState}},
-    };
-    for (const auto& r : rows) {
-        LogCapture log;
-        EXPECT_EQ(r.status, r.call());
-        EXPECT_TRUE(log.matches(r.lines));
-    }
+    });
     EXPECT_EQ(Bytes(16 * 4, 0xAB), out);
 }
 

@@ -123,3 +123,11 @@ void LogCapture::clear() {
     std::lock_guard<std::mutex> guard(gLock);
     gLines.clear();
 }
+
+void LogCapture_expectRows(const std::vector<LogRow>& rows) {
+    for (size_t i = 0; i < rows.size(); ++i) {
+        LogCapture log;
+        EXPECT_EQ(rows[i].status, rows[i].call()) << "row " << i;
+        EXPECT_TRUE(log.matches(rows[i].lines)) << "row " << i;
+    }
+}

@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -43,5 +44,15 @@ public:
 private:
     void* mPrevious;
 };
+
+// One row of a module's table of status codes and log lines: the call, the
+// status it returns and what it logs (as LogCapture::matches takes it).
+struct LogRow {
+    std::function<int()> call;
+    int status;
+    std::vector<std::string> lines;
+};
+// Runs each row under a capture of its own; a failure names the row's index.
+void LogCapture_expectRows(const std::vector<LogRow>& rows);
 
 #endif

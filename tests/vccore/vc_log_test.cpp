@@ -126,11 +126,7 @@ TEST(ImageCoreLog, LinesAndStatuses) {
     auto H = [](int w, int h, uint32_t f) { return ImagePtr(VCImage_createEmpty(w, h, f)); };
     auto jpeg = [](ImagePtr i) { return ImagePtr(VCImage_encodeToJpeg(i.get(), 90)) ? 0 : -1; };
     auto path = [&](const char* name) { return dir.file(name); };
-    const struct {
-        std::function<int()> call;
-        int status;
-        std::vector<std::string> lines;
-    } rows[] = {
+    LogCapture_expectRows({
         // clang-format off
         {[] { return VCError_report(-42, "core/egl/OpenGLManager", 321); },
          -42, {e("VC_ERROR_NOT_IMPLEMENTED (-42): core/egl/OpenGLManager:321")}},
@@ -199,12 +195,7 @@ TEST(ImageCoreLog, LinesAndStatuses) {
          -8, {error("VC_ERROR_IO_FAILED", -8)}},
         {[&] { return VCImage_loadFromFile(nullptr, "x"); }, -2, {kNull}},
         // clang-format on
-    };
-    for (size_t i = 0; i < sizeof(rows) / sizeof(rows[0]); ++i) {
-        LogCapture log;
-        EXPECT_EQ(rows[i].status, rows[i].call()) << "row " << i;
-        EXPECT_TRUE(log.matches(rows[i].lines)) << "row " << i;
-    }
+    });
 }
 
 }  // namespace
