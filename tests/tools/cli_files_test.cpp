@@ -162,7 +162,7 @@ TEST_F(CliFiles, StreamedInputsAreRead) {
                       "timeout 20 sh -c \"cat '" + path("streamed.png") + "' >'" +
                           path("pipe.png") + "'\" </dev/null >/dev/null 2>&1 & ");
     ASSERT_EQ(0, r.status) << r.err;
-    ImagePtr out = load(path("read.png"));
+    ImagePtr out = loadPicture(path("read.png"));
     ASSERT_NE(nullptr, out);
     EXPECT_EQ(48 * 100 + 32, out->width * 100 + out->height);
 }
@@ -185,7 +185,7 @@ TEST_F(CliFiles, JpegsAreTurnedUprightAsTheirExifSays) {
     CliResult r = run(args);
     ASSERT_EQ(0, r.status) << r.err;
     for (int orientation = 1; orientation <= 8; ++orientation) {
-        ImagePtr out = load(path("upright/o" + std::to_string(orientation) + ".jpg"));
+        ImagePtr out = loadPicture(path("upright/o" + std::to_string(orientation) + ".jpg"));
         ASSERT_NE(nullptr, out);
         const bool turned = orientation >= 5;
         ASSERT_EQ(turned ? h : w, out->width) << orientation;
@@ -211,7 +211,7 @@ TEST_F(CliFiles, StraightAlphaIsKeptExactly) {
         writePng("alpha.png", *VCImageTest_wrap(picture.data(), 4, 4, VC_FORMAT_RGBA));
     CliResult r = run({"apply", "-e", "400", in, "-o", path("kept.png")});
     ASSERT_EQ(0, r.status) << r.err;
-    ImagePtr out = load(path("kept.png"));
+    ImagePtr out = loadPicture(path("kept.png"));
     ASSERT_NE(nullptr, out);
     EXPECT_EQ(picture, VCImageTest_bytes(*out));
 }
@@ -260,7 +260,7 @@ TEST_F(CliFiles, OutputsReplaceWholeWithUsualPermissionsInTheirFormat) {
         EXPECT_LT(st.st_size, 1 << 16) << c.output;
         const bool png = strcasecmp(out.c_str() + out.size() - 3, "png") == 0;
         EXPECT_TRUE(startsWith(kivtest::readFile(out), png ? kPngMagic : kJpegMagic)) << c.output;
-        EXPECT_NE(nullptr, load(out)) << c.output;
+        EXPECT_NE(nullptr, loadPicture(out)) << c.output;
     }
     // Nothing but the outputs is left behind.
     EXPECT_EQ(namesIn(path("pics.jpg")), (std::set<std::string>{"sheet.png"}));
@@ -284,7 +284,7 @@ TEST_F(CliFiles, ConcurrentWritersLeaveOneWholePicture) {
         ASSERT_EQ(0, system((script + "wait").c_str()));
         for (int i = 0; i < 4; ++i)
             EXPECT_EQ("0\n", kivtest::readText(path("status" + std::to_string(i)))) << i;
-        ImagePtr picture = load(out);
+        ImagePtr picture = loadPicture(out);
         ASSERT_NE(nullptr, picture);
         EXPECT_EQ(64, picture->height);
         EXPECT_TRUE(std::count(std::begin(sizes), std::end(sizes), picture->width) == 1);
@@ -361,7 +361,7 @@ TEST_F(CliSmallDisk, FullOrReadOnlyDiskFailsCleanly) {
     EXPECT_NE(std::string::npos, r.out.find("1 of 2 pictures written")) << r.out;
     EXPECT_NE(std::string::npos, r.err.find("No space left on device")) << r.err;
     EXPECT_EQ(namesIn(path("small/batch")), (std::set<std::string>{"flat.png"}));
-    ImagePtr written = load(path("small/batch/flat.png"));
+    ImagePtr written = loadPicture(path("small/batch/flat.png"));
     ASSERT_NE(nullptr, written);
     EXPECT_EQ(64, written->width);
 }

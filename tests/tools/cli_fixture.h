@@ -82,8 +82,6 @@ protected:
         return writePng(name, *VCImageTest_wrap(pixels.data(), w, h, VC_FORMAT_RGBA));
     }
 
-    static ImagePtr load(const std::string& file) { return loadPicture(file); }
-
     kivtest::TempDir mDir;
     LogCapture mQuiet;
 };

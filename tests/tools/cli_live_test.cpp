@@ -98,7 +98,7 @@ TEST_F(CliLiveTest, PreviewPicturesAPictureAndASnapshot) {
     EXPECT_GE(pngs, 20);
     // Each at the camera's size, with the camera's bars in it.
     for (const char* name : {"pic.jpg", "snap.png", "frames/frame_00001.png"}) {
-        ImagePtr picture = load(path(name));
+        ImagePtr picture = loadPicture(path(name));
         ASSERT_NE(picture, nullptr) << name;
         EXPECT_EQ(picture->width, 96) << name;
         EXPECT_EQ(picture->height, 64) << name;

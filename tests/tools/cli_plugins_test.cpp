@@ -74,8 +74,8 @@ TEST_F(CliPlugins, AppliesGlAndCpuPlugins) {
     ASSERT_EQ(0, run({"apply", "-e", kDuotone, in, "-o", path("d100.png")}).status);
     ASSERT_EQ(
         0, run({"apply", "-e", kSolarize, "-p", "threshold=100", in, "-o", path("s.png")}).status);
-    ImagePtr src = load(in), d50 = load(path("d50.png")), d100 = load(path("d100.png")),
-             s = load(path("s.png"));
+    ImagePtr src = loadPicture(in), d50 = loadPicture(path("d50.png")),
+             d100 = loadPicture(path("d100.png")), s = loadPicture(path("s.png"));
     ASSERT_TRUE(src && d50 && d100 && s);
     EXPECT_LE(VCImageTest_maxDifference(duotone(*src, 0.5), VCImageTest_bytes(*d50)), 3);
     EXPECT_LE(VCImageTest_maxDifference(duotone(*src, 1.0), VCImageTest_bytes(*d100)), 3);

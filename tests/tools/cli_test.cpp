@@ -275,7 +275,7 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
     CliResult r = run({"apply", "-v", "-e", "403", in, "-o", out});
     ASSERT_EQ(0, r.status) << r.err;
     EXPECT_NE(std::string::npos, r.out.find("403 Negative: " + out)) << r.out;
-    ImagePtr src = load(in), dst = load(out);
+    ImagePtr src = loadPicture(in), dst = loadPicture(out);
     ASSERT_TRUE(src && dst);
     ASSERT_EQ(w * 100 + h, dst->width * 100 + dst->height);
     const lookref::Picture picture(w, h, VCImageTest_bytes(*src));
@@ -286,7 +286,7 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
     r = run({"apply", "-e", "negative", "-p", "intensity=10", in, "-o", path("neg.jpg")});
     ASSERT_EQ(0, r.status) << r.err;
     EXPECT_NE(std::string::npos, r.err.find("403 Negative takes no parameters; -p is ignored"));
-    ImagePtr jpeg = load(path("neg.jpg"));
+    ImagePtr jpeg = loadPicture(path("neg.jpg"));
     ASSERT_NE(nullptr, jpeg);
     EXPECT_EQ(w, jpeg->width);
 }
@@ -341,7 +341,7 @@ TEST_F(Cli, PicturesNeedNoVideoLibraries) {
 TEST_F(Cli, GoldenSamplePicture) {
     CliResult r = run({"sample", "-o", path("sample.png"), "--size", "320x240"});
     ASSERT_EQ(0, r.status) << r.err;
-    ImagePtr image = load(path("sample.png"));
+    ImagePtr image = loadPicture(path("sample.png"));
     ASSERT_NE(nullptr, image);
     EXPECT_TRUE(matchesGolden(*image, "sample_320x240.png", 0));
     // Below 64 pixels a side there is no sample.
@@ -364,7 +364,7 @@ TEST_F(Cli, GoldenGalleryCells) {
               r.err.find("warning: " + std::to_string(without) + " of " +
                          std::to_string(served.size()) + " effects take no parameters"))
         << r.err;
-    ImagePtr sheet = load(path("gallery.png"));
+    ImagePtr sheet = loadPicture(path("gallery.png"));
     ASSERT_NE(nullptr, sheet);
     const int n = static_cast<int>(served.size()), thumbH = 32, cellW = 48 + 8,
               cellH = thumbH + 13 + 8;
