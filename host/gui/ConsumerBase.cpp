@@ -28,6 +28,9 @@ void ConsumerBase::abandon() {
 
 void ConsumerBase::abandonLocked() {
     mConsumer->consumerDisconnect();
+    // Read once the queue refuses frames, so no frame queued meanwhile is
+    // missing from the final count.
+    mFinalStats = mConsumer->getQueueStats();
     mConsumer.clear();
 }
 
@@ -63,7 +66,7 @@ status_t ConsumerBase::setConsumerUsageBits(uint64_t usage) {
 
 IGraphicBufferConsumer::QueueStats ConsumerBase::getQueueStats() {
     Mutex::Autolock lock(mMutex);
-    return mAbandoned ? IGraphicBufferConsumer::QueueStats() : mConsumer->getQueueStats();
+    return mAbandoned ? mFinalStats : mConsumer->getQueueStats();
 }
 
 void ConsumerBase::onFrameAvailable(const BufferItem& item) {

@@ -226,8 +226,8 @@ void VideoEncoder::fail(int status) {
 
 void VideoEncoder::abandonQueue() {
     State& s = *mState;
-    const uint64_t queued = s.consumer->getQueueStats().queued;  // 0 once abandoned
     s.consumer->abandon();
+    const uint64_t queued = s.consumer->getQueueStats().queued;  // final once abandoned
     std::lock_guard<std::mutex> guard(s.lock);
     if (queued > s.queuedAtAbandon) s.queuedAtAbandon = queued;
 }
@@ -417,7 +417,7 @@ VideoEncoderStats VideoEncoder::stats() const {
         if (result.queued < s.queuedAtAbandon) result.queued = s.queuedAtAbandon;
         consumer = s.consumer;
     }
-    // While the queue lives, its own count (an abandoned one reads 0).
+    // The queue's own count (an abandoned queue keeps its final one).
     if (consumer != nullptr) {
         const uint64_t queued = consumer->getQueueStats().queued;
         if (queued > result.queued) result.queued = queued;

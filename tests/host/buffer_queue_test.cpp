@@ -98,6 +98,11 @@ TEST(BufferQueueTest, FramesComeOutInOrderWithTheirNumbersTimesAndTransforms) {
     listener.clear();
     EXPECT_EQ(q.post(), 0);
     EXPECT_EQ(q.consumer->getQueueStats().queued, 3u);
+    // Abandoned: frames are refused and the final count stays (an encoder's
+    // statistics read it after closing).
+    q.consumer->abandon();
+    EXPECT_EQ(q.post(), NO_INIT);
+    EXPECT_EQ(q.consumer->getQueueStats().queued, 3u);
 }
 
 TEST(BufferQueueTest, DequeueBlocksUntilAReleaseOrItsTimeoutOnTheTestClock) {

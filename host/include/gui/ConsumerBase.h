@@ -28,7 +28,7 @@ public:
     status_t setDefaultBufferSize(uint32_t width, uint32_t height);
     status_t setDefaultBufferFormat(PixelFormat format);
     status_t setConsumerUsageBits(uint64_t usage);
-    // Host only: what the queue has seen.
+    // Host only: what the queue has seen (once abandoned, what it had seen then).
     IGraphicBufferConsumer::QueueStats getQueueStats();
 
 protected:
@@ -47,6 +47,8 @@ protected:
     sp<IGraphicBufferConsumer> mConsumer;
 
 private:
+    // What the queue had counted when it was abandoned (kept from then on).
+    IGraphicBufferConsumer::QueueStats mFinalStats;
     const bool mControlledByApp;
     Mutex mListenerMutex;
     wp<FrameAvailableListener> mFrameAvailableListener;
