@@ -15,7 +15,8 @@ void ConsumerBase::onFirstRef() {
     }
 }
 
-void ConsumerBase::onLastStrongRef(const void*) {
+void ConsumerBase::onLastStrongRef(const void* id) {
+    RefBase::onLastStrongRef(id);
     abandon();
 }
 
