@@ -166,14 +166,27 @@ unsigned char* SharedPixels::findDriverPixels() const {
     return count == 1 ? found : nullptr;
 }
 
-bool SharedPixels::mapPart(unsigned char* base, int k, int fd, size_t offset, bool populate) const {
+size_t SharedPixels::partLength(int k) const {
     const size_t first = (size_t)k * mPartBytes;
     const size_t end = (size_t)(static_cast<unsigned char*>(mMapping) + mFileSize - mPixels);
-    if (first >= end) return true;
-    const size_t length = std::min(mPartBytes, end - first);
-    return mmap(base + first, length, PROT_READ | PROT_WRITE,
+    return first >= end ? 0 : std::min(mPartBytes, end - first);
+}
+
+bool SharedPixels::mapPart(unsigned char* base, int k, int fd, size_t offset, bool populate) const {
+    const size_t length = partLength(k);
+    if (length == 0) return true;
+    return mmap(base + (size_t)k * mPartBytes, length, PROT_READ | PROT_WRITE,
                 MAP_SHARED | MAP_FIXED | (populate ? MAP_POPULATE : 0), fd,
                 (off_t)offset) != MAP_FAILED;
+}
+
+bool SharedPixels::movePart(unsigned char* base, int from, int to) const {
+    // Only the picture's last part may be shorter than the one before it.
+    const size_t length = partLength(from), moved = partLength(to);
+    if (moved == 0) return true;
+    if (length < moved) return false;
+    return mremap(base + (size_t)from * mPartBytes, length, moved, MREMAP_MAYMOVE | MREMAP_FIXED,
+                  base + (size_t)to * mPartBytes) != MAP_FAILED;
 }
 
 bool SharedPixels::useRing(size_t partBytes, int slots) {
@@ -202,11 +215,15 @@ bool SharedPixels::takePart(int k) {
     const size_t slot = (size_t)(k % mSlots) * mPartBytes;
     bool ok = true;
     for (unsigned char* base : {mPixels, mDriverPixels}) {
-        // The part before gets its own (never written) pages back: zeros.
+        // The slot's pages move on with their page tables: mapping them
+        // afresh would drop and rebuild an entry for every page of every
+        // part (a good part of a large picture's CPU time).
         const int before = k - mSlots;
+        const bool moved = before >= 0 && movePart(base, before, k);
+        // The part before gets its own (never written) pages back: zeros.
         if (before >= 0)
             ok = mapPart(base, before, mFd, pixelStart + (size_t)before * mPartBytes, false) && ok;
-        ok = mapPart(base, k, mRingFd, slot, true) && ok;
+        if (!moved) ok = mapPart(base, k, mRingFd, slot, true) && ok;
     }
     return ok;
 }

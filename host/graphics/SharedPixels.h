@@ -75,6 +75,11 @@ private:
 
     // Maps part k of the pixels at `base` onto `fd` at `offset`.
     bool mapPart(unsigned char* base, int k, int fd, size_t offset, bool populate) const;
+    // Moves the mapping of part `from` (its page tables with it) to part
+    // `to`; false when the kernel would not.
+    bool movePart(unsigned char* base, int from, int to) const;
+    // Bytes of part k inside the file.
+    size_t partLength(int k) const;
     unsigned char* findDriverPixels() const;
 
     size_t mDiscarded = 0;  // pixel bytes given back so far (whole pages)
