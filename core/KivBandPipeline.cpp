@@ -10,6 +10,7 @@
 #include <thread>
 #include <vector>
 
+#include "core/KivDecodeAhead.h"
 #include "core/egl/EglNativeSeam.h"
 #include "core/egl/EglProgram.h"
 #include "vccore/vc_convert.h"
@@ -142,13 +143,14 @@ int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
     return 0;
 }
 
-void KivBandPipeline::decode(VCStreamReader* reader) {
+void KivBandPipeline::decode(VCStreamReader* reader, KivDecodeAhead* ahead) {
     // RGBA rows are decoded straight into the source; rows that cross NV21
     // go through a band of the reader's own.
-    int rc = mPicture.throughNv21
-                 ? VCStreamReader_readBands(reader, kDecodeRows, onDecoded, this)
-                 : VCStreamReader_readBandsInPlace(reader, kDecodeRows, mSource.pitch(), onPlace,
-                                                   onPlaced, this);
+    const int rc = ahead != nullptr ? ahead->takeOver(mSource.pitch(), onPlace, onPlaced, this)
+                   : mPicture.throughNv21
+                       ? VCStreamReader_readBands(reader, kDecodeRows, onDecoded, this)
+                       : VCStreamReader_readBandsInPlace(reader, kDecodeRows, mSource.pitch(),
+                                                         onPlace, onPlaced, this);
     if (rc != 0) fail(rc);
 }
 
@@ -282,6 +284,14 @@ int KivBandPipeline::drawTiles(int y0, int y1, bool first) {
 }
 
 int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
+    return start(reader, nullptr, writer);
+}
+
+int KivBandPipeline::run(KivDecodeAhead* ahead, VCStreamWriter* writer) {
+    return mPicture.throughNv21 ? VC_ERROR_INVALID_STATE : start(nullptr, ahead, writer);
+}
+
+int KivBandPipeline::start(VCStreamReader* reader, KivDecodeAhead* ahead, VCStreamWriter* writer) {
     // Rings where they save anything: the source keeps the bands in flight,
     // the one being drawn and the reach on either side of it; the target the
     // band being drawn and those the encoder has not reached.
@@ -295,9 +305,9 @@ int KivBandPipeline::run(VCStreamReader* reader, VCStreamWriter* writer) {
         if (targetSlots < bands && mTarget.useBandRing(mBandRows, targetSlots))
             mTargetSlots = targetSlots;
     }
-    std::thread decoder([this, reader] {
-        pthread_setname_np(pthread_self(), "kiv-decode");
-        decode(reader);
+    std::thread decoder([this, reader, ahead] {
+        pthread_setname_np(pthread_self(), ahead != nullptr ? "kiv-hand-on" : "kiv-decode");
+        decode(reader, ahead);
     });
     std::thread encoder([this, writer] {
         pthread_setname_np(pthread_self(), "kiv-encode");

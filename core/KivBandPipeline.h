@@ -13,6 +13,8 @@
 //
 //   decoder thread:  reader -> rows of the source (through NV21 and back when
 //                    asked, as a picture decoded to NV21 reaches the GPU)
+//                    (or, for a picture already decoding, its kept rows
+//                    and then its decoder's, KivDecodeAhead)
 //   GL thread:       per band, once its source rows are there: draw, finish
 //   encoder thread:  rows of the target -> writer, then their memory goes
 //
@@ -39,6 +41,7 @@
 #include "vccore/vc_stream.h"
 
 class EglProgram;
+class KivDecodeAhead;
 
 class KivBandPipeline {
 public:
@@ -79,6 +82,9 @@ public:
     // why) or did not encode; VC_ERROR_UNKNOWN when a draw failed;
     // VC_ERROR_ALLOC_FAILED without memory for a band.
     int run(VCStreamReader* reader, VCStreamWriter* writer);
+    // The same with a picture already decoding (in RGBA: not through NV21),
+    // whose rows it takes over; `ahead` says why a picture did not decode.
+    int run(KivDecodeAhead* ahead, VCStreamWriter* writer);
 
     // Rows per drawn band for a picture `width` pixels wide: about a
     // megabyte of RGBA (each picture keeps a few bands on each side of GL,
@@ -101,7 +107,8 @@ private:
     void rowsStored(int end);
     // Rows decoded to RGBA, through NV21 into the source.
     int storeRows(const unsigned char* rgba, int first, int rows);
-    void decode(VCStreamReader* reader);
+    void decode(VCStreamReader* reader, KivDecodeAhead* ahead);
+    int start(VCStreamReader* reader, KivDecodeAhead* ahead, VCStreamWriter* writer);
     void encode(VCStreamWriter* writer);
     int draw();
     // Draws rows [y0, y1) tile by tile; 0 or the failure.

@@ -27,6 +27,7 @@ class EglWindowSurface;
 class EglProgram;
 class KivBuiltInFilterCatalog;
 class KivFilter;
+class KivDecodeAhead;
 
 // The thread that owns GL work of the current pipeline (shared with the live
 // render manager); 0 when none.
@@ -103,9 +104,12 @@ public:
     // whole-picture path serves; VC_ERROR_CODEC_FAILED when it does not
     // decode (*why says why) or encode; -7 when the context or the program
     // cannot be made.
+    // `ahead`, when given, is these bytes already decoding: an RGBA picture
+    // takes its rows from it (the caller owns it; whatever is not taken over
+    // stops when it is destroyed).
     int processStream(const unsigned char* bytes, size_t length, bool throughNv21,
                       const StreamOutput& output, unsigned char** stream, size_t* streamLength,
-                      VCDecodeFailure* why);
+                      VCDecodeFailure* why, KivDecodeAhead* ahead = nullptr);
 
     // Makes the context current and builds the program with the current effect
     // (and, on msm8974, enables 8K textures). 0 or -7.

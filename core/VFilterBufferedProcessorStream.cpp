@@ -7,6 +7,7 @@
 #include <memory>
 
 #include "core/KivBandPipeline.h"
+#include "core/KivDecodeAhead.h"
 #include "core/KivFilter.h"
 #include "core/KivPixelReach.h"
 #include "core/VFilterBufferedProcessorImpl.h"
@@ -127,15 +128,20 @@ struct WriterCloser {
 int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size_t length,
                                                 bool throughNv21, const StreamOutput& output,
                                                 unsigned char** stream, size_t* streamLength,
-                                                VCDecodeFailure* why) {
+                                                VCDecodeFailure* why, KivDecodeAhead* ahead) {
     if (bytes == nullptr || stream == nullptr || streamLength == nullptr || why == nullptr)
         return VC_ERROR_NULL_PARAM;
     *why = VC_DECODE_OK;
     // Where the platform's fast codec is installed, JPEG goes through it.
     if (VCStream_fastJpegCodecInstalled()) return unstreamable("the fast JPEG codec is installed");
-    std::unique_ptr<VCStreamReader, ReaderCloser> reader(VCStreamReader_open(bytes, length));
-    int width = 0, height = 0;
-    if (reader == nullptr || VCStreamReader_readHeader(reader.get(), &width, &height) != 0) {
+    if (ahead != nullptr && (throughNv21 || !ahead->ok() || ahead->bytes() != bytes))
+        ahead = nullptr;
+    std::unique_ptr<VCStreamReader, ReaderCloser> reader(
+        ahead != nullptr ? nullptr : VCStreamReader_open(bytes, length));
+    int width = ahead != nullptr ? ahead->width() : 0;
+    int height = ahead != nullptr ? ahead->height() : 0;
+    if (ahead == nullptr &&
+        (reader == nullptr || VCStreamReader_readHeader(reader.get(), &width, &height) != 0)) {
         *why = reader == nullptr ? VC_DECODE_NOT_A_PICTURE : VCStreamReader_failure(reader.get());
         return VC_ERROR_CODEC_FAILED;
     }
@@ -222,15 +228,17 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         tiles.source = gl.source.get();
         tiles.target = gl.target.get();
         KivBandPipeline pipeline(*mProgram, sourceRows, targetRows, picture, &tiles);
-        rc = pipeline.run(reader.get(), writer.get());
+        rc = ahead != nullptr ? pipeline.run(ahead, writer.get())
+                              : pipeline.run(reader.get(), writer.get());
         // The next picture is drawn whole again.
         mProgram->setWindow(nullptr);
     } else {
         KivBandPipeline pipeline(*mProgram, *gl.source, *gl.target, picture);
-        rc = pipeline.run(reader.get(), writer.get());
+        rc = ahead != nullptr ? pipeline.run(ahead, writer.get())
+                              : pipeline.run(reader.get(), writer.get());
     }
     if (rc != 0) {
-        *why = VCStreamReader_failure(reader.get());
+        *why = ahead != nullptr ? ahead->failure() : VCStreamReader_failure(reader.get());
         return rc;
     }
     EglLog(VF_LOG_DEBUG, "EGL: Synchronously waiting for rendering...");

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "core/KivBandPipeline.h"
+#include "core/KivDecodeAhead.h"
 #include "core/KivFilter.h"
 #include "core/KivImaging.h"
 #include "core/KivPixelReach.h"
@@ -312,6 +313,192 @@ TEST(StreamFile, ProcessFileWritesTheWholePathsFile) {
                   bands.processor.doProcessNV21(nv21->data, nv21->width, nv21->height, rgba->data));
         ASSERT_EQ(0, VCImage_saveToFile(rgba.get(), want.c_str(), 98));
         EXPECT_TRUE(kivtest::readFile(got) == kivtest::readFile(want)) << output;
+    }
+}
+
+// The rows a plain reader decodes, `width * 4` bytes apart.
+Bytes decodedRows(const Bytes& input) {
+    struct Rows {
+        Bytes rgba;
+        static int add(void* self, const unsigned char* rgba, int, int rows) {
+            Rows* r = static_cast<Rows*>(self);
+            r->rgba.insert(r->rgba.end(), rgba, rgba + (size_t)rows * r->rowBytes);
+            return 0;
+        }
+        size_t rowBytes;
+    } rows{{}, 0};
+    VCStreamReader* reader = VCStreamReader_open(input.data(), input.size());
+    int width = 0, height = 0;
+    EXPECT_EQ(0, VCStreamReader_readHeader(reader, &width, &height));
+    rows.rowBytes = (size_t)width * 4;
+    EXPECT_EQ(0, VCStreamReader_readBands(reader, 16, Rows::add, &rows));
+    VCStreamReader_close(reader);
+    return rows.rgba;
+}
+
+// What a band pipeline does with taken-over rows, as a table: where they go
+// (`pitch` bytes apart, padding marked), in what order, and a refusal at a
+// chosen row.
+struct Consumer {
+    explicit Consumer(int width, int height, size_t pitch, int refuseAt = -1, int placeRefusal = 0)
+        : width(width),
+          pitch(pitch),
+          refuseAt(refuseAt),
+          placeRefusal(placeRefusal),
+          rows((size_t)height * pitch, 0xA5) {}
+    static unsigned char* place(void* self, int first, int) {
+        Consumer* c = static_cast<Consumer*>(self);
+        if (c->placeRefusal != 0 && first >= c->refuseAt) return nullptr;
+        return c->rows.data() + (size_t)first * c->pitch;
+    }
+    static int band(void* self, const unsigned char* rgba, int first, int count) {
+        Consumer* c = static_cast<Consumer*>(self);
+        EXPECT_EQ(c->next, first);
+        EXPECT_EQ(c->rows.data() + (size_t)first * c->pitch, rgba);
+        c->next = first + count;
+        return c->placeRefusal == 0 && c->refuseAt >= 0 && first >= c->refuseAt ? -42 : 0;
+    }
+    // The rows without their padding; false when the padding was written.
+    bool unpadded(Bytes* out) const {
+        bool padding = true;
+        for (size_t y = 0; y < rows.size() / pitch; ++y) {
+            const unsigned char* row = rows.data() + y * pitch;
+            out->insert(out->end(), row, row + (size_t)width * 4);
+            for (size_t x = (size_t)width * 4; x < pitch; ++x) padding &= row[x] == 0xA5;
+        }
+        return padding;
+    }
+    int width;
+    size_t pitch;
+    int refuseAt, placeRefusal;
+    Bytes rows;
+    int next = 0;
+};
+
+// A picture decoding ahead hands its kept rows on, then decodes straight
+// where the consumer places them (at the consumer's pitch, the kept rows'
+// one or another), whatever part the budget kept: the plain reader's rows,
+// in order, padding untouched. The kept rows stop at the budget (whole
+// 16-row bands) or at the picture's end.
+TEST(DecodeAhead, HandsOnTheReadersRowsWithinItsBudget) {
+    const int width = 50, height = 210;  // kept rows 200 bytes -> 256 apart
+    const size_t kept = 256;
+    for (bool png : {false, true}) {
+        const Bytes input = pictureFile(width, height, png);
+        const Bytes want = decodedRows(input);
+        struct Case {
+            size_t budget;
+            int keptRows;
+        } cases[] = {{0, 0}, {kept * 40, 32}, {kept * 300, height}};
+        for (const Case& c : cases)
+            for (size_t pitch : {kept, size_t(width * 4), kept + 64}) {
+                SCOPED_TRACE(testing::Message()
+                             << "png " << png << " budget " << c.budget << " pitch " << pitch);
+                KivDecodeAhead ahead(input.data(), input.size(), c.budget);
+                ASSERT_TRUE(ahead.ok());
+                EXPECT_EQ(width, ahead.width());
+                EXPECT_EQ(height, ahead.height());
+                EXPECT_EQ(c.keptRows, ahead.keptRowsWhenWaiting());
+                Consumer consumer(width, height, pitch);
+                EXPECT_EQ(0, ahead.takeOver(pitch, Consumer::place, Consumer::band, &consumer));
+                EXPECT_EQ(height, consumer.next);
+                Bytes got;
+                EXPECT_TRUE(consumer.unpadded(&got));
+                EXPECT_TRUE(got == want);
+            }
+    }
+}
+
+// Failures end the decoding without a hang: a picture cut short says why
+// after its good rows; a consumer that refuses a place or a band stops the
+// decoder with its status, from the kept rows or after them; a decoding
+// nobody takes over stops when it is destroyed; bytes that are not a
+// picture start nothing.
+TEST(DecodeAhead, FailuresEndTheDecoding) {
+    const int width = 64, height = 210;
+    const Bytes jpeg = pictureFile(width, height);
+    const Bytes truncated(jpeg.begin(), jpeg.begin() + jpeg.size() / 2);
+    const size_t pitch = width * 4, budget = pitch * 64;
+    struct Row {
+        const char* what;
+        const Bytes& input;
+        int refuseAt, placeRefusal;
+        int status;
+        VCDecodeFailure why;
+    } table[] = {
+        {"cut short", truncated, -1, 0, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+        {"place refused in the kept rows", jpeg, 32, 1, VC_ERROR_INVALID_STATE, VC_DECODE_OK},
+        {"place refused after them", jpeg, 128, 1, VC_ERROR_INVALID_STATE, VC_DECODE_OK},
+        {"band refused in the kept rows", jpeg, 32, 0, -42, VC_DECODE_OK},
+        {"band refused after them", jpeg, 128, 0, -42, VC_DECODE_OK},
+    };
+    for (const Row& row : table) {
+        KivDecodeAhead ahead(row.input.data(), row.input.size(), budget);
+        ASSERT_TRUE(ahead.ok()) << row.what;
+        Consumer consumer(width, height, pitch, row.refuseAt, row.placeRefusal);
+        EXPECT_EQ(row.status, ahead.takeOver(pitch, Consumer::place, Consumer::band, &consumer))
+            << row.what;
+        EXPECT_EQ(row.why, ahead.failure()) << row.what;
+        if (row.refuseAt >= 0) {
+            EXPECT_EQ(row.placeRefusal != 0 ? row.refuseAt : row.refuseAt + 16, consumer.next)
+                << row.what;
+        }
+    }
+    for (size_t keep : {size_t(0), budget, pitch * 300}) {
+        KivDecodeAhead abandoned(jpeg.data(), jpeg.size(), keep);
+        EXPECT_TRUE(abandoned.ok());
+    }
+    const Bytes text = {'n', 'o', 't', ' ', 'a', ' ', 'p', 'i', 'c'};
+    KivDecodeAhead none(text.data(), text.size(), budget);
+    EXPECT_FALSE(none.ok());
+    Consumer consumer(width, height, pitch);
+    EXPECT_EQ(VC_ERROR_INVALID_STATE,
+              none.takeOver(pitch, Consumer::place, Consumer::band, &consumer));
+}
+
+// The processor takes a picture decoding ahead over for RGBA (JPEG or PNG
+// out, the budget short of the picture or not, tiles too) and gives the
+// bytes it gives without; through NV21 it decodes the picture itself.
+TEST(DecodeAhead, ProcessorGivesTheSameBytes) {
+    Bands bands;
+    bands.processor.setEffect(401);
+    const Bytes jpeg = pictureFile(kWidth, kHeight), png = pictureFile(kWidth, kHeight, true);
+    const Bytes truncated(jpeg.begin(), jpeg.begin() + jpeg.size() * 2 / 3);
+    struct Case {
+        const Bytes& input;
+        bool nv21, png;
+        size_t budget;
+        int maxTexture;  // 0: the GPU's own
+        int status;
+        VCDecodeFailure why;
+    } cases[] = {
+        {jpeg, false, false, 0, 0, 0, VC_DECODE_OK},
+        {jpeg, false, false, (size_t)kWidth * 4 * 48, 0, 0, VC_DECODE_OK},
+        {jpeg, false, true, SIZE_MAX, 0, 0, VC_DECODE_OK},
+        {png, false, true, (size_t)kWidth * 4 * 100, 0, 0, VC_DECODE_OK},
+        {jpeg, false, false, (size_t)kWidth * 4 * 48, 128, 0, VC_DECODE_OK},
+        {jpeg, true, false, SIZE_MAX, 0, 0, VC_DECODE_OK},
+        {truncated, false, false, (size_t)kWidth * 4 * 48, 0, VC_ERROR_CODEC_FAILED,
+         VC_DECODE_TRUNCATED},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(testing::Message() << "nv21 " << c.nv21 << " png " << c.png << " budget "
+                                        << c.budget << " texture " << c.maxTexture);
+        if (c.maxTexture > 0) Platform::setMaximumTextureSizeForTesting(c.maxTexture);
+        int rc = -1;
+        VCDecodeFailure why;
+        const Bytes plain = bands.streamed(c.input, c.nv21, {c.png, 90}, &rc, &why);
+        ASSERT_EQ(c.status, rc);
+        ASSERT_EQ(c.why, why);
+        KivDecodeAhead ahead(c.input.data(), c.input.size(), c.budget);
+        unsigned char* stream = nullptr;
+        size_t length = 0;
+        EXPECT_EQ(c.status,
+                  bands.processor.processStream(c.input.data(), c.input.size(), c.nv21, {c.png, 90},
+                                                &stream, &length, &why, &ahead));
+        EXPECT_EQ(c.why, why);
+        EXPECT_TRUE(owned(stream, length) == plain);
+        Platform::resetForTesting();
     }
 }
 

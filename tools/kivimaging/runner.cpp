@@ -132,7 +132,8 @@ VCImage* EffectRunner::run(const VCImage* input, std::string* error) {
 
 EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned char>& bytes,
                                                    const std::string& path, bool png, int quality,
-                                                   AtomicFile* output, std::string* error) {
+                                                   AtomicFile* output, std::string* error,
+                                                   KivDecodeAhead* ahead) {
     if (mProcessor == nullptr) return STREAM_UNSUITED;
     int errorsBefore = cliLogErrorCount();
     unsigned char* unused = nullptr;
@@ -144,8 +145,8 @@ EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned ch
         return static_cast<AtomicFile*>(file)->write(bytes, n) ? 0 : -1;
     };
     out.sinkUser = output;
-    int rc =
-        mProcessor->processStream(bytes.data(), bytes.size(), false, out, &unused, &length, &why);
+    int rc = mProcessor->processStream(bytes.data(), bytes.size(), false, out, &unused, &length,
+                                       &why, ahead);
     if (rc == VC_ERROR_UNSUPPORTED) return STREAM_UNSUITED;
     if (rc == 0 && cliLogErrorCount() == errorsBefore) return STREAM_DONE;
     if (why != VC_DECODE_OK) {

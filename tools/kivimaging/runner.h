@@ -12,6 +12,7 @@
 #include "file_io.h"
 #include "vccore/vc_image.h"
 
+class KivDecodeAhead;
 class VFilterBufferedProcessorImpl;
 
 namespace kivcli {
@@ -43,8 +44,10 @@ public:
     // when this picture or GPU needs the whole-picture path (nothing done);
     // STREAM_FAILED with a message (`path` names the input in it).
     enum StreamResult { STREAM_DONE, STREAM_UNSUITED, STREAM_FAILED };
+    // `ahead`, when given, is `bytes` already being decoded.
     StreamResult runStream(const std::vector<unsigned char>& bytes, const std::string& path,
-                           bool png, int quality, AtomicFile* output, std::string* error);
+                           bool png, int quality, AtomicFile* output, std::string* error,
+                           KivDecodeAhead* ahead = nullptr);
 
     EffectRunner(const EffectRunner&) = delete;
     EffectRunner& operator=(const EffectRunner&) = delete;
