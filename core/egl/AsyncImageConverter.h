@@ -45,6 +45,10 @@ public:
 
         // Bands a frame of this height is cut into; 0 when it is not cut.
         static int sliceCount(int height);
+        // Rows a band of bandRows converted from one format to the other is
+        // taken in at a time, so that threads that finish early can share
+        // what is left of the others.
+        static int chunkRows(int bandRows, int width, uint32_t from, uint32_t to);
         bool hasSource() const { return mSource != nullptr; }
 
     private:

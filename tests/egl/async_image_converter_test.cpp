@@ -147,6 +147,38 @@ INSTANTIATE_TEST_SUITE_P(AllFormats, ConverterPairs,
                          testing::Combine(testing::ValuesIn(kFormats), testing::ValuesIn(kFormats)),
                          VCImageTest_pairName);
 
+// Frames large enough for their bands to be taken a chunk of rows at a time,
+// with a shorter last chunk: four bands (height a multiple of 8) and two.
+TEST(AsyncImageConverter, ChunkedBandsMatchTheImageCore) {
+    LogCapture log;
+    struct Frame {
+        int width, height;
+        uint32_t from, to;
+    };
+    const Frame frames[] = {{2048, 1048, VC_FORMAT_RGBA, VC_FORMAT_NV21},
+                            {2048, 1048, VC_FORMAT_NV21, VC_FORMAT_RGBA},
+                            {2048, 1048, VC_FORMAT_RGB8, VC_FORMAT_YUYV},
+                            {2048, 1052, VC_FORMAT_NV12, VC_FORMAT_RGB8},
+                            {2048, 1052, VC_FORMAT_BGRA, VC_FORMAT_NV12}};
+    int n = 0;
+    for (const Frame& f : frames) {
+        SCOPED_TRACE(n);
+        const int bandRows = f.height / AsyncImageConverter::ConvertJob::sliceCount(f.height);
+        ASSERT_LT(AsyncImageConverter::ConvertJob::chunkRows(bandRows, f.width, f.from, f.to),
+                  bandRows);
+        ImagePtr source = VCImageTest_random(f.width, f.height, f.from, 300 + n);
+        const Expected want = cpuConversion(*source, f.to);
+        ASSERT_EQ(0, want.status);
+        FrameCollector listener(f.to);
+        log.clear();
+        ASSERT_EQ(0, postAsync(source.release(), listener, n++, true));
+        ASSERT_EQ(1u, listener.frames().size());
+        EXPECT_TRUE(sameBytes(want, listener.frames()[0].bytes));
+        // By the bands, not by the whole-frame fallback.
+        EXPECT_EQ(1u, log.countPrefix("[Async/Slices] Time to convert"));
+    }
+}
+
 TEST(AsyncImageConverter, SliceCountFollowsTheHeight) {
     const int table[][2] = {{720, 4}, {740, 2}, {738, 0}, {3000, 4}, {1084, 2}, {8, 4},
                             {4, 2},   {2, 0},   {1, 0},   {0, 0},    {-8, 0}};
