@@ -18,23 +18,37 @@
 // run to run (the most any split of the work across cores can gain on the
 // machine it runs on, before the converter's own threads and hand-overs).
 //
+// Two more lines say where an asynchronous frame's time goes: the same bands
+// converted one band a thread on a fresh WorkQueue (how the converter cut
+// frames before its threads shared out chunks of rows), and a breakdown of
+// asynchronous frames from the converter's own log lines, stamped as they are
+// issued (nothing formatted): the worker taking the frame, the first chunk
+// of rows starting, the last chunk done and the frame posted, with how many
+// threads and cores converted.
+//
 // Any --benchmark_* flag runs the same sides through Google Benchmark instead.
 #include <benchmark/benchmark.h>
+#include <sched.h>
+#include <stdarg.h>
 #include <stdio.h>
 #include <string.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
 #include <chrono>
 #include <condition_variable>
 #include <functional>
 #include <mutex>
 #include <random>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "bench_common.h"
 #include "core/egl/AsyncImageConverter.h"
+#include "core/egl/WorkQueue.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_log.h"
 
@@ -53,6 +67,7 @@ class WaitingListener : public OnFrameListener {
 public:
     void onFrameProcessed(const VCImage& image, long long) override {
         std::lock_guard<std::mutex> g(mLock);
+        mPosted = Clock::now();
         mLastFirstByte = image.data[0];
         ++mFrames;
         mChanged.notify_all();
@@ -71,6 +86,10 @@ public:
         std::lock_guard<std::mutex> g(mLock);
         return mErrors;
     }
+    Clock::time_point posted() {
+        std::lock_guard<std::mutex> g(mLock);
+        return mPosted;
+    }
 
 private:
     std::mutex mLock;
@@ -78,6 +97,7 @@ private:
     long mFrames = 0;
     long mErrors = 0;
     int mLastFirstByte = 0;
+    Clock::time_point mPosted;
 };
 
 // One picture size: the RGBA source, a preallocated NV21 target for the
@@ -208,6 +228,152 @@ private:
     std::thread mHelper;
 };
 
+// The frame cut as the converter cuts it (four bands when the height is a
+// multiple of 8) and converted one band a thread on a fresh four-thread
+// WorkQueue, as the converter did before its threads shared out chunks.
+class FixedBands {
+public:
+    explicit FixedBands(Setup& s) : mSetup(s) {
+        const int w = s.width, h = s.height, rows = h / 4;
+        for (int i = 0; i < 4; ++i) {
+            mSources[i] = VCImage_createWrap(s.source->data + i * rows * w * 4, w, rows,
+                                             VC_FORMAT_RGBA, 0, 0);
+            const uint32_t uv = static_cast<uint32_t>(w * h + i * (rows / 2) * w - i * rows * w);
+            mTargets[i] =
+                VCImage_createWrap(s.target->data + i * rows * w, w, rows, VC_FORMAT_NV21, 0, uv);
+        }
+    }
+    ~FixedBands() {
+        for (int i = 0; i < 4; ++i) {
+            VCImage_destroy(mSources[i]);
+            VCImage_destroy(mTargets[i]);
+        }
+    }
+    double run() {
+        const Clock::time_point t0 = Clock::now();
+        int statuses[4] = {-1, -1, -1, -1};
+        {
+            android::WorkQueue queue(4, true);
+            for (int i = 0; i < 4; ++i)
+                mSetup.ok =
+                    mSetup.ok &&
+                    queue.schedule(new Band(mSources[i], mTargets[i], &statuses[i]), 2) == 0;
+            queue.finish();
+        }
+        const Clock::time_point t1 = Clock::now();
+        for (int status : statuses) mSetup.ok = mSetup.ok && status == VC_OK;
+        return seconds(t0, t1);
+    }
+
+private:
+    class Band : public android::WorkQueue::WorkUnit {
+    public:
+        Band(VCImage* s, VCImage* d, int* status) : mS(s), mD(d), mStatus(status) {}
+        bool run() override {
+            *mStatus = VCImage_convert(mS, mD);
+            return true;
+        }
+
+    private:
+        VCImage *mS, *mD;
+        int* mStatus;
+    };
+    Setup& mSetup;
+    VCImage* mSources[4];
+    VCImage* mTargets[4];
+};
+
+// The converter's log lines of one asynchronous frame, stamped as they are
+// issued: the worker probing for the external converter (it has taken the
+// frame), each chunk's VCImage_convert starting (with its thread and core),
+// and the slice path done. Only the format is looked at.
+class Stamps {
+public:
+    enum Kind { kTaken, kChunk, kSliced };
+    struct Event {
+        Clock::time_point t;
+        Kind kind;
+        pid_t thread;
+        int cpu;
+    };
+    static void log(int, const char* format, ...) {
+        Kind kind;
+        if (strcmp(format, "%s: %dx%d %4.4s --> %4.4s") == 0) {
+            kind = kTaken;
+        } else if (strncmp(format, "[VCImage] Converting from", 25) == 0) {
+            kind = kChunk;
+        } else if (strcmp(format, "%s") == 0) {
+            va_list args;
+            va_start(args, format);
+            const char* line = va_arg(args, const char*);
+            va_end(args);
+            if (strncmp(line, "[Async/Slices]", 14) != 0) return;
+            kind = kSliced;
+        } else {
+            return;
+        }
+        const int i = sCount.fetch_add(1);
+        if (i < kMax) sEvents[i] = {Clock::now(), kind, gettid(), sched_getcpu()};
+    }
+    static void reset() { sCount = 0; }
+    static std::vector<Event> events() {
+        return std::vector<Event>(sEvents, sEvents + std::min(sCount.load(), kMax));
+    }
+
+private:
+    static constexpr int kMax = 256;
+    static Event sEvents[kMax];
+    static std::atomic<int> sCount;
+};
+Stamps::Event Stamps::sEvents[Stamps::kMax];
+std::atomic<int> Stamps::sCount{0};
+
+// Asynchronous frames taken apart from their stamps; medians over frames.
+void printBreakdown(Setup& big, int frames) {
+    VF_LogMsg = Stamps::log;
+    std::vector<double> taken, first, converting, posted, woken, whole, threads, cores;
+    for (int f = 0; f < frames; ++f) {
+        VCImage* copy = VCImage_clone(big.source);
+        Stamps::reset();
+        const Clock::time_point t0 = Clock::now();
+        big.ok = big.ok && big.converter->convertAndPost(copy, big.listener, f, true) == 0;
+        big.listener.waitFor(++big.posted);
+        const Clock::time_point t3 = Clock::now();
+        const std::vector<Stamps::Event> events = Stamps::events();
+        Clock::time_point tTaken{}, tFirst = Clock::time_point::max(), tSliced{};
+        std::set<pid_t> tids;
+        std::set<int> cpus;
+        for (const Stamps::Event& e : events) {
+            if (e.kind == Stamps::kTaken) tTaken = e.t;
+            if (e.kind == Stamps::kSliced) tSliced = e.t;
+            if (e.kind != Stamps::kChunk) continue;
+            tFirst = std::min(tFirst, e.t);
+            tids.insert(e.thread);
+            cpus.insert(e.cpu);
+        }
+        if (tids.empty() || tTaken == Clock::time_point{} || tSliced == Clock::time_point{}) {
+            big.ok = false;
+            break;
+        }
+        taken.push_back(seconds(t0, tTaken));
+        first.push_back(seconds(tTaken, tFirst));
+        converting.push_back(seconds(tFirst, tSliced));
+        posted.push_back(seconds(tSliced, big.listener.posted()));
+        woken.push_back(seconds(big.listener.posted(), t3));
+        whole.push_back(seconds(t0, t3));
+        threads.push_back(static_cast<double>(tids.size()));
+        cores.push_back(static_cast<double>(cpus.size()));
+    }
+    VF_LogMsg = quietLog;
+    printf(
+        "  async 4000x3000 frame taken apart (medians of %d frames, ms): worker takes it %.3f, "
+        "first chunk starts %.3f later, chunks to bands joined %.3f, to the listener %.3f, "
+        "caller woken %.3f; whole %.3f; %.0f threads converted on %.0f cores\n",
+        frames, median(taken) * 1e3, median(first) * 1e3, median(converting) * 1e3,
+        median(posted) * 1e3, median(woken) * 1e3, median(whole) * 1e3, median(threads),
+        median(cores));
+}
+
 // Rounds of blocks of runs, sides in a rotating order; per side the block
 // minima of every round.
 std::vector<std::vector<double>> pairedRounds(const std::vector<std::function<double()>>& sides,
@@ -285,15 +451,16 @@ int main(int argc, char** argv) {
     {
         Setup big(4000, 3000);
         Halves halves(big);
+        FixedBands fixed(big);
         // The halves' bands must make the whole frame's bytes, or their time means nothing.
         halves.run();
         VCImage* whole = VCImage_createNew(big.width, big.height, VC_FORMAT_NV21);
         ok = ok && whole != nullptr && VCImage_convert(big.source, whole) == VC_OK &&
              memcmp(whole->data, big.target->data, whole->size) == 0;
         VCImage_destroy(whole);
-        std::vector<std::function<double()>> sides = {[&] { return big.single(); },
-                                                      [&] { return big.async(); },
-                                                      [&] { return halves.run(); }};
+        std::vector<std::function<double()>> sides = {
+            [&] { return big.single(); }, [&] { return big.async(); }, [&] { return halves.run(); },
+            [&] { return fixed.run(); }};
 #ifdef KIV_HAVE_LIBYUV
         sides.push_back([&] { return big.libyuv(); });
 #endif
@@ -306,8 +473,8 @@ int main(int argc, char** argv) {
         printf("  async end to end                %8.2f ms (%.2f-%.2f)\n", async.median * 1e3,
                async.low * 1e3, async.high * 1e3);
 #ifdef KIV_HAVE_LIBYUV
-        const Spread yuv = spread(m[3]);
-        const Spread ry = spread(ratios(m[1], m[3]));
+        const Spread yuv = spread(m[4]);
+        const Spread ry = spread(ratios(m[1], m[4]));
         printf("  libyuv ABGRToNV21 single thread %8.2f ms (%.2f-%.2f)\n", yuv.median * 1e3,
                yuv.low * 1e3, yuv.high * 1e3);
 #endif
@@ -320,6 +487,12 @@ int main(int argc, char** argv) {
         const Spread rh = spread(ratios(m[2], m[0]));
         printf("  two threads made once converting halves, against one: %.2f (range %.2f-%.2f)\n",
                rh.median, rh.low, rh.high);
+        const Spread rf = spread(ratios(m[3], m[0]));
+        printf(
+            "  one band a thread on a fresh four-thread WorkQueue, against one: %.2f (range "
+            "%.2f-%.2f)\n",
+            rf.median, rf.low, rf.high);
+        printBreakdown(big, 20);
         ok = ok && big.ok;
         const Spread ceiling = copyCeiling();
         printf("  memcpy of 48 MB, two threads against one: %.2f (range %.2f-%.2f)\n",
