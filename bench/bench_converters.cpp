@@ -156,21 +156,33 @@ struct Setup {
     bool ok = true;
 };
 
+// The picture cut into count equal bands, as views of the source and of the
+// single-threaded sides' target; a band's chroma rows stay where the whole
+// frame has them.
+struct BandViews {
+    BandViews(Setup& s, int count) {
+        const int w = s.width, h = s.height, rows = h / count;
+        for (int i = 0; i < count; ++i) {
+            sources.push_back(VCImage_createWrap(s.source->data + i * rows * w * 4, w, rows,
+                                                 VC_FORMAT_RGBA, 0, 0));
+            const uint32_t uv = static_cast<uint32_t>(w * h + i * (rows / 2) * w - i * rows * w);
+            targets.push_back(
+                VCImage_createWrap(s.target->data + i * rows * w, w, rows, VC_FORMAT_NV21, 0, uv));
+        }
+    }
+    ~BandViews() {
+        for (VCImage* v : sources) VCImage_destroy(v);
+        for (VCImage* v : targets) VCImage_destroy(v);
+    }
+    std::vector<VCImage*> sources, targets;
+};
+
 // The same conversion split in two halves on two threads that live across
 // runs (one wake-up a run, no thread made, no queue): what splitting the work
 // across the cores gains at best here, the bound under the converter's bands.
 class Halves {
 public:
-    explicit Halves(Setup& s) : mSetup(s) {
-        const int w = s.width, h = s.height, half = h / 2;
-        for (int i = 0; i < 2; ++i) {
-            mSources[i] = VCImage_createWrap(s.source->data + i * half * w * 4, w, half,
-                                             VC_FORMAT_RGBA, 0, 0);
-            // The band's chroma rows stay where the whole frame has them.
-            const uint32_t uv = static_cast<uint32_t>(w * h + i * (half / 2) * w - i * half * w);
-            mTargets[i] =
-                VCImage_createWrap(s.target->data + i * half * w, w, half, VC_FORMAT_NV21, 0, uv);
-        }
+    explicit Halves(Setup& s) : mSetup(s), mBands(s, 2) {
         mHelper = std::thread([this] {
             long seen = 0;
             for (;;) {
@@ -180,7 +192,7 @@ public:
                     if (mQuit) return;
                     seen = mRun;
                 }
-                const int status = VCImage_convert(mSources[1], mTargets[1]);
+                const int status = VCImage_convert(mBands.sources[1], mBands.targets[1]);
                 std::lock_guard<std::mutex> g(mLock);
                 mStatus = status;
                 mDone = seen;
@@ -195,10 +207,6 @@ public:
             mChanged.notify_all();
         }
         mHelper.join();
-        for (int i = 0; i < 2; ++i) {
-            VCImage_destroy(mSources[i]);
-            VCImage_destroy(mTargets[i]);
-        }
     }
     double run() {
         const Clock::time_point t0 = Clock::now();
@@ -208,7 +216,7 @@ public:
             run = ++mRun;
             mChanged.notify_all();
         }
-        const int status = VCImage_convert(mSources[0], mTargets[0]);
+        const int status = VCImage_convert(mBands.sources[0], mBands.targets[0]);
         std::unique_lock<std::mutex> g(mLock);
         mChanged.wait(g, [&] { return mDone == run; });
         const Clock::time_point t1 = Clock::now();
@@ -218,8 +226,7 @@ public:
 
 private:
     Setup& mSetup;
-    VCImage* mSources[2];
-    VCImage* mTargets[2];
+    BandViews mBands;
     std::mutex mLock;
     std::condition_variable mChanged;
     long mRun = 0, mDone = 0;
@@ -233,31 +240,16 @@ private:
 // WorkQueue, as the converter did before its threads shared out chunks.
 class FixedBands {
 public:
-    explicit FixedBands(Setup& s) : mSetup(s) {
-        const int w = s.width, h = s.height, rows = h / 4;
-        for (int i = 0; i < 4; ++i) {
-            mSources[i] = VCImage_createWrap(s.source->data + i * rows * w * 4, w, rows,
-                                             VC_FORMAT_RGBA, 0, 0);
-            const uint32_t uv = static_cast<uint32_t>(w * h + i * (rows / 2) * w - i * rows * w);
-            mTargets[i] =
-                VCImage_createWrap(s.target->data + i * rows * w, w, rows, VC_FORMAT_NV21, 0, uv);
-        }
-    }
-    ~FixedBands() {
-        for (int i = 0; i < 4; ++i) {
-            VCImage_destroy(mSources[i]);
-            VCImage_destroy(mTargets[i]);
-        }
-    }
+    explicit FixedBands(Setup& s) : mSetup(s), mBands(s, 4) {}
     double run() {
         const Clock::time_point t0 = Clock::now();
         int statuses[4] = {-1, -1, -1, -1};
         {
             android::WorkQueue queue(4, true);
             for (int i = 0; i < 4; ++i)
-                mSetup.ok =
-                    mSetup.ok &&
-                    queue.schedule(new Band(mSources[i], mTargets[i], &statuses[i]), 2) == 0;
+                mSetup.ok = mSetup.ok && queue.schedule(new Band(mBands.sources[i],
+                                                                 mBands.targets[i], &statuses[i]),
+                                                        2) == 0;
             queue.finish();
         }
         const Clock::time_point t1 = Clock::now();
@@ -279,8 +271,7 @@ private:
         int* mStatus;
     };
     Setup& mSetup;
-    VCImage* mSources[4];
-    VCImage* mTargets[4];
+    BandViews mBands;
 };
 
 // The converter's log lines of one asynchronous frame, stamped as they are

@@ -86,6 +86,25 @@ int postAsync(VCImage* source, FrameCollector& listener, nsecs_t timestamp, bool
     return status;
 }
 
+struct Frame {
+    int width, height;
+    uint32_t from, to;
+};
+
+// A random frame through a fresh asynchronous converter: one frame posted,
+// equal to the image core's conversion wherever that defines the bytes.
+testing::AssertionResult postedAsTheImageCore(const Frame& f, uint32_t seed, bool take) {
+    ImagePtr source = VCImageTest_random(f.width, f.height, f.from, seed);
+    const Expected want = cpuConversion(*source, f.to);
+    if (want.status != 0) return testing::AssertionFailure() << "image core: " << want.status;
+    FrameCollector listener(f.to);
+    const int status = postAsync(take ? source.release() : source.get(), listener, seed, take);
+    if (status != 0 || listener.frames().size() != 1)
+        return testing::AssertionFailure()
+               << "status " << status << ", " << listener.frames().size() << " frames";
+    return sameBytes(want, listener.frames()[0].bytes);
+}
+
 class ConverterPairs : public ::testing::TestWithParam<std::tuple<uint32_t, uint32_t>> {};
 
 TEST_P(ConverterPairs, MatchTheImageCoreByteForByte) {
@@ -151,10 +170,6 @@ INSTANTIATE_TEST_SUITE_P(AllFormats, ConverterPairs,
 // with a shorter last chunk: four bands (height a multiple of 8) and two.
 TEST(AsyncImageConverter, ChunkedBandsMatchTheImageCore) {
     LogCapture log;
-    struct Frame {
-        int width, height;
-        uint32_t from, to;
-    };
     const Frame frames[] = {{2048, 1048, VC_FORMAT_RGBA, VC_FORMAT_NV21},
                             {2048, 1048, VC_FORMAT_NV21, VC_FORMAT_RGBA},
                             {2048, 1048, VC_FORMAT_RGB8, VC_FORMAT_YUYV},
@@ -166,14 +181,8 @@ TEST(AsyncImageConverter, ChunkedBandsMatchTheImageCore) {
         const int bandRows = f.height / AsyncImageConverter::ConvertJob::sliceCount(f.height);
         ASSERT_LT(AsyncImageConverter::ConvertJob::chunkRows(bandRows, f.width, f.from, f.to),
                   bandRows);
-        ImagePtr source = VCImageTest_random(f.width, f.height, f.from, 300 + n);
-        const Expected want = cpuConversion(*source, f.to);
-        ASSERT_EQ(0, want.status);
-        FrameCollector listener(f.to);
         log.clear();
-        ASSERT_EQ(0, postAsync(source.release(), listener, n++, true));
-        ASSERT_EQ(1u, listener.frames().size());
-        EXPECT_TRUE(sameBytes(want, listener.frames()[0].bytes));
+        EXPECT_TRUE(postedAsTheImageCore(f, 300 + n++, true));
         // By the bands, not by the whole-frame fallback.
         EXPECT_EQ(1u, log.countPrefix("[Async/Slices] Time to convert"));
     }
@@ -328,10 +337,6 @@ TEST(ExternalConverter, FallbacksKeepTheFramesExact) {
         GTEST_SKIP() << "runs in its own process per stand-in case";
     LogCapture log;
     FrameCollector rgbaToNv21(VC_FORMAT_NV21);
-    struct Frame {
-        int width, height;
-        uint32_t from, to;
-    };
     // BGRA to NV12 is left out: the libcsc stand-in fills a whole frame (or a
     // band) from its first pixel, so bands and frames differ by design.
     const Frame frames[] = {{64, 48, VC_FORMAT_RGBA, VC_FORMAT_NV21},
@@ -340,13 +345,7 @@ TEST(ExternalConverter, FallbacksKeepTheFramesExact) {
                             {13, 8, VC_FORMAT_RGBA, VC_FORMAT_BGRA}};
     int n = 0;
     for (const Frame& f : frames) {
-        FrameCollector listener(f.to);
-        ImagePtr source = VCImageTest_random(f.width, f.height, f.from, 40 + n);
-        const Expected want = cpuConversion(*source, f.to);
-        ASSERT_EQ(0, want.status);
-        ASSERT_EQ(0, postAsync(source.get(), listener, n, false));
-        ASSERT_EQ(1u, listener.frames().size()) << n;
-        EXPECT_TRUE(sameBytes(want, listener.frames()[0].bytes)) << n;
+        EXPECT_TRUE(postedAsTheImageCore(f, 40 + n, false)) << n;
         ++n;
     }
     const size_t tried = log.countPrefix("VCConverter_create: ");
