@@ -94,8 +94,10 @@ unsigned char* KivDecodeAhead::place(int first, int rows) {
     // Kept while they fit; past the budget, the decoder waits for the
     // consumer.
     const bool fits = (size_t)(first + rows) * mPitch <= mKeptSize;
-    mWaiting = !fits;
-    mChanged.notify_all();
+    if (!fits && !mTakenOver) {
+        mWaiting = true;
+        mChanged.notify_all();
+    }
     mChanged.wait(lock, [&] { return mStop || mTakenOver || fits; });
     mWaiting = false;
     if (mStop) return nullptr;
@@ -138,7 +140,9 @@ int KivDecodeAhead::placed(const unsigned char* rgba, int first, int rows) {
 }
 
 int KivDecodeAhead::takeOver(size_t pitch, VCStreamPlace place, VCStreamBand band, void* user) {
-    if (!ok() || place == nullptr || band == nullptr) return VC_ERROR_INVALID_STATE;
+    // Once only: the decoder's thread is gone after.
+    if (!ok() || !mThread.joinable() || place == nullptr || band == nullptr)
+        return VC_ERROR_INVALID_STATE;
     if (pitch < (size_t)mWidth * 4) return VC_ERROR_INVALID_STATE;
     const size_t page = (size_t)sysconf(_SC_PAGESIZE);
     const size_t rowBytes = (size_t)mWidth * 4;
