@@ -138,6 +138,9 @@ Bands* StreamTest::sBands = nullptr;
 TEST_P(StreamTest, BandsGiveTheWholePicturesBytes) {
     static const Bytes jpeg = pictureFile(kWidth, kHeight),
                        png = pictureFile(kWidth, kHeight, true);
+    // Sides near a texture's limit, where texel centres are furthest from
+    // what the GPU interpolates.
+    static const Bytes wide = pictureFile(16000, 8), tall = pictureFile(8, 16000);
     struct Case {
         const Bytes& input;
         bool nv21, png;
@@ -146,6 +149,7 @@ TEST_P(StreamTest, BandsGiveTheWholePicturesBytes) {
         {jpeg, false, false, 90},  // kivimaging apply
         {jpeg, true, false, 98},   // processFile
         {png, false, true, 0},     // PNG in and out, alpha kept
+        {wide, false, false, 90},  {tall, false, false, 90},
     };
     const bool declined = declines(effect());
     for (const Case& c : cases) {
@@ -379,7 +383,7 @@ struct Consumer {
 // where the consumer places them (at the consumer's pitch, the kept rows'
 // one or another), whatever part the budget kept: the plain reader's rows,
 // in order, padding untouched. The kept rows stop at the budget (whole
-// 16-row bands) or at the picture's end.
+// 16-row bands) or at the picture's end. A picture is taken over once.
 TEST(DecodeAhead, HandsOnTheReadersRowsWithinItsBudget) {
     const int width = 50, height = 210;  // kept rows 200 bytes -> 256 apart
     const size_t kept = 256;
@@ -405,6 +409,9 @@ TEST(DecodeAhead, HandsOnTheReadersRowsWithinItsBudget) {
                 Bytes got;
                 EXPECT_TRUE(consumer.unpadded(&got));
                 EXPECT_TRUE(got == want);
+                // Once only.
+                EXPECT_EQ(VC_ERROR_INVALID_STATE,
+                          ahead.takeOver(pitch, Consumer::place, Consumer::band, &consumer));
             }
     }
 }
