@@ -6,6 +6,7 @@
 
 #include "core/egl/EglProgram.h"
 #include "kivhost/VirtualCamera.h"
+#include "support/effect_renderer.h"
 #include "support/image_ptr.h"
 #include "vccore/vc_convert.h"
 
@@ -29,12 +30,8 @@ std::vector<uint8_t> CameraFrames_rgba(uint64_t index, int width, int height) {
 ExternalTextureDrawer::ExternalTextureDrawer(int width, int height)
     : mWidth(width), mHeight(height) {
     if (!GlTest_makeTarget(width, height, &mTarget)) return;
-    mProgram = new EglProgram();
-    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
-    if (mProgram->initialize(10, false) != 0) return;
-    mProgram->setCameraGeometry(width, height, 0, 0);
-    mProgram->setPreviewGeometry(width, height, false);
-    mOk = true;
+    mProgram = EffectRenderer_identityProgram(width, height);
+    mOk = mProgram != nullptr;
 }
 
 ExternalTextureDrawer::~ExternalTextureDrawer() {

@@ -11,12 +11,20 @@ EffectRenderer::EffectRenderer(const lookref::Picture& picture)
     glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MIN_FILTER, GL_LINEAR);
     glTexParameterf(GL_TEXTURE_EXTERNAL_OES, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
     if (!GlTest_makeTarget(mWidth, mHeight, &mTarget)) return;
-    mProgram = new EglProgram();
-    mProgram->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
-    if (mProgram->initialize(10, false) != 0) return;
-    mProgram->setCameraGeometry(mWidth, mHeight, 0, 0);
-    mProgram->setPreviewGeometry(mWidth, mHeight, false);
-    mOk = true;
+    mProgram = EffectRenderer_identityProgram(mWidth, mHeight);
+    mOk = mProgram != nullptr;
+}
+
+android::sp<EglProgram> EffectRenderer_identityProgram(int width, int height) {
+    android::sp<EglProgram> program = new EglProgram();
+    program->setCameraGeometryType(EglProgram::GEOMETRY_NORMAL, 0);
+    if (program->initialize(10, false) != 0) {
+        program->release();
+        return nullptr;
+    }
+    program->setCameraGeometry(width, height, 0, 0);
+    program->setPreviewGeometry(width, height, false);
+    return program;
 }
 
 EffectRenderer::~EffectRenderer() {

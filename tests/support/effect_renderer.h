@@ -46,6 +46,10 @@ private:
     bool mOk = false;
 };
 
+// A program with the default shader and the identity mapping over a width x
+// height camera and preview; null (nothing left behind) when it cannot be made.
+android::sp<EglProgram> EffectRenderer_identityProgram(int width, int height);
+
 // One frame of `effect` over `picture` with a program of its own; empty
 // pixels when the GL objects could not be made. `drawResult` (optional)
 // receives onDrawFrame's result.

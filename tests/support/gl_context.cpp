@@ -5,6 +5,7 @@
 #include <ui/GraphicBuffer.h>
 
 #include <algorithm>
+#include <utility>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglExtensions.h"
@@ -131,18 +132,16 @@ int GlTest_liveObjects(int range) {
     // at least up to the names it would give next, so that long-running work
     // does not move its objects out of view.
     GLuint top = GLuint(range), name = 0;
-    glGenTextures(1, &name);
-    glDeleteTextures(1, &name);
-    top = std::max(top, name);
-    glGenFramebuffers(1, &name);
-    glDeleteFramebuffers(1, &name);
-    top = std::max(top, name);
-    glGenRenderbuffers(1, &name);
-    glDeleteRenderbuffers(1, &name);
-    top = std::max(top, name);
-    glGenBuffers(1, &name);
-    glDeleteBuffers(1, &name);
-    top = std::max(top, name);
+    const std::pair<void (*)(GLsizei, GLuint*), void (*)(GLsizei, const GLuint*)> kinds[] = {
+        {glGenTextures, glDeleteTextures},
+        {glGenFramebuffers, glDeleteFramebuffers},
+        {glGenRenderbuffers, glDeleteRenderbuffers},
+        {glGenBuffers, glDeleteBuffers}};
+    for (const auto& kind : kinds) {
+        kind.first(1, &name);
+        kind.second(1, &name);
+        top = std::max(top, name);
+    }
     name = glCreateProgram();  // programs and shaders share their names
     glDeleteProgram(name);
     top = std::max(top, name);

@@ -175,11 +175,14 @@ TEST(LiveStats, IntervalsOfFramesThatFollowEachOtherAndTheSummaryLine) {
 using Cli = CliTest;
 using kivtest::Bytes;
 
+// Bad arguments exit 2 with their message; a live source or recording that
+// cannot be opened exits 1. Nothing goes to standard output.
 TEST_F(Cli, UsageErrorsExitTwoWithAMessage) {
     std::string in = writePng("in.png", 16, 8), o = path("o.png");
     const struct {
         std::vector<std::string> args;
         const char* message;
+        int status = 2;
     } cases[] = {
         {{}, "Usage: kivimaging <command>"},
         {{"frobnicate"}, "unknown command 'frobnicate'"},
@@ -199,13 +202,33 @@ TEST_F(Cli, UsageErrorsExitTwoWithAMessage) {
         {{"gallery", "-o", path("g.png"), "--thumb", "8"}, "--thumb must be"},
         {{"sample", "-o", path("s.png"), "--size", "10x10"}, "--size must be"},
         {{"effects", "extra"}, "unexpected argument 'extra'"},
+        {{"live", "--size", "15x10"}, "--size must be WxH, even sides from 16 to 4096"},
+        {{"live", "--fps", "0"}, "--fps must be a number from 1 to 120"},
+        {{"live", "--frames", "5", "--seconds", "1"}, "give --frames or --seconds, not both"},
+        {{"live", "--record", "out.avi"}, "--record must name an .mp4 file"},
+        {{"live", "--record-interval", "100"}, "--record-interval needs --record"},
+        {{"live", "-o", "x.png"},
+         "-o names the file of --picture-at or --snapshot-at, given before it"},
+        {{"live", "--picture-at", "3"}, "--picture-at needs -o FILE after it"},
+        {{"live", "--snapshot-at", "3", "-o", "x.bmp"}, "'x.bmp' must end in .png, .jpg or .jpeg"},
+        {{"live", "-e", "NoSuchEffect"}, "NoSuchEffect"},
+        {{"live", "--mode", "2"}, "--mode must be direct or fbo"},
+        {{"live", "--record", "/nonexistent/out.mp4"},
+         "kivimaging: cannot write the recording '/nonexistent/out.mp4'",
+         1},
+        {{"live", "--camera", "/nonexistent/clip.mkv"},
+         "kivimaging: cannot play '/nonexistent/clip.mkv' as a video",
+         1},
     };
     for (const auto& c : cases) {
         CliResult r = run(c.args);
-        EXPECT_EQ(2, r.status) << c.message;
+        EXPECT_EQ(c.status, r.status) << c.message;
         EXPECT_NE(std::string::npos, r.err.find(c.message)) << "stderr: " << r.err;
+        EXPECT_EQ("", r.out) << c.message;
         // A command's refusal points at its --help.
-        EXPECT_TRUE(c.args.size() < 2 || r.err.find("--help'") != std::string::npos) << r.err;
+        EXPECT_TRUE(c.status != 2 || c.args.size() < 2 ||
+                    r.err.find("--help'") != std::string::npos)
+            << r.err;
     }
     EXPECT_FALSE(exists("o.png"));  // nothing was written by a refused command
     for (const char* command : {"effects", "apply", "gallery", "sample"}) {
