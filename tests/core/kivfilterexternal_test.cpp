@@ -15,7 +15,6 @@
 
 #include "core/KivFilterExternal.h"
 #include "core/KivImaging.h"
-#include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/EglProgram.h"
 #include "core/egl/EglRecycler.h"
 #include "plugin_standin/standin.h"
@@ -25,6 +24,7 @@
 #include "support/open_files.h"
 #include "support/look_reference.h"
 #include "support/plugin_sysroot.h"
+#include "support/processor_ptr.h"
 #include "vccore/vc_image.h"
 #include "vccore/vc_log.h"
 
@@ -229,13 +229,7 @@ class ExternalFilterGl : public ExternalFilter {
 protected:
     void SetUp() override {
         ExternalFilter::SetUp();
-        mProcessor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-        ASSERT_EQ(0, mProcessor->initialize());
-    }
-    void TearDown() override {
-        mProcessor->release();
-        BufferedProcessor_Destroy(mProcessor);
-        ExternalFilter::TearDown();
+        mProcessor = ProcessorTest_create();
     }
     // The effect `name` over an opaque w x h picture; RGBA out.
     std::vector<uint8_t> render(const std::string& name, int w, int h,
@@ -246,7 +240,7 @@ protected:
         EXPECT_EQ(0, mProcessor->doProcessRGBA(in.data(), w, h, out.data(), VC_FORMAT_RGBA));
         return out;
     }
-    VFilterBufferedProcessorImpl* mProcessor = nullptr;
+    ProcessorPtr mProcessor;
 };
 
 TEST_F(ExternalFilterGl, StandinDrawsThroughItsSlotsInOrder) {

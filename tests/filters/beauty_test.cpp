@@ -8,10 +8,10 @@
 #include <string>
 #include <vector>
 
-#include "core/VFilterBufferedProcessorImpl.h"
 #include "core/filters/sce/beauty.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
+#include "support/processor_ptr.h"
 #include "vccore/vc_log.h"
 
 namespace {
@@ -134,15 +134,13 @@ TEST_P(BeautyThroughProcessor, MatchesTheCpuBlurMaskAndMix) {
                                 int(d.face[2] * 1000), int(d.face[3] * 1000)) +
                        d.extra;
     LogCapture quiet;
-    auto* processor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-    processor->initialize();
+    ProcessorPtr processor = ProcessorTest_create();
     processor->setEffect(446);
     processor->setEffectParameter(text.c_str());
     std::vector<uint8_t> out(size_t(w) * h * 4, 0x5A);
     ASSERT_EQ(0, processor->doProcessRGBA(picture.rgba().data(), w, h, out.data(), VC_FORMAT_RGBA));
     Beauty::State s = static_cast<Beauty*>(processor->getEffect())->getState();
-    processor->release();
-    BufferedProcessor_Destroy(processor);
+    processor.reset();
 
     if (s.intensity == 0 || s.faceCount == 0) {
         EXPECT_EQ(picture.rgba(), out);  // the copy pass: the picture itself, opaque

@@ -12,10 +12,10 @@
 
 #include "core/KivImaging.h"
 #include "core/KivPixelReach.h"
-#include "core/VFilterBufferedProcessorImpl.h"
 #include "core/filters/sce/colorEffects.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
+#include "support/processor_ptr.h"
 #include "vccore/vc_log.h"
 
 namespace {
@@ -155,17 +155,10 @@ bool isPreset(int id) {
 // One processor for the whole suite: each call builds its own program.
 class ColorEffectCase : public ::testing::TestWithParam<Case> {
 protected:
-    static void SetUpTestSuite() {
-        sProcessor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-        sProcessor->initialize();
-    }
-    static void TearDownTestSuite() {
-        sProcessor->release();
-        BufferedProcessor_Destroy(sProcessor);
-    }
-    static VFilterBufferedProcessorImpl* sProcessor;
+    static void SetUpTestSuite() { sProcessor = ProcessorTest_create(); }
+    static void TearDownTestSuite() { sProcessor.reset(); }
+    static inline ProcessorPtr sProcessor;
 };
-VFilterBufferedProcessorImpl* ColorEffectCase::sProcessor = nullptr;
 
 TEST_P(ColorEffectCase, SetsItsUniformsWarnsAndDrawsAsTheCpu) {
     const Case& c = GetParam();

@@ -10,13 +10,13 @@
 #include <vector>
 
 #include "core/KivImaging.h"
-#include "core/VFilterBufferedProcessorImpl.h"
 #include "core/egl/EglProgram.h"
 #include "core/filters/sce/geometricEffects.h"
 #include "support/effect_renderer.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
+#include "support/processor_ptr.h"
 #include "vccore/vc_log.h"
 
 namespace {
@@ -60,8 +60,7 @@ class GeometricThroughProcessor : public ::testing::TestWithParam<Draw> {};
 TEST_P(GeometricThroughProcessor, MatchesTheCpuSampling) {
     const Draw& d = GetParam();
     LogCapture quiet;
-    auto* processor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-    processor->initialize();
+    ProcessorPtr processor = ProcessorTest_create();
     ASSERT_EQ(0, processor->setEffect(d.id));
     processor->setEffectParameter(d.parameter);
     lookref::Picture picture(d.width, d.height, lookref::makeTestPicture(d.width, d.height, false));
@@ -81,8 +80,6 @@ TEST_P(GeometricThroughProcessor, MatchesTheCpuSampling) {
                                                        easedLevel(target, frame), kSlack),
                               out.data(), kTolerance, "frame " + std::to_string(frame));
     }
-    processor->release();
-    BufferedProcessor_Destroy(processor);
 }
 
 // A rectangle right of centre: level 1 (DistortionCorrection) after 13 frames.

@@ -22,6 +22,7 @@
 #include "support/log_capture.h"
 #include "support/look_reference.h"
 #include "support/open_files.h"
+#include "support/processor_ptr.h"
 
 namespace {
 
@@ -34,20 +35,11 @@ Bytes swapRB(Bytes in) {
 
 class BufferedProcessorTest : public ::testing::Test {
 protected:
-    void SetUp() override {
-        mProcessor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-        ASSERT_NE(nullptr, mProcessor);
-        ASSERT_EQ(0, mProcessor->initialize());
-    }
-    void TearDown() override {
-        if (mProcessor == nullptr) return;
-        mProcessor->release();
-        BufferedProcessor_Destroy(mProcessor);
-    }
+    void SetUp() override { mProcessor = ProcessorTest_create(); }
     int rgba(const Bytes& in, int w, int h, Bytes& out, uint32_t format = VC_FORMAT_RGBA) {
         return mProcessor->doProcessRGBA(in.data(), w, h, out.data(), format);
     }
-    VFilterBufferedProcessorImpl* mProcessor = nullptr;
+    ProcessorPtr mProcessor;
 };
 
 TEST(BufferedProcessorApi, CreateDestroyAndEffectSelection) {

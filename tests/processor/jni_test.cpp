@@ -11,13 +11,13 @@
 #include <string>
 #include <vector>
 
-#include "core/VFilterBufferedProcessorImpl.h"
 #include "support/gl_fault.h"
 #include "support/image_ptr.h"
 #include "support/jvm.h"
 #include "support/log_capture.h"
 #include "support/look_reference.h"
 #include "support/picture_streams.h"
+#include "support/processor_ptr.h"
 #include "support/temp_dir.h"
 #include "vccore/vc_file.h"
 
@@ -43,14 +43,10 @@ protected:
         mEnv = KivTestJvm_start(KIV_TEST_LIBJVM, KIV_TEST_JAVA_CLASSES);
         ASSERT_NE(nullptr, mEnv) << "no JVM from " << KIV_TEST_LIBJVM;
         mEnv->PushLocalFrame(256);
-        mProcessor = static_cast<VFilterBufferedProcessorImpl*>(BufferedProcessor_Create());
-        ASSERT_EQ(0, mProcessor->initialize());
+        mProcessor = ProcessorTest_create();
     }
     void TearDown() override {
-        if (mProcessor != nullptr) {
-            mProcessor->release();
-            BufferedProcessor_Destroy(mProcessor);
-        }
+        mProcessor.reset();
         if (mEnv != nullptr) mEnv->PopLocalFrame(nullptr);
     }
     jobject newBitmap(int width, int height, const char* config, const Bytes& rgba = {}) {
@@ -89,7 +85,7 @@ protected:
     jstring str(const std::string& s) { return mEnv->NewStringUTF(s.c_str()); }
 
     JNIEnv* mEnv = nullptr;
-    VFilterBufferedProcessorImpl* mProcessor = nullptr;
+    ProcessorPtr mProcessor;
     kivtest::TempDir mDir;
 };
 
