@@ -18,6 +18,7 @@
 #include "core/egl/Platform.h"
 #include "core/filters/sce/singleCameraEffects.h"
 #include "support/image_ptr.h"
+#include "support/picture_streams.h"
 #include "support/temp_dir.h"
 #include "support/test_picture.h"
 #include "vccore/vc_file.h"
@@ -50,19 +51,11 @@ Bytes owned(unsigned char* stream, size_t length) {
     return out;
 }
 
-// The picture as a PNG (alpha varying) or a JPEG (opaque), or `rgba` so.
-Bytes encode(const VCImage& rgba, bool png, int quality = 90) {
-    if (png) {
-        size_t length = 0;
-        unsigned char* stream = VCPicture_encodePng(&rgba, &length);
-        return owned(stream, length);
-    }
-    ImagePtr jpeg(VCImage_encodeToJpeg(&rgba, quality));
-    return Bytes(jpeg->data, jpeg->data + jpeg->size);
-}
+// The picture as a PNG (alpha varying) or a JPEG (opaque).
 Bytes pictureFile(int width, int height, bool png = false) {
     Bytes rgba = kivtest::makeTestPicture(width, height, !png);
-    return encode(*VCImageTest_wrap(rgba.data(), width, height, VC_FORMAT_RGBA), png);
+    ImagePtr image = VCImageTest_wrap(rgba.data(), width, height, VC_FORMAT_RGBA);
+    return png ? kivtest::encodePng(image.get()) : kivtest::encodeJpeg(image.get());
 }
 
 // Effects the streamed path leaves to the whole picture: those that do not
@@ -105,7 +98,7 @@ struct Bands {
                          ? processor.doProcessNV21(in->data, in->width, in->height, out->data)
                          : processor.doProcessRGBA(in->data, in->width, in->height, out->data,
                                                    VC_FORMAT_RGBA));
-        return encode(*out, png, quality);
+        return png ? kivtest::encodePng(out.get()) : kivtest::encodeJpeg(out.get(), quality);
     }
     VFilterBufferedProcessorImpl processor;
 };

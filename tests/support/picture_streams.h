@@ -14,9 +14,26 @@
 #include <algorithm>
 #include <vector>
 
+#include "support/image_ptr.h"
 #include "support/temp_dir.h"
+#include "vccore/vc_file.h"
+#include "vccore/vc_picture.h"
 
 namespace kivtest {
+
+// `image` encoded by the library itself, as a JPEG at `quality` or as a PNG
+// (straight alpha kept); empty when it cannot be.
+inline Bytes encodeJpeg(const VCImage* image, int quality = 90) {
+    ImagePtr jpeg(VCImage_encodeToJpeg(image, quality));
+    return jpeg != nullptr ? VCImageTest_bytes(*jpeg) : Bytes();
+}
+inline Bytes encodePng(const VCImage* image) {
+    size_t length = 0;
+    unsigned char* png = VCPicture_encodePng(image, &length);
+    Bytes out(png, png + (png != nullptr ? length : 0));
+    free(png);
+    return out;
+}
 
 // A PNG stream written directly with libpng. `rows` holds the samples as the
 // colour type and depth lay them out (16-bit samples big-endian).

@@ -80,8 +80,7 @@ TEST_F(CliFiles, BadInputsAreRefusedWithTheirReason) {
     ASSERT_GT(limit, 0);
     ImagePtr picture(VCImage_createNew(32, 32, VC_FORMAT_RGBA));
     memset(picture->data, 0x80, picture->size);
-    ImagePtr encoded(VCImage_encodeToJpeg(picture.get(), 90));
-    const Bytes jpeg(encoded->data, encoded->data + encoded->size);
+    const Bytes jpeg = kivtest::encodeJpeg(picture.get());
     kivtest::PngPicture small;
     small.width = small.height = 16;
     small.samples.assign(16 * 16 * 4, 0x80);

@@ -16,6 +16,7 @@
 
 #include "support/image_ptr.h"
 #include "support/log_capture.h"
+#include "support/picture_streams.h"
 #include "support/temp_dir.h"
 #include "support/test_picture.h"
 #include "vccore/vc_file.h"
@@ -68,11 +69,7 @@ protected:
 
     // `image` as a PNG in the folder; its path.
     std::string writePng(const std::string& name, const VCImage& image) {
-        size_t length = 0;
-        unsigned char* png = VCPicture_encodePng(&image, &length);
-        EXPECT_TRUE(png != nullptr &&
-                    kivtest::writeFile(path(name), kivtest::Bytes(png, png + length)));
-        free(png);
+        EXPECT_TRUE(kivtest::writeFile(path(name), kivtest::encodePng(&image)));
         return path(name);
     }
     // A w x h PNG of the test picture, or of every pixel `flat` (RGBA).

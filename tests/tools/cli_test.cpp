@@ -319,12 +319,7 @@ TEST_F(Cli, NegativeInvertsEveryChannel) {
 ::testing::AssertionResult matchesGolden(const VCImage& got, const std::string& name,
                                          int tolerance) {
     const std::string file = std::string(KIV_TOOLS_GOLDEN_DIR "/") + name;
-    if (getenv("KIV_UPDATE_GOLDEN") != nullptr) {
-        size_t length = 0;
-        unsigned char* png = VCPicture_encodePng(&got, &length);
-        kivtest::writeFile(file, Bytes(png, png + length));
-        free(png);
-    }
+    if (getenv("KIV_UPDATE_GOLDEN") != nullptr) kivtest::writeFile(file, kivtest::encodePng(&got));
     ImagePtr want = loadPicture(file);
     if (want == nullptr) return ::testing::AssertionFailure() << "no golden " << file;
     if (want->width != got.width || want->height != got.height)

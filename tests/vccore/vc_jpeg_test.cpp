@@ -36,11 +36,6 @@ Bytes turboDecode(const Bytes& jpeg, int pixelFormat, int* subsampling = nullptr
     return out;
 }
 
-Bytes encodeBytes(const VCImage* image, int quality) {
-    ImagePtr jpeg(VCImage_encodeToJpeg(image, quality));
-    return jpeg != nullptr ? VCImageTest_bytes(*jpeg) : Bytes();
-}
-
 // JPEG's loss on the test picture at quality 95 (its sharp blocks ring): a
 // mean difference of 3 to 5; swapped chroma or a wrong quality is far more.
 double meanAbsDiff(const Bytes& a, const Bytes& b) {
@@ -85,11 +80,11 @@ TEST(VcJpeg, EncodeMakesAJpegRecordAtItsQuality) {
     EXPECT_EQ(64u * 48 * 4, turboDecode(stream, TJPF_RGBA, &sub).size());
     EXPECT_EQ(sub, TJSAMP_420);
     for (int quality : {1, 50, 85, 100})
-        EXPECT_EQ(lumaTableForQuality(quality), lumaTable(encodeBytes(image.get(), quality)))
+        EXPECT_EQ(lumaTableForQuality(quality), lumaTable(encodeJpeg(image.get(), quality)))
             << quality;
     // Out-of-range qualities are 85, not clamped to the nearest end.
     for (int quality : {0, 101, -7})
-        EXPECT_EQ(encodeBytes(image.get(), quality), encodeBytes(image.get(), 85)) << quality;
+        EXPECT_EQ(encodeJpeg(image.get(), quality), encodeJpeg(image.get(), 85)) << quality;
 }
 
 // NV21 and NV12 are decoded a band of rows at a time; the result must be the
@@ -150,7 +145,7 @@ TEST(VcJpeg, BandedDecodeEqualsWholeDecodeAndConversion) {
 
 TEST(VcJpeg, DecodeIntoNewAndExistingBuffers) {
     REQUIRE_GENERAL_CODECS();
-    const Bytes jpeg = encodeBytes(makeRgba(64, 48).get(), 95), ref = turboDecode(jpeg, TJPF_RGBA);
+    const Bytes jpeg = encodeJpeg(makeRgba(64, 48).get(), 95), ref = turboDecode(jpeg, TJPF_RGBA);
     // An owned buffer of the right size is decoded into in place.
     ImagePtr owned(VCImage_createNew(64, 48, VC_FORMAT_RGBA));
     unsigned char* before = owned->data;
@@ -189,7 +184,7 @@ TEST(VcJpeg, EncodesYuvPictures) {
     ImagePtr source = makeRgba(w, h);
     Bytes nv21 = convertTo(source.get(), VC_FORMAT_NV21);
     const Bytes fromNv21 =
-        encodeBytes(VCImageTest_wrap(nv21.data(), w, h, VC_FORMAT_NV21).get(), 95);
+        encodeJpeg(VCImageTest_wrap(nv21.data(), w, h, VC_FORMAT_NV21).get(), 95);
     int sub = -1;
     EXPECT_LT(meanAbsDiff(turboDecode(fromNv21, TJPF_RGB, &sub),
                           convertBytes(nv21, w, h, VC_FORMAT_NV21, VC_FORMAT_RGB8)),
@@ -201,7 +196,7 @@ TEST(VcJpeg, EncodesYuvPictures) {
         const uint32_t chromaAt = format == VC_FORMAT_NV21 ? w * h + 256 : 0;
         Bytes laid = convertTo(source.get(), format, chromaAt);
         EXPECT_EQ(fromNv21,
-                  encodeBytes(
+                  encodeJpeg(
                       VCImageTest_wrap(laid.data(), w, h, format, laid.size(), chromaAt).get(), 95))
             << VCImageTest_fourcc(format);
     }
@@ -216,7 +211,7 @@ TEST(VcJpeg, EncodesYuvPictures) {
     for (const auto& r : rows) {
         Bytes packed = convertTo(source.get(), r.format);
         Bytes back =
-            turboDecode(encodeBytes(VCImageTest_wrap(packed.data(), w, h, r.format).get(), 95),
+            turboDecode(encodeJpeg(VCImageTest_wrap(packed.data(), w, h, r.format).get(), 95),
                         r.pixelFormat, &sub);
         EXPECT_EQ(sub, r.subsampling);
         EXPECT_LT(meanAbsDiff(back, convertBytes(packed, w, h, r.format, r.compareAs)), 4.5)
@@ -226,8 +221,8 @@ TEST(VcJpeg, EncodesYuvPictures) {
 
 TEST(VcJpeg, DecodeFailuresSayWhyAndLeaveTheRecordAsFound) {
     REQUIRE_GENERAL_CODECS();
-    const Bytes jpeg = encodeBytes(makeRgba(32, 32).get(), 90);
-    const Bytes odd = encodeBytes(makeRgba(3, 3).get(), 90);
+    const Bytes jpeg = encodeJpeg(makeRgba(32, 32).get(), 90);
+    const Bytes odd = encodeJpeg(makeRgba(3, 3).get(), 90);
     ASSERT_FALSE(jpeg.empty());
     Bytes badTable = jpeg, twelveBit = jpeg, lossless = jpeg;
     badTable[findMarker(jpeg, 0xDB) + 2] = 0x07;  // table index out of range
@@ -328,7 +323,7 @@ TEST(VcJpeg, DecodeFailuresSayWhyAndLeaveTheRecordAsFound) {
 }
 
 TEST(VcJpeg, HeaderAloneGivesTheDeclaredSize) {
-    const Bytes jpeg = encodeBytes(makeRgba(32, 24).get(), 90);
+    const Bytes jpeg = encodeJpeg(makeRgba(32, 24).get(), 90);
     const struct {
         Bytes data;
         int status, width, height;
@@ -451,10 +446,7 @@ TEST(VcStream, RowsLandWhereTheCallerPlacesThem) {
     REQUIRE_GENERAL_CODECS();
     const int w = 50, h = 40, pitch = w * 4 + 12;
     ImagePtr source = makeRgba(w, h);
-    size_t pngLength = 0;
-    unsigned char* png = VCPicture_encodePng(source.get(), &pngLength);
-    const Bytes inputs[] = {encodeBytes(source.get(), 90), Bytes(png, png + pngLength)};
-    free(png);
+    const Bytes inputs[] = {encodeJpeg(source.get(), 90), encodePng(source.get())};
     struct Placing {
         Bytes rows;             // pitch apart
         std::vector<int> told;  // first rows the band was told of
