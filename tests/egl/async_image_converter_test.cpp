@@ -170,11 +170,10 @@ INSTANTIATE_TEST_SUITE_P(AllFormats, ConverterPairs,
 // with a shorter last chunk: four bands (height a multiple of 8) and two.
 TEST(AsyncImageConverter, ChunkedBandsMatchTheImageCore) {
     LogCapture log;
-    const Frame frames[] = {{2048, 1048, VC_FORMAT_RGBA, VC_FORMAT_NV21},
-                            {2048, 1048, VC_FORMAT_NV21, VC_FORMAT_RGBA},
-                            {2048, 1048, VC_FORMAT_RGB8, VC_FORMAT_YUYV},
-                            {2048, 1052, VC_FORMAT_NV12, VC_FORMAT_RGB8},
-                            {2048, 1052, VC_FORMAT_BGRA, VC_FORMAT_NV12}};
+    const Frame frames[] = {{2048, 2104, VC_FORMAT_RGBA, VC_FORMAT_NV21},
+                            {2048, 2104, VC_FORMAT_RGB8, VC_FORMAT_YUYV},
+                            {2048, 2092, VC_FORMAT_NV21, VC_FORMAT_RGBA},
+                            {2048, 2092, VC_FORMAT_NV12, VC_FORMAT_BGR8}};
     int n = 0;
     for (const Frame& f : frames) {
         SCOPED_TRACE(n);
