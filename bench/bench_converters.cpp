@@ -39,6 +39,7 @@
 #include <chrono>
 #include <condition_variable>
 #include <functional>
+#include <map>
 #include <mutex>
 #include <random>
 #include <set>
@@ -322,7 +323,7 @@ std::atomic<int> Stamps::sCount{0};
 // Asynchronous frames taken apart from their stamps; medians over frames.
 void printBreakdown(Setup& big, int frames) {
     VF_LogMsg = Stamps::log;
-    std::vector<double> taken, first, converting, posted, woken, whole, threads, cores;
+    std::vector<double> taken, first, converting, posted, woken, whole, threads, cores, busiest;
     for (int f = 0; f < frames; ++f) {
         VCImage* copy = VCImage_clone(big.source);
         Stamps::reset();
@@ -333,14 +334,16 @@ void printBreakdown(Setup& big, int frames) {
         const std::vector<Stamps::Event> events = Stamps::events();
         Clock::time_point tTaken{}, tFirst = Clock::time_point::max(), tSliced{};
         std::set<pid_t> tids;
-        std::set<int> cpus;
+        std::map<int, int> perCpu;  // chunks started on each core
+        int chunks = 0;
         for (const Stamps::Event& e : events) {
             if (e.kind == Stamps::kTaken) tTaken = e.t;
             if (e.kind == Stamps::kSliced) tSliced = e.t;
             if (e.kind != Stamps::kChunk) continue;
             tFirst = std::min(tFirst, e.t);
             tids.insert(e.thread);
-            cpus.insert(e.cpu);
+            ++perCpu[e.cpu];
+            ++chunks;
         }
         if (tids.empty() || tTaken == Clock::time_point{} || tSliced == Clock::time_point{}) {
             big.ok = false;
@@ -353,16 +356,20 @@ void printBreakdown(Setup& big, int frames) {
         woken.push_back(seconds(big.listener.posted(), t3));
         whole.push_back(seconds(t0, t3));
         threads.push_back(static_cast<double>(tids.size()));
-        cores.push_back(static_cast<double>(cpus.size()));
+        cores.push_back(static_cast<double>(perCpu.size()));
+        int most = 0;
+        for (const auto& c : perCpu) most = std::max(most, c.second);
+        busiest.push_back(static_cast<double>(most) / chunks);
     }
     VF_LogMsg = quietLog;
     printf(
         "  async 4000x3000 frame taken apart (medians of %d frames, ms): worker takes it %.3f, "
         "first chunk starts %.3f later, chunks to bands joined %.3f, to the listener %.3f, "
-        "caller woken %.3f; whole %.3f; %.0f threads converted on %.0f cores\n",
+        "caller woken %.3f; whole %.3f; %.0f threads converted on %.0f cores, the busiest core "
+        "starting %.0f%% of the chunks\n",
         frames, median(taken) * 1e3, median(first) * 1e3, median(converting) * 1e3,
         median(posted) * 1e3, median(woken) * 1e3, median(whole) * 1e3, median(threads),
-        median(cores));
+        median(cores), median(busiest) * 100);
 }
 
 // Rounds of blocks of runs, sides in a rotating order; per side the block
