@@ -42,7 +42,8 @@ KivDecodeAhead::KivDecodeAhead(const unsigned char* bytes, size_t length, size_t
         // Pages are taken as rows come (in large pages where the kernel has
         // them: a fault per 4 KB would cost a good part of what is gained)
         // and given back as the rows are handed on.
-        const size_t size = rows * mPitch;
+        const size_t page = (size_t)sysconf(_SC_PAGESIZE);
+        const size_t size = (rows * mPitch + page - 1) / page * page;
         void* kept = mmap(nullptr, size + kLargePage, PROT_READ | PROT_WRITE,
                           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
         if (kept != MAP_FAILED) {
@@ -54,6 +55,7 @@ KivDecodeAhead::KivDecodeAhead(const unsigned char* bytes, size_t length, size_t
             madvise(start + lead, size, MADV_HUGEPAGE);
             mKept = start + lead;
             mKeptSize = size;
+            mKeptCapacity = (int)rows;
         }
     }
     mReader = reader;
@@ -93,7 +95,7 @@ unsigned char* KivDecodeAhead::place(int first, int rows) {
     std::unique_lock<std::mutex> lock(mLock);
     // Kept while they fit; past the budget, the decoder waits for the
     // consumer.
-    const bool fits = (size_t)(first + rows) * mPitch <= mKeptSize;
+    const bool fits = first + rows <= mKeptCapacity;
     if (!fits && !mTakenOver) {
         mWaiting = true;
         mChanged.notify_all();

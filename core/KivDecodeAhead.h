@@ -61,7 +61,8 @@ private:
     // The first rows of the picture, as many as the budget holds, mPitch
     // bytes apart.
     unsigned char* mKept = nullptr;
-    size_t mKeptSize = 0;
+    size_t mKeptSize = 0;   // whole pages
+    int mKeptCapacity = 0;  // rows
     size_t mPitch = 0;
     std::thread mThread;
 

@@ -378,8 +378,8 @@ struct Consumer {
 // in order, padding untouched. The kept rows stop at the budget (whole
 // 16-row bands) or at the picture's end. A picture is taken over once.
 TEST(DecodeAhead, HandsOnTheReadersRowsWithinItsBudget) {
-    const int width = 50, height = 210;  // kept rows 200 bytes -> 256 apart
-    const size_t kept = 256;
+    const int width = 70, height = 210;  // kept rows 280 bytes -> 320 apart
+    const size_t kept = 320;
     for (bool png : {false, true}) {
         const Bytes input = pictureFile(width, height, png);
         const Bytes want = decodedRows(input);
