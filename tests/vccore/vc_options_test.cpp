@@ -6,6 +6,7 @@
 #include <string.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <chrono>
 #include <cmath>
 #include <future>
@@ -255,6 +256,11 @@ TEST(VcOptions, ConcurrentRegistrationGivesDistinctKeys) {
         options[i] = makeOption(names[i].c_str(), VCOPTION_TYPE_INTEGER);
     VF_LogMsg_t previous = VF_LogMsg;
     VF_LogMsg = quietLog;  // the dumps are quadratic; keep them quiet
+    // Lookups by name meanwhile: the registry must be locked for them too.
+    std::atomic<bool> done{false};
+    std::thread reader([&] {
+        while (!done) VCOption_FindByName("mt.0");
+    });
     std::vector<std::thread> threads;
     for (int t = 0; t < kThreads; ++t)
         threads.emplace_back([t] {
@@ -262,6 +268,8 @@ TEST(VcOptions, ConcurrentRegistrationGivesDistinctKeys) {
                 EXPECT_EQ(1, VCOption_RegisterNew(&options[t * kPerThread + i]));
         });
     for (auto& th : threads) th.join();
+    done = true;
+    reader.join();
     VF_LogMsg = previous;
     std::set<uint32_t> keys;
     for (const auto& o : options) keys.insert(o.key);
