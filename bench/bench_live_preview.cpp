@@ -3,9 +3,12 @@
 // (KIV_BENCH_LIVE_SECONDS to try a shorter run), at 1280x720 and 1920x1080,
 // with NoEffect and Sepia. It reports the frames rendered, the camera frames
 // never rendered (dropped by the catch-up), the preview's frame intervals
-// (p50, p99: between the times the frames were queued into the window, as a
-// display would take them, not when this program's reader woke up, whose own
-// scheduling delay is not the preview's cadence) and the CPU the render
+// (p50, p99: between the times the frames' pixels were there, when a display
+// could first show them, as the window notes them, not when this program's
+// reader woke up, whose own scheduling delay is not the preview's cadence;
+// a swap queues its frame while the GPU still draws it, as on a device, so
+// the times the frames were queued, also reported, are the render thread's
+// cadence without the draw's) and the CPU the render
 // thread and the GL's rasteriser threads spend per frame. The peer is the
 // bare GL work of one frame done directly on a thread of its own, fed by the
 // same camera: latch (a GLConsumer), the same shader over a quad, and the
@@ -68,7 +71,7 @@ const Case kCases[] = {{1280, 720, 400, "NoEffect"},
 
 struct Result {
     uint64_t rendered = 0, dropped = 0, bareFrames = 0;
-    double p50 = 0, p99 = 0, oursCpuMs = 0, bareCpuMs = 0;
+    double p50 = 0, p99 = 0, queuedP50 = 0, queuedP99 = 0, oursCpuMs = 0, bareCpuMs = 0;
     bool ok = false;
 };
 std::vector<Result> gResults(sizeof(kCases) / sizeof(kCases[0]));
@@ -148,16 +151,17 @@ void runOurs(const Case& c, int seconds, Result* r) {
     }
     manager->notifyGLSurfaceConnectionComplete();
     camera.start(kFps);
-    kivcli::LiveStats stats(kWarmUp);
+    kivcli::LiveStats stats(kWarmUp), queued(kWarmUp);
     CpuMeter cpu(__atomic_load_n(&gOpenGLManagerThread, __ATOMIC_ACQUIRE));
     uint64_t sentAtStart = 0, renderedAtStart = 0;
     const auto start = std::chrono::steady_clock::now();
     while (std::chrono::steady_clock::now() - start < std::chrono::seconds(seconds)) {
         sp<android::GraphicBuffer> frame;
         uint64_t number = 0;
-        int64_t timestamp = 0;
-        while (preview->acquireFrame(&frame, &number, &timestamp) == android::NO_ERROR) {
-            stats.add(number, timestamp);
+        int64_t timestamp = 0, ready = 0;
+        while (preview->acquireFrame(&frame, &number, &timestamp, &ready) == android::NO_ERROR) {
+            stats.add(number, ready);
+            queued.add(number, timestamp);
             preview->releaseFrame(frame);
             if (stats.frames() == kWarmUp) {
                 sentAtStart = camera.framesQueued() + camera.framesNotQueued();
@@ -179,6 +183,8 @@ void runOurs(const Case& c, int seconds, Result* r) {
     r->dropped = sent > paced ? sent - paced : 0;
     r->p50 = stats.percentile(50);
     r->p99 = stats.percentile(99);
+    r->queuedP50 = queued.percentile(50);
+    r->queuedP99 = queued.percentile(99);
     r->oursCpuMs = paced > 0 ? cpuMs / paced : 0;
     r->ok = stats.frames() > kWarmUp;
 }
@@ -304,11 +310,12 @@ int main(int argc, char** argv) {
         }
         printf(
             "live_preview %dx%d %s at %d fps for %d s: %llu rendered, %llu dropped; interval p50 "
-            "%.1f ms, p99 %.1f ms; render thread + rasteriser CPU %.2f ms/frame, bare latch + draw "
-            "+ swap %.2f ms/frame (%llu frames)\n",
+            "%.1f ms, p99 %.1f ms (pixels there; queued: p50 %.1f ms, p99 %.1f ms); render "
+            "thread + rasteriser CPU %.2f ms/frame, bare latch + draw + swap %.2f ms/frame (%llu "
+            "frames)\n",
             c.width, c.height, c.name, kFps, runSeconds(), (unsigned long long)r.rendered,
-            (unsigned long long)r.dropped, r.p50, r.p99, r.oursCpuMs, r.bareCpuMs,
-            (unsigned long long)r.bareFrames);
+            (unsigned long long)r.dropped, r.p50, r.p99, r.queuedP50, r.queuedP99, r.oursCpuMs,
+            r.bareCpuMs, (unsigned long long)r.bareFrames);
         printf("ratio live_preview %dx%d %s ours/bare = %.2f (target <= 1.2); p99 %.1f ms%s\n",
                c.width, c.height, c.name, r.oursCpuMs / r.bareCpuMs, r.p99,
                c.width == 1280 && c.effect == 401 ? " (target <= 43, 0 dropped)" : "");

@@ -2,7 +2,8 @@
 // 24 frames a second for 20 s through Sepia into a preview window this
 // program reads, and into the host video encoder through the manager's
 // recording path. It reports the preview's frame intervals (p50, p99, between
-// the frames' queue times, as in bench_live_preview), the camera frames never
+// the times the frames' pixels were there, and between their queue times, as
+// in bench_live_preview), the camera frames never
 // rendered and the frames recorded. Then the encoder's cost a frame: frames
 // kept from that preview, as many as were recorded, encoded by the host
 // encoder alone and by the ffmpeg program alone with the same libx264
@@ -39,7 +40,7 @@ constexpr int kPeerFrames = 48;  // distinct preview frames kept for the peer
 constexpr uint64_t kWarmUp = 11;
 
 struct Result {
-    double p50 = 0, p99 = 0;
+    double p50 = 0, p99 = 0, queuedP50 = 0, queuedP99 = 0;
     uint64_t rendered = 0, dropped = 0, recorded = 0, recordable = 0;
     double encoderMs = 0, peerMs = 0;
     bool ok = false;
@@ -81,7 +82,7 @@ void BM_LiveRecord(benchmark::State& state) {
         }
         manager->notifyGLSurfaceConnectionComplete();
         camera.start(kFps);
-        kivcli::LiveStats stats(kWarmUp);
+        kivcli::LiveStats stats(kWarmUp), queued(kWarmUp);
         std::vector<std::vector<uint8_t>> kept;
         bool recording = false;
         uint64_t sentAtStart = 0, renderedAtStart = 0;
@@ -89,9 +90,11 @@ void BM_LiveRecord(benchmark::State& state) {
         while (std::chrono::steady_clock::now() - start < std::chrono::seconds(kSeconds)) {
             android::sp<android::GraphicBuffer> frame;
             uint64_t number = 0;
-            int64_t timestamp = 0;
-            while (preview->acquireFrame(&frame, &number, &timestamp) == android::NO_ERROR) {
-                stats.add(number, timestamp);
+            int64_t timestamp = 0, ready = 0;
+            while (preview->acquireFrame(&frame, &number, &timestamp, &ready) ==
+                   android::NO_ERROR) {
+                stats.add(number, ready);
+                queued.add(number, timestamp);
                 void* pixels = nullptr;
                 if (stats.frames() > kWarmUp && kept.size() < (size_t)kPeerFrames &&
                     frame->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels) == 0) {
@@ -128,6 +131,8 @@ void BM_LiveRecord(benchmark::State& state) {
         const kivhost::VideoEncoderStats e = encoder->stats();
         gResult.p50 = stats.percentile(50);
         gResult.p99 = stats.percentile(99);
+        gResult.queuedP50 = queued.percentile(50);
+        gResult.queuedP99 = queued.percentile(99);
         gResult.dropped = sent > paced ? sent - paced : 0;
         gResult.recorded = e.encoded;
         gResult.recordable = e.queued;
@@ -169,12 +174,13 @@ int main(int argc, char** argv) {
     const Result& r = gResult;
     printf(
         "live_record %dx%d at %d fps for %d s, Sepia, preview + recording: interval p50 %.1f ms, "
-        "p99 %.1f ms (target <= 43); %llu rendered, %llu dropped (target 0); recorded %llu of %llu "
+        "p99 %.1f ms (target <= 43; pixels there; queued: p50 %.1f ms, p99 %.1f ms); %llu "
+        "rendered, %llu dropped (target 0); recorded %llu of %llu "
         "frames queued to the encoder; on frames of that preview, the host encoder %.2f ms/frame, "
         "ffmpeg -c:v libx264 %.2f ms/frame (medians of 3, in turns)\n",
-        kWidth, kHeight, kFps, kSeconds, r.p50, r.p99, (unsigned long long)r.rendered,
-        (unsigned long long)r.dropped, (unsigned long long)r.recorded,
-        (unsigned long long)r.recordable, r.encoderMs, r.peerMs);
+        kWidth, kHeight, kFps, kSeconds, r.p50, r.p99, r.queuedP50, r.queuedP99,
+        (unsigned long long)r.rendered, (unsigned long long)r.dropped,
+        (unsigned long long)r.recorded, (unsigned long long)r.recordable, r.encoderMs, r.peerMs);
     printf("ratio live_record p99/period = %.2f (target <= 1.05)\n", r.p99 / 41.0);
     printf("ratio live_record encoder/ffmpeg = %.2f\n", r.encoderMs / r.peerMs);
     return 0;

@@ -3,6 +3,12 @@
 // copies the frame into a buffer of the window and queues it, and a native
 // buffer's image is made from the buffer's GPU mirror texture.
 //
+// As a device's swap, the host's queues the buffer at once with the frame
+// still being drawn: the copy into a buffer made for the GPU is a blit into
+// its image, and the buffer keeps the blit's fence, which every user of its
+// pixels waits for. Buffers for the CPU alone are read back and written
+// before they are queued.
+//
 // A device's window surface renders each frame into a buffer dequeued at the
 // frame's start, so its size follows the window from one frame to the next.
 // A pbuffer cannot change size: when the window's size differs at a frame's
@@ -11,11 +17,18 @@
 // A frame already under way when the window changes keeps its size and is
 // fitted (cut or padded) into the new buffer; a device would queue it at the
 // old size.
+#include <string.h>
+
+#include <algorithm>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <vector>
 
 #include <GLES2/gl2.h>
+#include <GLES3/gl3.h>
+#include <stdlib.h>
+#include <gui/BufferQueue.h>
 #include <system/window.h>
 #include <ui/GraphicBuffer.h>
 
@@ -87,7 +100,7 @@ public:
             return EGL_NO_SURFACE;
         }
         std::lock_guard<std::mutex> guard(mLock);
-        mWindows[surface] = {window, config, width, height, false};
+        mWindows[surface] = {window, config, width, height, false, std::make_shared<SwapImages>()};
         return surface;
     }
 
@@ -121,20 +134,6 @@ public:
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: swap of a surface that is not current");
             return EGL_FALSE;
         }
-        // Kept by the thread that swaps: a fresh frame every swap costs a
-        // page fault a page.
-        thread_local std::vector<unsigned char> frame;
-        frame.resize((size_t)target.width * target.height * 4);
-        GLint framebuffer = 0;
-        GLint alignment = 4;
-        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &framebuffer);
-        glGetIntegerv(GL_PACK_ALIGNMENT, &alignment);
-        glBindFramebuffer(GL_FRAMEBUFFER, 0);
-        glPixelStorei(GL_PACK_ALIGNMENT, 4);
-        glReadPixels(0, 0, target.width, target.height, GL_RGBA, GL_UNSIGNED_BYTE, frame.data());
-        glPixelStorei(GL_PACK_ALIGNMENT, alignment);
-        glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)framebuffer);
-
         ANativeWindow* window = target.window.get();
         ANativeWindowBuffer* native = nullptr;
         int fence = -1;
@@ -142,9 +141,10 @@ public:
             VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: no buffer to swap into");
             return EGL_FALSE;
         }
-        // Window memory is top row first; GL rows start at the bottom.
         GraphicBuffer* buffer = GraphicBuffer::from(native);
-        if (buffer->writeRgbaFrame(frame.data(), target.width, target.height, true) != 0) {
+        const bool drawn = (buffer->getUsage() & GraphicBuffer::USAGE_HW_MASK) != 0 &&
+                           blitFrame(display, target, buffer);
+        if (!drawn && !copyFrame(target, buffer)) {
             window->cancelBuffer(window, native, -1);
             return EGL_FALSE;
         }
@@ -161,14 +161,17 @@ public:
 
     EGLBoolean destroySurface(EGLDisplay display, EGLSurface surface) override {
         sp<ANativeWindow> window;
+        std::shared_ptr<SwapImages> images;
         {
             std::lock_guard<std::mutex> guard(mLock);
             auto found = mWindows.find(surface);
             if (found != mWindows.end()) {
                 window = found->second.window;
+                images = found->second.images;
                 mWindows.erase(found);
             }
         }
+        if (images != nullptr) images->clear(*this);
         if (window != nullptr) native_window_api_disconnect(window.get(), NATIVE_WINDOW_API_EGL);
         return eglDestroySurface(display, surface);
     }
@@ -212,13 +215,144 @@ public:
     }
 
 private:
+    // The images of a window's buffers that swaps blit into, made once per
+    // buffer (making one waits for the GPU) and kept while the surface lives
+    // and the window keeps the buffer.
+    class SwapImages {
+    public:
+        EGLImageKHR get(EglNativeSeam& seam, EGLDisplay display, GraphicBuffer* buffer) {
+            std::lock_guard<std::mutex> guard(mLock);
+            for (auto e = mEntries.begin(); e != mEntries.end();) {
+                if (e->buffer.get() == buffer && e->display == display) return e->image;
+                // The window let this one go (a new size, say): so do we.
+                if (e->buffer->getStrongCount() == 1 || mEntries.size() >= kMaxImages) {
+                    seam.destroyImage(e->display, e->image);
+                    e = mEntries.erase(e);
+                } else {
+                    ++e;
+                }
+            }
+            EGLImageKHR image = seam.createNativeBufferImage(display, buffer);
+            if (image != EGL_NO_IMAGE_KHR) mEntries.push_back({buffer, display, image});
+            return image;
+        }
+        void clear(EglNativeSeam& seam) {
+            std::vector<Entry> entries;
+            {
+                std::lock_guard<std::mutex> guard(mLock);
+                entries.swap(mEntries);
+            }
+            for (const Entry& e : entries) seam.destroyImage(e.display, e.image);
+        }
+
+    private:
+        static const size_t kMaxImages = android::BufferQueue::NUM_BUFFER_SLOTS;
+        struct Entry {
+            sp<GraphicBuffer> buffer;
+            EGLDisplay display;
+            EGLImageKHR image;
+        };
+        std::mutex mLock;
+        std::vector<Entry> mEntries;
+    };
+
     struct WindowSurface {
         sp<ANativeWindow> window;
         EGLConfig config = nullptr;
         int width = 0;
         int height = 0;
         bool frameStarted = false;  // made current since creation or the last swap
+        std::shared_ptr<SwapImages> images;
     };
+
+    // Whether the current context can blit between framebuffers (OpenGL ES 3).
+    static bool canBlit() {
+        const char* version = reinterpret_cast<const char*>(glGetString(GL_VERSION));
+        const char* prefix = "OpenGL ES ";
+        return version != nullptr && strncmp(version, prefix, strlen(prefix)) == 0 &&
+               atoi(version + strlen(prefix)) >= 3;
+    }
+
+    // Copies the current frame into the buffer through its image on the GPU
+    // (rows flipped: window memory is top row first, GL rows start at the
+    // bottom), then fences the copy and hands the fence to the buffer. Parts
+    // of the frame outside the buffer are cut; parts of the buffer the frame
+    // does not cover keep their pixels. The caller's GL state is kept.
+    // False (nothing drawn) when the GL or the buffer cannot take the copy.
+    bool blitFrame(EGLDisplay display, const WindowSurface& target, GraphicBuffer* buffer) {
+        if (!canBlit()) return false;
+        EGLImageKHR image = target.images->get(*this, display, buffer);
+        if (image == EGL_NO_IMAGE_KHR) return false;
+        while (glGetError() != GL_NO_ERROR) {
+        }
+        GLint readFramebuffer = 0, drawFramebuffer = 0, renderbuffer = 0;
+        glGetIntegerv(GL_READ_FRAMEBUFFER_BINDING, &readFramebuffer);
+        glGetIntegerv(GL_DRAW_FRAMEBUFFER_BINDING, &drawFramebuffer);
+        glGetIntegerv(GL_RENDERBUFFER_BINDING, &renderbuffer);
+        const GLboolean scissor = glIsEnabled(GL_SCISSOR_TEST);
+        const GLboolean discard = glIsEnabled(GL_RASTERIZER_DISCARD);
+        GLuint storage = 0, framebuffer = 0;
+        glGenRenderbuffers(1, &storage);
+        glBindRenderbuffer(GL_RENDERBUFFER, storage);
+        EglExtensions::get().glEGLImageTargetRenderbufferStorageOES(GL_RENDERBUFFER,
+                                                                    (GLeglImageOES)image);
+        glGenFramebuffers(1, &framebuffer);
+        glBindFramebuffer(GL_DRAW_FRAMEBUFFER, framebuffer);
+        glFramebufferRenderbuffer(GL_DRAW_FRAMEBUFFER, GL_COLOR_ATTACHMENT0, GL_RENDERBUFFER,
+                                  storage);
+        bool ok = glCheckFramebufferStatus(GL_DRAW_FRAMEBUFFER) == GL_FRAMEBUFFER_COMPLETE;
+        if (ok) {
+            const GLint w = std::min<GLint>(target.width, (GLint)buffer->getWidth());
+            const GLint h = std::min<GLint>(target.height, (GLint)buffer->getHeight());
+            glBindFramebuffer(GL_READ_FRAMEBUFFER, 0);
+            glDisable(GL_SCISSOR_TEST);
+            glDisable(GL_RASTERIZER_DISCARD);
+            glBlitFramebuffer(0, target.height - h, w, target.height, 0, h, w, 0,
+                              GL_COLOR_BUFFER_BIT, GL_NEAREST);
+            if (scissor) glEnable(GL_SCISSOR_TEST);
+            if (discard) glEnable(GL_RASTERIZER_DISCARD);
+        }
+        glBindFramebuffer(GL_READ_FRAMEBUFFER, (GLuint)readFramebuffer);
+        glBindFramebuffer(GL_DRAW_FRAMEBUFFER, (GLuint)drawFramebuffer);
+        glBindRenderbuffer(GL_RENDERBUFFER, (GLuint)renderbuffer);
+        glDeleteFramebuffers(1, &framebuffer);
+        glDeleteRenderbuffers(1, &storage);
+        const GLenum error = glGetError();
+        if (!ok || error != GL_NO_ERROR) {
+            VF_LogMsg(VF_LOG_ERROR, "EglNativeSeam: cannot blit the frame into its buffer (0x%04x)",
+                      error);
+            return false;
+        }
+        EGLSyncKHR fence =
+            EglExtensions::get().eglCreateSyncKHR(display, EGL_SYNC_FENCE_KHR, nullptr);
+        if (fence != EGL_NO_SYNC_KHR) {
+            glFlush();  // the GPU starts on the frame now, not at the next one
+        } else {
+            glFinish();
+        }
+        buffer->setGpuWrite(display, fence);
+        return true;
+    }
+
+    // The frame read back and written into the buffer by the CPU before the
+    // swap returns: for buffers the GPU cannot reach.
+    static bool copyFrame(const WindowSurface& target, GraphicBuffer* buffer) {
+        // Kept by the thread that swaps: a fresh frame every swap costs a
+        // page fault a page.
+        thread_local std::vector<unsigned char> frame;
+        frame.resize((size_t)target.width * target.height * 4);
+        GLint framebuffer = 0;
+        GLint alignment = 4;
+        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &framebuffer);
+        glGetIntegerv(GL_PACK_ALIGNMENT, &alignment);
+        glBindFramebuffer(GL_FRAMEBUFFER, 0);
+        glPixelStorei(GL_PACK_ALIGNMENT, 4);
+        glReadPixels(0, 0, target.width, target.height, GL_RGBA, GL_UNSIGNED_BYTE, frame.data());
+        glPixelStorei(GL_PACK_ALIGNMENT, alignment);
+        glBindFramebuffer(GL_FRAMEBUFFER, (GLuint)framebuffer);
+        // Window memory is top row first; GL rows start at the bottom.
+        return buffer->writeRgbaFrame(frame.data(), target.width, target.height, true) == 0;
+    }
 
     // When the window's size differs from the surface's, replaces *surface by a
     // pbuffer of the window's size; a context drawing into the old one on this

@@ -61,6 +61,9 @@ status_t GLConsumer::bindImage_l(EGLDisplay display) {
         slot.buffer = mCurrent.mGraphicBuffer;
         slot.display = display;
     }
+    // A frame drawn by another context may still be on its way (a device
+    // waits for the acquire fence here).
+    mCurrent.mGraphicBuffer->waitForGpuWrite();
     while (glGetError() != GL_NO_ERROR) {
     }
     EglExtensions::get().glEGLImageTargetTexture2DOES(mTexTarget, (GLeglImageOES)slot.image);

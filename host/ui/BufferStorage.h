@@ -11,6 +11,9 @@
 #include <mutex>
 #include <vector>
 
+#include <EGL/egl.h>
+#include <EGL/eglext.h>
+
 #include "host/graphics/SharedPixels.h"
 #include "host/ui/GpuMirror.h"
 #include "vccore/vc_image.h"
@@ -42,6 +45,11 @@ struct BufferStorage {
     bool gpuUsed = false;    // an EGL image was made over the mirror
     int images = 0;          // EGL images alive over the mirror
     bool gpuDirty = false;   // rendered through an image that is gone, not read back yet
+    bool gpuDrawn = false;   // a window surface's swap drew into it, not read back yet
+    // That swap's draw, while it may still be in flight: an EGL fence that
+    // signals once the pixels are there (EGL_NO_SYNC_KHR when none).
+    EGLDisplay writeDisplay = EGL_NO_DISPLAY;
+    EGLSyncKHR writeFence = EGL_NO_SYNC_KHR;
     // The CPU copy as the last read-back left it, while that lock is held:
     // an unlock that finds it unchanged has nothing to send back up.
     std::vector<unsigned char> readbackCopy;
@@ -49,7 +57,7 @@ struct BufferStorage {
     uint32_t readbacks = 0;
 
     // Whether GPU rendering may be waiting to reach the CPU copy.
-    bool gpuWrote() const { return render && gpuUsed && (images > 0 || gpuDirty); }
+    bool gpuWrote() const { return gpuDrawn || (render && gpuUsed && (images > 0 || gpuDirty)); }
 
     ~BufferStorage() {
         mirror.reset();

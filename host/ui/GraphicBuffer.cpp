@@ -48,6 +48,8 @@ void GraphicBuffer::init(uint32_t w, uint32_t h, PixelFormat f, uint32_t inUsage
 }
 
 GraphicBuffer::~GraphicBuffer() {
+    // The memory may be recycled: a draw into it must be over first.
+    waitForGpuWrite();
     GraphicBufferAllocator::get().free(std::move(mStorage));
 }
 
@@ -90,6 +92,7 @@ EGLImageKHR GraphicBuffer::createEglImage(EGLDisplay display) {
     if (mStorage == nullptr) return EGL_NO_IMAGE_KHR;
     BufferStorage& s = *mStorage;
     std::lock_guard<std::mutex> guard(s.mLock);
+    if (!GraphicBufferMapper::waitForWrite_l(s)) return EGL_NO_IMAGE_KHR;
     // The first GPU use makes the mirror (unless it came with recycled
     // memory) and brings it the CPU copy.
     if (s.mirror == nullptr) s.mirror = GpuMirror::make(s);
@@ -122,6 +125,30 @@ void GraphicBuffer::onEglImageDestroyed() {
     if (mStorage->images > 0) --mStorage->images;
     // What was rendered through the image is still to be read back.
     mStorage->gpuDirty = true;
+}
+
+void GraphicBuffer::setGpuWrite(EGLDisplay display, EGLSyncKHR fence) {
+    if (mStorage == nullptr) return;
+    BufferStorage& s = *mStorage;
+    std::lock_guard<std::mutex> guard(s.mLock);
+    // An earlier draw nobody waited for (its frame was dropped unread) was
+    // queued before this one and is over by now: let its fence go.
+    GraphicBufferMapper::waitForWrite_l(s);
+    s.writeDisplay = display;
+    s.writeFence = fence;
+    s.gpuDrawn = true;
+}
+
+status_t GraphicBuffer::waitForGpuWrite() {
+    if (mStorage == nullptr) return NO_ERROR;
+    std::lock_guard<std::mutex> guard(mStorage->mLock);
+    return GraphicBufferMapper::waitForWrite_l(*mStorage) ? NO_ERROR : UNKNOWN_ERROR;
+}
+
+bool GraphicBuffer::hasGpuWrite() {
+    if (mStorage == nullptr) return false;
+    std::lock_guard<std::mutex> guard(mStorage->mLock);
+    return mStorage->writeFence != EGL_NO_SYNC_KHR;
 }
 
 status_t GraphicBuffer::writeRgbaFrame(const unsigned char* rgba, uint32_t frameWidth,

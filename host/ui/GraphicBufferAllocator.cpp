@@ -112,6 +112,7 @@ void GraphicBufferAllocator::free(std::unique_ptr<BufferStorage> s) {
     s->gpuUsed = false;
     s->images = 0;
     s->gpuDirty = false;
+    s->gpuDrawn = false;
     s->uploads = s->readbacks = 0;
     std::vector<std::unique_ptr<BufferStorage>> evicted;  // freed once the lock is let go
     {

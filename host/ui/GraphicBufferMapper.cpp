@@ -4,10 +4,12 @@
 
 #include <ui/GraphicBuffer.h>
 
+#include "core/egl/EglExtensions.h"
 #include "host/graphics/HostGl.h"
 #include "vc_image_layout.h"
 #include "vccore/vc_convert.h"
 #include "vccore/vc_geometry.h"
+#include "vccore/vc_log.h"
 
 namespace android {
 
@@ -42,14 +44,33 @@ bool GraphicBufferMapper::move(const PixelRows& from, const PixelRows& to,
     return VCImage_drawImage(&source, &target, 0, 0) == 0;
 }
 
+bool GraphicBufferMapper::waitForWrite_l(BufferStorage& s) {
+    if (s.writeFence == EGL_NO_SYNC_KHR) return true;
+    const EglExtensions& ext = EglExtensions::get();
+    const bool done = ext.eglClientWaitSyncKHR(s.writeDisplay, s.writeFence, 0, EGL_FOREVER_KHR) ==
+                      EGL_CONDITION_SATISFIED_KHR;
+    if (!done) {
+        // Nothing else tells when the draw ends: wait for all GPU work.
+        VF_LogMsg(VF_LOG_ERROR, "GraphicBuffer: cannot wait for the draw's fence (0x%04x)",
+                  eglGetError());
+        if (!HostGl::get().waitForGpu()) return false;
+    }
+    ext.eglDestroySyncKHR(s.writeDisplay, s.writeFence);
+    s.writeFence = EGL_NO_SYNC_KHR;
+    s.writeDisplay = EGL_NO_DISPLAY;
+    return true;
+}
+
 status_t GraphicBufferMapper::lock_l(BufferStorage& s, uint32_t usage) {
     if ((usage & GraphicBuffer::USAGE_SOFTWARE_MASK) == 0) return BAD_VALUE;
     if (s.lockUsage != 0) return INVALID_OPERATION;
+    if (!waitForWrite_l(s)) return UNKNOWN_ERROR;
     const bool cpuWrites = (usage & GraphicBuffer::USAGE_SW_WRITE_MASK) != 0;
     const bool shared = s.mirror != nullptr && s.mirror->kind() == GpuMirror::SHARED;
     if (s.gpuWrote()) {
         if (!s.mirror->toCpu(s)) return UNKNOWN_ERROR;
         s.gpuDirty = false;
+        s.gpuDrawn = false;
         s.zero = false;
         if (!shared) {
             ++s.readbacks;

@@ -1,6 +1,9 @@
 // CPU locks of host buffers: one at a time, with a software usage, over the
 // image core's plane layout. The two points where the CPU copy and the GPU
 // mirror meet are here:
+//  - a lock, like any GPU use through an image, first waits for a window
+//    surface's draw into the buffer that may still be in flight (its swap
+//    queued the buffer with a fence, as a device's does);
 //  - a lock of a render target whose mirror the GPU may have drawn into
 //    (an EGL image is alive, or was since the last lock) brings the drawing
 //    to the CPU copy first. A lock on a thread with a current context fences
@@ -59,6 +62,9 @@ public:
                                   uint32_t fourcc);
 
     static status_t lock(BufferStorage& storage, uint32_t usage, void** vaddr);
+    // Waits for a swap's draw still in flight into the buffer, then lets its
+    // fence go. False when the fence could not be waited for.
+    static bool waitForWrite_l(BufferStorage& storage);
     // BAD_VALUE for a layout without chroma planes.
     static status_t lockYCbCr(BufferStorage& storage, uint32_t usage, android_ycbcr* ycbcr);
     // INVALID_OPERATION when not locked.

@@ -1,15 +1,24 @@
-// The host window (dropping the oldest frame, perform/query) and the host EGL
-// window surface whose swap queues the rendered frame into it, following the
-// window's size from frame to frame.
+// The host window (dropping the oldest frame, perform/query, when frames'
+// pixels were there) and the host EGL window surface whose swap queues the
+// rendered frame into it, following the window's size from frame to frame,
+// with the frame still being drawn into a GPU buffer.
+// kiv-test-labels: threads
 #include <gui/HostWindow.h>
 
+#include <GLES3/gl3.h>
 #include <android/native_window.h>
 #include <gtest/gtest.h>
+#include <gui/BufferItemConsumer.h>
+#include <gui/BufferQueue.h>
+#include <utils/Timers.h>
 
+#include <algorithm>
+#include <string>
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglWindowSurface.h"
+#include "host/ui/GraphicBufferTestSeam.h"
 #include "support/gl_context.h"
 
 using android::GraphicBuffer;
@@ -84,11 +93,9 @@ TEST(HostWindowTest, PerformChangesGeometryCountAndUsage) {
     EXPECT_EQ(window->getStrongCount(), 1);
 }
 
-// The next queued frame is w x h and holds GlTest_fillHalves(w, h) top row
-// first: the upper half blue, the lower half red, every pixel opaque.
-void expectHalvesFrame(const sp<HostWindow>& window, int w, int h) {
-    sp<GraphicBuffer> frame;
-    ASSERT_EQ(window->acquireFrame(&frame, nullptr, nullptr), android::NO_ERROR);
+// The frame is w x h and holds GlTest_fillHalves(w, h) top row first: the
+// upper half blue, the lower half red, every pixel opaque.
+void expectHalves(const sp<GraphicBuffer>& frame, int w, int h) {
     ASSERT_EQ(std::make_pair(uint32_t(w), uint32_t(h)),
               std::make_pair(frame->getWidth(), frame->getHeight()));
     void* address = nullptr;
@@ -102,6 +109,13 @@ void expectHalvesFrame(const sp<HostWindow>& window, int w, int h) {
                 << w << "x" << h << " at " << x << "," << y;
     }
     frame->unlock();
+}
+
+// The next queued frame, as expectHalves() checks it.
+void expectHalvesFrame(const sp<HostWindow>& window, int w, int h) {
+    sp<GraphicBuffer> frame;
+    ASSERT_EQ(window->acquireFrame(&frame, nullptr, nullptr), android::NO_ERROR);
+    expectHalves(frame, w, h);
     window->releaseFrame(frame);
 }
 
@@ -147,6 +161,150 @@ TEST_F(GlContextTest, HostWindowFramesFollowTheWindowSize) {
     ASSERT_EQ(mGl->surface()->bindSurface(), 0);
     surface->release();
     EXPECT_EQ(window->getConnectedApi(), 0);
+}
+
+// Frame k is a solid colour of its own.
+std::vector<uint8_t> frameColour(int k) {
+    return {uint8_t(20 + k * 37), uint8_t(250 - k * 29), uint8_t(k * 11), 255};
+}
+
+// Whether every pixel of a w x h RGBA frame of `stride` pixels is `colour`.
+bool solid(const uint8_t* rows, int w, int h, int stride, const std::vector<uint8_t>& colour) {
+    for (int y = 0; y < h; ++y) {
+        for (int x = 0; x < w; ++x) {
+            if (!std::equal(colour.begin(), colour.end(), rows + ((size_t)y * stride + x) * 4))
+                return false;
+        }
+    }
+    return true;
+}
+
+struct SwapCase {
+    const char* name;
+    uint64_t usage;  // the window's; the consumer adds a software read
+    bool sharedStorage;
+    bool queuedWhileDrawn;  // the GPU copies the frame after the swap returned
+};
+const SwapCase kSwapCases[] = {
+    {"RenderTarget", GraphicBuffer::USAGE_HW_RENDER | GraphicBuffer::USAGE_HW_TEXTURE, true, true},
+    {"RenderTargetCopiedByGl", GraphicBuffer::USAGE_HW_RENDER, false, true},
+    // The recording target's: for the GPU, not asked to be rendered into.
+    {"VideoEncoder", GraphicBuffer::USAGE_HW_VIDEO_ENCODER, true, true},
+    {"VideoEncoderCopiedByGl", GraphicBuffer::USAGE_HW_VIDEO_ENCODER, false, true},
+    {"SoftwareOnly", GraphicBuffer::USAGE_SW_WRITE_OFTEN, true, false},
+};
+
+class SwapTest : public GlContextTest, public ::testing::WithParamInterface<SwapCase> {
+protected:
+    void TearDown() override {
+        android::GraphicBufferTestSeam::allowSharedStorage(true);
+        GlContextTest::TearDown();
+    }
+};
+
+// Each frame is queued (with its draw still in flight for GPU buffers) and
+// holds exactly its own pixels for whoever first looks, by a CPU lock or by
+// the GPU through a new image: never a frame an earlier swap left in the
+// buffer. The swap neither uses nor changes the caller's framebuffer and
+// scissor.
+TEST_P(SwapTest, FramesHoldTheirOwnPixelsWhenFirstSeen) {
+    const SwapCase& c = GetParam();
+    constexpr int W = 96, H = 64;
+    android::GraphicBufferTestSeam::allowSharedStorage(c.sharedStorage);
+    sp<android::IGraphicBufferProducer> producer;
+    sp<android::IGraphicBufferConsumer> queue;
+    android::BufferQueue::createBufferQueue(&producer, &queue);
+    queue->setDefaultBufferSize(W, H);
+    sp<android::BufferItemConsumer> consumer =
+        new android::BufferItemConsumer(queue, GraphicBuffer::USAGE_SW_READ_OFTEN);
+    sp<android::Surface> window = new android::Surface(producer);
+    ASSERT_EQ(native_window_set_usage(window.get(), c.usage), 0);
+    sp<EglWindowSurface> surface =
+        new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
+    ASSERT_EQ(surface->initialize(), 0);
+    ASSERT_EQ(surface->bindSurface(), 0);
+    GlTarget own;
+    ASSERT_TRUE(GlTest_makeTarget(4, 4, &own));
+    glEnable(GL_SCISSOR_TEST);
+    const EGLDisplay display = mGl->env()->getEGLDisplay();
+    for (int k = 0; k < 7; ++k) {
+        SCOPED_TRACE(k);
+        const std::vector<uint8_t> colour = frameColour(k);
+        glBindFramebuffer(GL_FRAMEBUFFER, 0);
+        glScissor(0, 0, W, H);
+        glClearColor(colour[0] / 255.0f, colour[1] / 255.0f, colour[2] / 255.0f, 1.0f);
+        glClear(GL_COLOR_BUFFER_BIT);
+        glBindFramebuffer(GL_FRAMEBUFFER, own.framebuffer);
+        glScissor(1, 1, 1, 1);
+        ASSERT_EQ(surface->swapSurface(), 0);
+        GLint bound = 0;
+        glGetIntegerv(GL_FRAMEBUFFER_BINDING, &bound);
+        EXPECT_EQ(std::make_pair(GLuint(bound), GLboolean(GL_TRUE)),
+                  std::make_pair(own.framebuffer, glIsEnabled(GL_SCISSOR_TEST)));
+        android::BufferItem item;
+        ASSERT_EQ(consumer->acquireBuffer(&item, 0), android::NO_ERROR);
+        const sp<GraphicBuffer>& frame = item.mGraphicBuffer;
+        EXPECT_EQ(frame->hasGpuWrite(), c.queuedWhileDrawn);
+        if (k % 2 == 1) {
+            const std::vector<uint8_t> seen = GlTest_bufferPixels(display, frame);
+            ASSERT_EQ(seen.size(), size_t(W * H * 4));
+            EXPECT_TRUE(solid(seen.data(), W, H, W, colour));
+        }
+        void* pixels = nullptr;
+        ASSERT_EQ(frame->lock(GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels), android::NO_ERROR);
+        EXPECT_FALSE(frame->hasGpuWrite());
+        EXPECT_TRUE(solid(static_cast<uint8_t*>(pixels), W, H, (int)frame->getStride(), colour));
+        frame->unlock();
+        ASSERT_EQ(consumer->releaseBuffer(item), android::NO_ERROR);
+    }
+    glDisable(GL_SCISSOR_TEST);
+    GlTest_deleteTarget(&own);
+    ASSERT_EQ(mGl->surface()->bindSurface(), 0);
+    surface->release();
+}
+
+INSTANTIATE_TEST_SUITE_P(Buffers, SwapTest, ::testing::ValuesIn(kSwapCases),
+                         [](const ::testing::TestParamInfo<SwapCase>& info) {
+                             return std::string(info.param.name);
+                         });
+
+// A frame drawn by the GPU is ready once its draw is over, after it was
+// queued; a frame the CPU wrote is ready when queued. Frames can be taken
+// before they are ready: the window waits. Going away with draws in flight
+// and frames unread leaves nothing behind (the fixture counts GL objects;
+// the sanitizers, memory, fences' threads and races).
+TEST_F(GlContextTest, HostWindowNotesWhenEachFrameIsReady) {
+    for (const bool gpu : {true, false}) {
+        SCOPED_TRACE(gpu);
+        sp<HostWindow> window = new HostWindow(64, 48);
+        if (!gpu) native_window_set_usage(window.get(), GraphicBuffer::USAGE_SW_READ_OFTEN);
+        sp<EglWindowSurface> surface =
+            new EglWindowSurface(mGl->env(), window, EglWindowSurface::SURFACE_PREVIEW);
+        ASSERT_EQ(surface->initialize(), 0);
+        ASSERT_EQ(surface->bindSurface(), 0);
+        int64_t lastReady = 0;
+        for (int k = 0; k < 5; ++k) {
+            GlTest_fillHalves(64, 48);
+            ASSERT_EQ(surface->swapSurface(), 0);
+            if (k >= 3) continue;  // left in flight, unread
+            sp<GraphicBuffer> frame;
+            int64_t queuedAt = 0, readyAt = 0;
+            ASSERT_EQ(window->acquireFrame(&frame, nullptr, &queuedAt, &readyAt),
+                      android::NO_ERROR);
+            EXPECT_FALSE(frame->hasGpuWrite());  // waited for by the window
+            if (gpu) {
+                EXPECT_GT(readyAt, queuedAt);
+            } else {
+                EXPECT_EQ(readyAt, queuedAt);
+            }
+            EXPECT_GT(readyAt, lastReady);
+            lastReady = readyAt;
+            ASSERT_NO_FATAL_FAILURE(expectHalves(frame, 64, 48));
+            window->releaseFrame(frame);
+        }
+        ASSERT_EQ(mGl->surface()->bindSurface(), 0);
+        surface->release();
+    }
 }
 
 }  // namespace

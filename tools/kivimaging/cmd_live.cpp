@@ -442,11 +442,13 @@ int cmdLive(int argc, char** argv) {
     for (;;) {
         sp<android::GraphicBuffer> frame;
         uint64_t number = 0;
-        int64_t timestamp = 0;
+        int64_t timestamp = 0, ready = 0;
         bool any = false;
-        while (preview->acquireFrame(&frame, &number, &timestamp) == android::NO_ERROR) {
+        // Intervals between the times the frames' pixels were there, where
+        // a display could first show them.
+        while (preview->acquireFrame(&frame, &number, &timestamp, &ready) == android::NO_ERROR) {
             any = true;
-            stats.add(number, timestamp);
+            stats.add(number, ready);
             void* pixels = nullptr;
             if (frame->lock(android::GraphicBuffer::USAGE_SW_READ_OFTEN, &pixels) == 0) {
                 if (!sink.put((const uint8_t*)pixels, o.width, o.height, (int)frame->getStride(),

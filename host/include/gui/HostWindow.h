@@ -3,11 +3,17 @@
 // render into (the preview window of a host pipeline, tests). The queue is in
 // async mode, as a display is: a producer never waits, and a frame nobody
 // took makes room for the next when every slot is busy.
+//
+// Like a display, the window also notes when each frame could first be
+// shown: a frame queued while its draw is still in flight (a host EGL
+// swap's) is ready when the draw's fence signals, which a thread of the
+// window waits for as it comes; any other frame is ready when queued.
 #ifndef KIV_HOST_GUI_HOSTWINDOW_H
 #define KIV_HOST_GUI_HOSTWINDOW_H
 
 #include <stdint.h>
 
+#include <memory>
 #include <mutex>
 #include <vector>
 
@@ -26,8 +32,11 @@ public:
     HostWindow(uint32_t width, uint32_t height, PixelFormat format = HAL_PIXEL_FORMAT_RGBA_8888);
 
     // Consumer side. The oldest queued frame, or WOULD_BLOCK when none is
-    // queued. The slot stays with the consumer until releaseFrame().
-    status_t acquireFrame(sp<GraphicBuffer>* buffer, uint64_t* frameNumber, int64_t* timestamp);
+    // queued. The slot stays with the consumer until releaseFrame(). With
+    // `readyTime`, also the time (systemTime(SYSTEM_TIME_MONOTONIC), as the
+    // queue's timestamps) at which its pixels were there, once they are.
+    status_t acquireFrame(sp<GraphicBuffer>* buffer, uint64_t* frameNumber, int64_t* timestamp,
+                          int64_t* readyTime = nullptr);
     status_t releaseFrame(const sp<GraphicBuffer>& buffer);
 
     // The newest queued frame, RGBA rows top first, with the older ones
@@ -58,9 +67,14 @@ private:
     static Queue makeQueue(uint32_t width, uint32_t height, PixelFormat format);
     explicit HostWindow(const Queue& queue);
 
+    struct Readiness;
+    class FrameWatch;
+
     const sp<BufferItemConsumer> mConsumer;
     std::mutex mLock;
     std::vector<BufferItem> mAcquired;
+    const std::shared_ptr<Readiness> mReadiness;
+    const sp<FrameWatch> mWatch;  // the queue holds it weakly
 };
 
 }  // namespace android

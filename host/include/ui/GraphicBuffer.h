@@ -113,6 +113,19 @@ public:
     // left as they were. Goes through lock/unlock, so the mirror follows.
     status_t writeRgbaFrame(const unsigned char* rgba, uint32_t frameWidth, uint32_t frameHeight,
                             bool bottomUp);
+    // For the host EGL seam: the GPU has been asked to draw the buffer's
+    // pixels (through an image) and `fence`, an EGL fence on `display` that
+    // the buffer takes over, signals once they are there (EGL_NO_SYNC_KHR
+    // when they already are). The next CPU lock reads the drawing back (or
+    // shares it), and it, a new image, waitForGpuWrite() and the buffer's
+    // end all wait for the fence first: no user sees the pixels before.
+    void setGpuWrite(EGLDisplay display, EGLSyncKHR fence);
+    // What a GPU user of an image already made waits for before sampling
+    // (a device's acquire fence). NO_ERROR, or UNKNOWN_ERROR when the fence
+    // could not be waited for.
+    status_t waitForGpuWrite();
+    // Whether such a draw may still be in flight (its fence not waited for).
+    bool hasGpuWrite();
 
     GraphicBuffer(const GraphicBuffer&) = delete;
     GraphicBuffer& operator=(const GraphicBuffer&) = delete;
