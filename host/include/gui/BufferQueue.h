@@ -2,9 +2,10 @@
 // producer and one consumer, as on a device where the library depends on it
 // (slot states, frame numbers, transforms and timestamps, frame-available
 // callbacks on the producer's thread, blocking or non-blocking dequeue, the
-// consumer's release fences, NO_INIT to the producer once abandoned). Not
-// modelled: binder, buffer sharing across processes, acquire fences, timed
-// presentation, shared-buffer mode.
+// consumer's release fences, NO_INIT to the producer once abandoned). A
+// frame's acquire fence travels in its buffer, not in the queue (see
+// IGraphicBufferProducer.h). Not modelled: binder, buffer sharing across
+// processes, timed presentation, shared-buffer mode.
 #ifndef KIV_HOST_GUI_BUFFERQUEUE_H
 #define KIV_HOST_GUI_BUFFERQUEUE_H
 

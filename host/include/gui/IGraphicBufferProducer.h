@@ -1,6 +1,8 @@
 // The producer end of a buffer queue (what a Surface stands on). A host has
-// no fences: a buffer is ready when it is handed over, and the queue itself
-// waits for the consumer's release fence before it hands a buffer out again.
+// no fence file descriptors: a frame still being drawn carries its draw's
+// EGL fence in its buffer (GraphicBuffer::setGpuWrite), which the buffer's
+// users wait for, and the queue itself waits for the consumer's release
+// fence before it hands a buffer out again.
 #ifndef KIV_HOST_GUI_IGRAPHICBUFFERPRODUCER_H
 #define KIV_HOST_GUI_IGRAPHICBUFFERPRODUCER_H
 
