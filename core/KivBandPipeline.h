@@ -87,8 +87,8 @@ public:
     int run(KivDecodeAhead* ahead, VCStreamWriter* writer);
 
     // Rows per drawn band for a picture `width` pixels wide: about a
-    // megabyte of RGBA (each picture keeps a few bands on each side of GL,
-    // counted twice in resident memory), in whole llvmpipe tiles (64 rows).
+    // megabyte of RGBA (each picture keeps a few bands on each side of GL),
+    // in whole llvmpipe tiles (64 rows).
     static int bandRows(int width);
     // For tests: bands of `rows` rows (a multiple of 64) whatever the width;
     // 0 goes back to bandRows().

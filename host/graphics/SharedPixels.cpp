@@ -213,18 +213,17 @@ bool SharedPixels::takePart(int k) {
     if (mRingFd < 0 || k < 0) return false;
     const size_t pixelStart = (size_t)(mPixels - static_cast<unsigned char*>(mMapping));
     const size_t slot = (size_t)(k % mSlots) * mPartBytes;
+    // Only the driver's mapping moves; the CPU uses it too (pixels()).
+    // The slot's pages move on with their page tables: mapping them afresh
+    // would drop and rebuild an entry for every page of every part (a good
+    // part of a large picture's CPU time).
+    const int before = k - mSlots;
+    const bool moved = before >= 0 && movePart(mDriverPixels, before, k);
     bool ok = true;
-    for (unsigned char* base : {mPixels, mDriverPixels}) {
-        // The slot's pages move on with their page tables: mapping them
-        // afresh would drop and rebuild an entry for every page of every
-        // part (a good part of a large picture's CPU time).
-        const int before = k - mSlots;
-        const bool moved = before >= 0 && movePart(base, before, k);
-        // The part before gets its own (never written) pages back: zeros.
-        if (before >= 0)
-            ok = mapPart(base, before, mFd, pixelStart + (size_t)before * mPartBytes, false) && ok;
-        if (!moved) ok = mapPart(base, k, mRingFd, slot, true) && ok;
-    }
+    // The part before gets its own (never written) pages back: zeros.
+    if (before >= 0)
+        ok = mapPart(mDriverPixels, before, mFd, pixelStart + (size_t)before * mPartBytes, false);
+    if (!moved) ok = mapPart(mDriverPixels, k, mRingFd, slot, true) && ok;
     return ok;
 }
 

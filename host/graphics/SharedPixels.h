@@ -25,7 +25,8 @@ public:
     bool allocate(uint32_t width, uint32_t height);
     void free();
 
-    unsigned char* pixels() const { return mPixels; }
+    // With a ring, the driver's mapping (the one that moves).
+    unsigned char* pixels() const { return mDriverPixels != nullptr ? mDriverPixels : mPixels; }
     // What the importer maps: the whole file, header included.
     size_t fileSize() const { return mFileSize; }
     uint32_t width() const { return mWidth; }
@@ -41,9 +42,9 @@ public:
     // of the pixels (`partBytes` bytes from k * partBytes, whole pages) lives
     // in slot k % slots of a ring that stays in memory, so that going through
     // a large picture neither allocates, zeroes nor gives back memory. The
-    // CPU's mapping and the driver's (found among the process's mappings)
-    // are both moved. False when the driver's mapping cannot be found
-    // (nothing changes).
+    // CPU uses the driver's mapping from then on (found among the process's
+    // mappings), the only one that moves. False when the driver's mapping
+    // cannot be found (nothing changes).
     bool useRing(size_t partBytes, int slots);
     // Before part k is touched: it takes its slot, and the part that held the
     // slot before (k - slots) reads as zeros from then on. The caller makes
