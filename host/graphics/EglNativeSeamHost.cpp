@@ -3,11 +3,13 @@
 // copies the frame into a buffer of the window and queues it, and a native
 // buffer's image is made from the buffer's GPU mirror texture.
 //
-// As a device's swap, the host's queues the buffer at once with the frame
-// still being drawn: the copy into a buffer made for the GPU is a blit into
-// its image, and the buffer keeps the blit's fence, which every user of its
-// pixels waits for. Buffers for the CPU alone are read back and written
-// before they are queued.
+// As a device's swap, the host's queues the buffer without reading the
+// frame back: the copy into a buffer made for the GPU is a blit into its
+// image, and the buffer keeps the blit's fence, which every user of its
+// pixels waits for. (llvmpipe itself waits for the frame's draw inside the
+// blit, its pbuffers being display targets, so the swap still returns once
+// the draw is over; a driver that does not wait returns at once.) Buffers
+// for the CPU alone are read back and written before they are queued.
 //
 // A device's window surface renders each frame into a buffer dequeued at the
 // frame's start, so its size follows the window from one frame to the next.
