@@ -68,7 +68,6 @@ struct VideoEncoder::State {
     int64_t firstTimestamp = 0;
     int64_t lastPts = -1;
 
-    uint64_t queuedAtAbandon = 0;  // the queue's count when it was let go
 
     sp<BufferItemConsumer> consumer;
     sp<BufferItemConsumer::FrameAvailableListener> signal;
@@ -227,9 +226,6 @@ void VideoEncoder::fail(int status) {
 void VideoEncoder::abandonQueue() {
     State& s = *mState;
     s.consumer->abandon();
-    const uint64_t queued = s.consumer->getQueueStats().queued;  // final once abandoned
-    std::lock_guard<std::mutex> guard(s.lock);
-    if (queued > s.queuedAtAbandon) s.queuedAtAbandon = queued;
 }
 
 // One queued frame: converted into a frame of the pool and handed to the
@@ -333,8 +329,9 @@ void VideoEncoder::intakeLoop() {
     for (int i = 0; i < android::BufferQueue::NUM_BUFFER_SLOTS && takeFrame(); ++i) {
     }
     abandonQueue();
+    const uint64_t queued = s.consumer->getQueueStats().queued;  // final once abandoned
     std::lock_guard<std::mutex> guard(s.lock);
-    s.stats.queued = s.queuedAtAbandon;
+    s.stats.queued = queued;
     // What was queued after the last look is lost with the queue.
     if (s.stats.queued > s.taken) s.stats.dropped += s.stats.queued - s.taken;
     s.intakeDone = true;
@@ -414,7 +411,6 @@ VideoEncoderStats VideoEncoder::stats() const {
     {
         std::lock_guard<std::mutex> guard(s.lock);
         result = s.stats;
-        if (result.queued < s.queuedAtAbandon) result.queued = s.queuedAtAbandon;
         consumer = s.consumer;
     }
     // The queue's own count (an abandoned queue keeps its final one).
