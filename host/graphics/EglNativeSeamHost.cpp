@@ -37,6 +37,7 @@
 #include "core/egl/EglExtensions.h"
 #include "core/egl/EglNativeSeam.h"
 #include "HostGl.h"
+#include "RasteriserAffinity.h"
 #include "ShaderPrecision.h"
 #include "SharedPixels.h"
 #include "vccore/vc_log.h"
@@ -82,6 +83,7 @@ private:
 class HostEglNativeSeam : public EglNativeSeam {
 public:
     void prepareDisplay() override { android::HostGl::prepareDisplay(); }
+    void contextCreated(EGLDisplay, EGLContext) override { android::RasteriserAffinity_apply(); }
 
     EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config, ANativeWindow* window,
                                    const EGLint* /*attribs*/) override {

@@ -1,5 +1,7 @@
 #include "host/graphics/HostGl.h"
 
+#include "host/graphics/RasteriserAffinity.h"
+
 #include <stdlib.h>
 
 #include "core/egl/EglExtensions.h"
@@ -82,6 +84,7 @@ bool HostGl::create_l() {
         destroy_l();
         return false;
     }
+    RasteriserAffinity_apply();
     // Without fences glFinish() orders instead.
     mFences = EglExtensions::hasEgl(mDisplay, "EGL_KHR_fence_sync") &&
               EglExtensions::get().eglCreateSyncKHR != nullptr;

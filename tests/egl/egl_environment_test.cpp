@@ -5,16 +5,21 @@
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
 #include <gtest/gtest.h>
+#include <dirent.h>
 #include <gui/HostWindow.h>
+#include <sched.h>
 #include <stdlib.h>
 #include <system/window.h>
 
+#include <fstream>
+#include <map>
 #include <string>
 #include <vector>
 
 #include "core/egl/EglEnvironment.h"
 #include "core/egl/EglExtensions.h"
 #include "core/egl/EglWindowSurface.h"
+#include "host/graphics/RasteriserAffinity.h"
 #include "support/gl_context.h"
 #include "support/log_capture.h"
 
@@ -69,6 +74,56 @@ TEST(EglEnvironmentTest, BuildsAnEs2ContextFromItsAttributeLists) {
         {"E GL Clearing error: 0x0500 'GL_INVALID_ENUM' at core/egl/EglEnvironment:#"}));
     EXPECT_EQ(glGetError(), static_cast<GLenum>(GL_NO_ERROR));
     EXPECT_EQ(other->release(), 0);
+}
+
+std::vector<int> cpusOf(pid_t tid) {
+    cpu_set_t set;
+    std::vector<int> cpus;
+    if (sched_getaffinity(tid, sizeof(set), &set) != 0) return cpus;
+    for (int cpu = 0; cpu < CPU_SETSIZE; ++cpu) {
+        if (CPU_ISSET(cpu, &set)) cpus.push_back(cpu);
+    }
+    return cpus;
+}
+
+// The rasteriser threads of this process: thread id by rasteriser number.
+std::map<int, pid_t> rasterisers() {
+    std::map<int, pid_t> found;
+    DIR* dir = opendir("/proc/self/task");
+    while (dirent* e = dir != nullptr ? readdir(dir) : nullptr) {
+        std::string name;
+        std::getline(std::ifstream(std::string("/proc/self/task/") + e->d_name + "/comm"), name);
+        if (name.rfind("llvmpipe-", 0) == 0) found[atoi(name.c_str() + 9)] = atoi(e->d_name);
+    }
+    if (dir != nullptr) closedir(dir);
+    return found;
+}
+
+// The host's software GPU: from the first context on, rasteriser thread N
+// runs on the Nth core only; turned off, the threads keep every core.
+TEST(EglEnvironmentTest, HostRasteriserThreadsEachKeepACoreOfTheirOwn) {
+    const std::vector<int> cores = cpusOf(0);
+    if (cores.size() < 2) GTEST_SKIP() << "one core";
+    sp<EglEnvironment> env = new EglEnvironment();
+    ASSERT_EQ(env->initialize(), 0);
+    const std::map<int, pid_t> threads = rasterisers();
+    ASSERT_GE(threads.size(), 2u);
+    for (const auto& t : threads) {
+        EXPECT_EQ(cpusOf(t.second), std::vector<int>{cores[t.first % cores.size()]}) << t.first;
+    }
+    cpu_set_t all;
+    CPU_ZERO(&all);
+    for (int cpu : cores) CPU_SET(cpu, &all);
+    for (const auto& t : threads) ASSERT_EQ(sched_setaffinity(t.second, sizeof(all), &all), 0);
+    setenv("KIV_HOST_RASTERISER_AFFINITY", "0", 1);
+    EXPECT_EQ(android::RasteriserAffinity_apply(), 0);
+    for (const auto& t : threads) EXPECT_EQ(cpusOf(t.second), cores) << t.first;
+    unsetenv("KIV_HOST_RASTERISER_AFFINITY");
+    EXPECT_EQ(android::RasteriserAffinity_apply(), (int)threads.size());
+    for (const auto& t : threads) {
+        EXPECT_EQ(cpusOf(t.second), std::vector<int>{cores[t.first % cores.size()]}) << t.first;
+    }
+    EXPECT_EQ(env->release(), 0);
 }
 
 TEST_F(GlContextTest, PbufferIsOneByOneBindsSwapsAndReleases) {

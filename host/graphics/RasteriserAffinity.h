@@ -1,0 +1,24 @@
+// The host's GPU is llvmpipe, and its rasteriser threads ("llvmpipe-N", one
+// per core, shared by every context of the display) are the GPU's cores.
+// Left to the scheduler, a rasteriser thread woken by another is often put on
+// the waker's core while the other core idles, and stays there: a 720p frame
+// then rasterises on one core in twice its time (about one frame in ten on
+// this two-core machine, the main cause of the live preview's late frames).
+// Each thread is kept on a core of its own, as a device's GPU has cores of
+// its own. The rasteriser hands out tiles to whichever thread asks next, so a
+// core busy with something else delays no more than the tile on it.
+// KIV_HOST_RASTERISER_AFFINITY=0 leaves the threads to the scheduler (to
+// measure the difference).
+#ifndef HOST_GRAPHICS_RASTERISERAFFINITY_H
+#define HOST_GRAPHICS_RASTERISERAFFINITY_H
+
+namespace android {
+
+// Puts rasteriser thread N of this process on the Nth core this thread may
+// run on (N modulo their count). Returns how many threads it placed; 0 when
+// turned off, with one core, or with no rasteriser threads.
+int RasteriserAffinity_apply();
+
+}  // namespace android
+
+#endif
