@@ -12,11 +12,12 @@
 // thread and the GL's rasteriser threads spend per frame. The peer is the
 // bare GL work of one frame done directly on a thread of its own, fed by the
 // same camera: latch (a GLConsumer), the same shader over a quad, and the
-// swap into a window, each frame drawn as soon as the camera's frame
-// arrives; its CPU per frame and its preview's intervals are measured the
-// same way, in a run as long as ours after each of ours. Its intervals are
-// what this machine's GL allows a preview at the camera's rate: the camera's
-// cadence plus the spread of the GPU's time per frame.
+// swap into a window, a frame every 41 ms as the manager paces itself (on an
+// absolute clock here, so with no drift and no overshoot to make up), each
+// latching the camera's newest frame; its CPU per frame and its preview's
+// intervals are measured the same way, in a run as long as ours after each
+// of ours. Its intervals are what this machine's GL allows a preview paced
+// that way: the period plus the spread of the GPU's time per frame.
 #include <EGL/egl.h>
 #include <GLES2/gl2.h>
 #include <GLES2/gl2ext.h>
@@ -62,6 +63,7 @@ using android::sp;
 
 constexpr int kFps = 24;
 constexpr uint64_t kWarmUp = 11;  // the unpaced frames
+constexpr long kPeriodNs = 41000000;  // the manager's pacing
 
 struct Case {
     int width, height, effect;
@@ -224,6 +226,12 @@ public:
         --mPending;
         return true;
     }
+    int takeAll() {
+        std::lock_guard<std::mutex> guard(mLock);
+        const int pending = mPending;
+        mPending = 0;
+        return pending;
+    }
 
 private:
     std::mutex mLock;
@@ -278,12 +286,24 @@ void runBare(const Case& c, int seconds, Result* r) {
             uint64_t frames = 0;
             const auto start = std::chrono::steady_clock::now();
             const auto end = start + std::chrono::seconds(seconds);
-            while (arrivals->take(end)) {
+            // The camera's first frame starts the clock.
+            bool running = arrivals->take(end);
+            if (running) latch->updateTexImage();
+            timespec next{};
+            clock_gettime(CLOCK_MONOTONIC, &next);
+            while (running && std::chrono::steady_clock::now() < end) {
                 if (frames == kWarmUp) cpu.start();
-                latch->updateTexImage();
                 drawQuad(program, c.width, c.height, uv);
                 if (seam.swapBuffers(display, &surface) != EGL_TRUE) break;
                 ++frames;
+                next.tv_nsec += kPeriodNs;
+                if (next.tv_nsec >= 1000000000L) {
+                    next.tv_nsec -= 1000000000L;
+                    ++next.tv_sec;
+                }
+                clock_nanosleep(CLOCK_MONOTONIC, TIMER_ABSTIME, &next, nullptr);
+                // The newest of the frames that came meanwhile.
+                for (int n = arrivals->takeAll(); n > 0; --n) latch->updateTexImage();
             }
             if (frames > kWarmUp) {
                 r->bareFrames = frames - kWarmUp;
