@@ -1,6 +1,7 @@
 #include "host/graphics/RasteriserAffinity.h"
 
 #include <dirent.h>
+#include <errno.h>
 #include <fcntl.h>
 #include <sched.h>
 #include <stdio.h>
@@ -49,7 +50,7 @@ int RasteriserAffinity_apply() {
     if (cores.size() < 2) return 0;
     DIR* tasks = opendir("/proc/self/task");
     if (tasks == nullptr) return 0;
-    int placed = 0;
+    int placed = 0, refused = 0, error = 0;
     while (dirent* entry = readdir(tasks)) {
         if (entry->d_name[0] == '.') continue;
         const int number = rasteriserNumber(entry->d_name);
@@ -60,10 +61,15 @@ int RasteriserAffinity_apply() {
         if (sched_setaffinity((pid_t)atoi(entry->d_name), sizeof(one), &one) == 0) {
             ++placed;
         } else {
-            VF_LogMsg(VF_LOG_WARNING, "Host GL: rasteriser thread %s keeps its cores", entry->d_name);
+            ++refused;
+            error = errno;
         }
     }
     closedir(tasks);
+    if (refused > 0) {
+        VF_LogMsg(VF_LOG_WARNING, "Host GL: %d rasteriser thread(s) keep every core: %s", refused,
+                  strerror(error));
+    }
     return placed;
 }
 
