@@ -15,8 +15,10 @@
 namespace android {
 
 // Puts rasteriser thread N of this process on the Nth core this thread may
-// run on (N modulo their count). Returns how many threads it placed; 0 when
-// turned off, with one core, or with no rasteriser threads.
+// run on (N modulo their count), after waiting up to 50 ms for as many
+// threads as llvmpipe starts to have named themselves. Returns how many
+// threads it placed; 0 when turned off, with one core, or with no rasteriser
+// threads.
 int RasteriserAffinity_apply();
 
 }  // namespace android
