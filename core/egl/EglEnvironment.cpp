@@ -60,7 +60,7 @@ int EglEnvironment::initialize() {
         mEglContext == EGL_NO_CONTEXT) {
         return VC_REPORT(VC_ERROR_UNKNOWN);
     }
-    EglNativeSeam::get().contextCreated(mEglDisplay, mEglContext);
+    EglNativeSeam::get().contextCreated(mEglDisplay);
 
     mInitialized = 1;
     return 0;

@@ -66,9 +66,9 @@ public:
     // Called before the first eglGetDisplay (a headless host selects its EGL
     // platform here).
     virtual void prepareDisplay() = 0;
-    // Called after each context is created (a host settles its software
-    // GPU's threads, which exist from the first context on).
-    virtual void contextCreated(EGLDisplay display, EGLContext context) = 0;
+    // Called after each context of `display` is created (a host settles its
+    // software GPU's threads, which exist from the first context on).
+    virtual void contextCreated(EGLDisplay display) = 0;
 
     virtual EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config,
                                            ANativeWindow* window, const EGLint* attribs) = 0;

@@ -14,7 +14,7 @@ namespace {
 class DeviceEglNativeSeam : public EglNativeSeam {
 public:
     void prepareDisplay() override {}
-    void contextCreated(EGLDisplay, EGLContext) override {}
+    void contextCreated(EGLDisplay) override {}
 
     EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config, ANativeWindow* window,
                                    const EGLint* attribs) override {

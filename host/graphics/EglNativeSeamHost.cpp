@@ -83,7 +83,9 @@ private:
 class HostEglNativeSeam : public EglNativeSeam {
 public:
     void prepareDisplay() override { android::HostGl::prepareDisplay(); }
-    void contextCreated(EGLDisplay, EGLContext) override { android::RasteriserAffinity_apply(); }
+    void contextCreated(EGLDisplay display) override {
+        android::RasteriserAffinity_apply(display);
+    }
 
     EGLSurface createWindowSurface(EGLDisplay display, EGLConfig config, ANativeWindow* window,
                                    const EGLint* /*attribs*/) override {

@@ -1,11 +1,10 @@
 #include "host/graphics/HostGl.h"
 
-#include "host/graphics/RasteriserAffinity.h"
-
 #include <stdlib.h>
 
 #include "core/egl/EglExtensions.h"
 #include "host/graphics/EglDisplayReferences.h"
+#include "host/graphics/RasteriserAffinity.h"
 #include "vccore/vc_log.h"
 
 namespace android {
@@ -84,7 +83,7 @@ bool HostGl::create_l() {
         destroy_l();
         return false;
     }
-    RasteriserAffinity_apply();
+    RasteriserAffinity_apply(mDisplay);
     // Without fences glFinish() orders instead.
     mFences = EglExtensions::hasEgl(mDisplay, "EGL_KHR_fence_sync") &&
               EglExtensions::get().eglCreateSyncKHR != nullptr;

@@ -66,6 +66,16 @@ size_t expectedRasterisers() {
     return (size_t)(count < kMaxRasterisers ? count : kMaxRasterisers);
 }
 
+// Only Mesa's software driver ("swrast") has rasteriser threads to wait for.
+bool softwareDriver(EGLDisplay display) {
+    using DriverName = const char* (*)(EGLDisplay);
+    const DriverName name =
+        reinterpret_cast<DriverName>(eglGetProcAddress("eglGetDisplayDriverName"));
+    const char* driver = name != nullptr ? name(display) : nullptr;
+    if (driver == nullptr) eglGetError();  // ours, not the caller's to find
+    return driver != nullptr && strstr(driver, "swrast") != nullptr;
+}
+
 long elapsedNs(const timespec& since) {
     timespec now{};
     clock_gettime(CLOCK_MONOTONIC, &now);
@@ -74,9 +84,9 @@ long elapsedNs(const timespec& since) {
 
 }  // namespace
 
-int RasteriserAffinity_apply() {
+int RasteriserAffinity_apply(EGLDisplay display) {
     const char* setting = getenv("KIV_HOST_RASTERISER_AFFINITY");
-    if (setting != nullptr && strcmp(setting, "0") == 0) return 0;
+    if ((setting != nullptr && strcmp(setting, "0") == 0) || !softwareDriver(display)) return 0;
     cpu_set_t allowed;
     if (sched_getaffinity(0, sizeof(allowed), &allowed) != 0) return 0;
     std::vector<int> cores;

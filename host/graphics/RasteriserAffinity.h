@@ -12,14 +12,16 @@
 #ifndef HOST_GRAPHICS_RASTERISERAFFINITY_H
 #define HOST_GRAPHICS_RASTERISERAFFINITY_H
 
+#include <EGL/egl.h>
+
 namespace android {
 
-// Puts rasteriser thread N of this process on the Nth core this thread may
-// run on (N modulo their count), after waiting up to 50 ms for as many
-// threads as llvmpipe starts to have named themselves. Returns how many
-// threads it placed; 0 when turned off, with one core, or with no rasteriser
-// threads.
-int RasteriserAffinity_apply();
+// With Mesa's software driver behind `display`: puts rasteriser thread N of
+// this process on the Nth core this thread may run on (N modulo their
+// count), after waiting up to 50 ms for as many threads as llvmpipe starts
+// to have named themselves. Returns how many threads it placed; 0 when
+// turned off, with one core, or with another driver.
+int RasteriserAffinity_apply(EGLDisplay display);
 
 }  // namespace android
 

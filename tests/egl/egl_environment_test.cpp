@@ -118,10 +118,12 @@ TEST(EglEnvironmentTest, HostRasteriserThreadsEachKeepACoreOfTheirOwn) {
     for (int cpu : cores) CPU_SET(cpu, &all);
     for (const auto& t : threads) EXPECT_EQ(sched_setaffinity(t.second, sizeof(all), &all), 0);
     setenv("KIV_HOST_RASTERISER_AFFINITY", "0", 1);
-    EXPECT_EQ(android::RasteriserAffinity_apply(), 0);
+    EXPECT_EQ(android::RasteriserAffinity_apply(env->getEGLDisplay()), 0);
     for (const auto& t : threads) EXPECT_EQ(cpusOf(t.second), cores) << t.first;
     unsetenv("KIV_HOST_RASTERISER_AFFINITY");
-    EXPECT_EQ(android::RasteriserAffinity_apply(), (int)threads.size());
+    EXPECT_EQ(android::RasteriserAffinity_apply(env->getEGLDisplay()), (int)threads.size());
+    // Another display's driver (none here) has no rasterisers to place.
+    EXPECT_EQ(android::RasteriserAffinity_apply(EGL_NO_DISPLAY), 0);
     for (const auto& t : threads) {
         EXPECT_EQ(cpusOf(t.second), std::vector<int>{cores[t.first % cores.size()]}) << t.first;
     }
