@@ -1,5 +1,6 @@
 #include "core/KivBandPipeline.h"
 
+#include <limits.h>
 #include <pthread.h>
 #include <string.h>
 #include <sys/mman.h>
@@ -68,7 +69,15 @@ int KivBandPipeline::bandRows(int width) {
 void KivBandPipeline::fail(int status) {
     std::lock_guard<std::mutex> guard(mLock);
     if (mStatus == 0) mStatus = status;
-    mChanged.notify_all();
+    wakeReady();
+}
+
+void KivBandPipeline::wakeReady() {
+    const bool failed = mStatus != 0;
+    if (failed || mDrawn >= mDecoderNeedsDrawn) mDecoderWake.notify_one();
+    if (failed || mDrawn >= mEncoderNeedsDrawn) mEncoderWake.notify_one();
+    if (failed || (mDecoded >= mDrawNeedsDecoded && mEncoded >= mDrawNeedsEncoded))
+        mDrawWake.notify_one();
 }
 
 int KivBandPipeline::onDecoded(void* self, const unsigned char* rgba, int first, int rows) {
@@ -101,11 +110,10 @@ int KivBandPipeline::makeRoom(int first, int rows) {
         // Room: no further ahead of the drawn rows than the bands in flight
         // and the reach of the next band need.
         std::unique_lock<std::mutex> lock(mLock);
-        mChanged.wait(lock, [&] {
-            return mStatus != 0 ||
-                   (first + rows <= mDrawn + kBandsInFlight * mBandRows + mPicture.haloRows &&
-                    (!newBand || mDrawn >= freed));
-        });
+        mDecoderNeedsDrawn = std::max(first + rows - kBandsInFlight * mBandRows - mPicture.haloRows,
+                                      newBand ? freed : 0);
+        mDecoderWake.wait(lock, [&] { return mStatus != 0 || mDrawn >= mDecoderNeedsDrawn; });
+        mDecoderNeedsDrawn = INT_MAX;
         if (mStatus != 0) return mStatus;
     }
     if (newBand && !mSource.takeBand(band)) return VC_REPORT(VC_ERROR_ALLOC_FAILED);
@@ -115,7 +123,7 @@ int KivBandPipeline::makeRoom(int first, int rows) {
 void KivBandPipeline::rowsStored(int end) {
     std::lock_guard<std::mutex> guard(mLock);
     mDecoded = end;
-    mChanged.notify_all();
+    wakeReady();
 }
 
 int KivBandPipeline::storeRows(const unsigned char* rgba, int first, int rows) {
@@ -159,7 +167,9 @@ void KivBandPipeline::encode(VCStreamWriter* writer) {
         int drawn;
         {
             std::unique_lock<std::mutex> lock(mLock);
-            mChanged.wait(lock, [&] { return mStatus != 0 || mDrawn > y; });
+            mEncoderNeedsDrawn = y + 1;
+            mEncoderWake.wait(lock, [&] { return mStatus != 0 || mDrawn >= mEncoderNeedsDrawn; });
+            mEncoderNeedsDrawn = INT_MAX;
             if (mStatus != 0) return;
             drawn = mDrawn;
         }
@@ -171,7 +181,7 @@ void KivBandPipeline::encode(VCStreamWriter* writer) {
         if (mTargetSlots == 0) mTarget.discardRowsBelow(y);
         std::lock_guard<std::mutex> guard(mLock);
         mEncoded = y;
-        mChanged.notify_all();
+        wakeReady();
     }
 }
 
@@ -190,9 +200,13 @@ int KivBandPipeline::draw() {
             const int encoded = y0 - (mTargetSlots > 0 ? std::min(kBandsInFlight, mTargetSlots - 1)
                                                        : kBandsInFlight) *
                                          mBandRows;
-            mChanged.wait(lock, [&] {
-                return mStatus != 0 || (mDecoded >= std::min(h, y1 + halo) && mEncoded >= encoded);
+            mDrawNeedsDecoded = std::min(h, y1 + halo);
+            mDrawNeedsEncoded = encoded;
+            mDrawWake.wait(lock, [&] {
+                return mStatus != 0 ||
+                       (mDecoded >= mDrawNeedsDecoded && mEncoded >= mDrawNeedsEncoded);
             });
+            mDrawNeedsDecoded = mDrawNeedsEncoded = INT_MAX;
             if (mStatus != 0) break;
         }
         if (mTargetSlots > 0 && !mTarget.takeBand(y0 / mBandRows)) {
@@ -221,7 +235,7 @@ int KivBandPipeline::draw() {
         if (mSourceSlots == 0 && y1 - halo > 0) mSource.discardRowsBelow(y1 - halo);
         std::lock_guard<std::mutex> guard(mLock);
         mDrawn = y1;
-        mChanged.notify_all();
+        wakeReady();
     }
     if (!tiled) glDisable(GL_SCISSOR_TEST);
     std::lock_guard<std::mutex> guard(mLock);
