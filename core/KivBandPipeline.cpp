@@ -313,12 +313,10 @@ int KivBandPipeline::start(VCStreamReader* reader, KivDecodeAhead* ahead, VCStre
     const int reachBands = (mPicture.haloRows + mBandRows - 1) / mBandRows;
     const int sourceSlots = kBandsInFlight + 1 + 2 * reachBands;
     const int targetSlots = kBandsInFlight + 1;
-    if (mTiles.source == nullptr) {
-        if (sourceSlots < bands && mSource.useBandRing(mBandRows, sourceSlots))
-            mSourceSlots = sourceSlots;
-        if (targetSlots < bands && mTarget.useBandRing(mBandRows, targetSlots))
-            mTargetSlots = targetSlots;
-    }
+    if (sourceSlots < bands && mSource.useBandRing(mBandRows, sourceSlots))
+        mSourceSlots = sourceSlots;
+    if (targetSlots < bands && mTarget.useBandRing(mBandRows, targetSlots))
+        mTargetSlots = targetSlots;
     std::thread decoder([this, reader, ahead] {
         pthread_setname_np(pthread_self(), ahead != nullptr ? "kiv-hand-on" : "kiv-decode");
         decode(reader, ahead);
@@ -334,14 +332,53 @@ int KivBandPipeline::start(VCStreamReader* reader, KivDecodeAhead* ahead, VCStre
     return rc != 0 ? rc : mStatus;
 }
 
+namespace {
+
+size_t pageSize() {
+    return (size_t)sysconf(_SC_PAGESIZE);
+}
+
+// Address space that reads as zeros until written.
+void* reserve(void* at, size_t bytes) {
+    return mmap(at, bytes, PROT_READ | PROT_WRITE,
+                MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | (at != nullptr ? MAP_FIXED : 0), -1,
+                0);
+}
+
+}  // namespace
+
 bool KivRowStore::make(int width, int height) {
     mPitch = (size_t)width * 4;
-    mSize = mPitch * (size_t)height;
-    void* rows = mmap(nullptr, mSize, PROT_READ | PROT_WRITE,
-                      MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
+    mSize = (mPitch * (size_t)height + pageSize() - 1) / pageSize() * pageSize();
+    void* rows = reserve(nullptr, mSize);
     if (rows == MAP_FAILED) return false;
     mRows = static_cast<unsigned char*>(rows);
     return true;
+}
+
+bool KivRowStore::useBandRing(int bandRows, int slots) {
+    const size_t bytes = (size_t)bandRows * mPitch;
+    if (mRows == nullptr || mBandBytes != 0 || bytes == 0 || bytes % pageSize() != 0 || slots < 1)
+        return false;
+    mBandBytes = bytes;
+    mSlots = slots;
+    return true;
+}
+
+bool KivRowStore::takeBand(int band) {
+    if (mBandBytes == 0 || band < 0 || (size_t)band * mBandBytes >= mSize) return false;
+    const int before = band - mSlots;
+    if (before < 0) return true;
+    unsigned char* from = mRows + (size_t)before * mBandBytes;
+    unsigned char* to = mRows + (size_t)band * mBandBytes;
+    // The last band may be short of a whole one.
+    const size_t bytes = std::min(mBandBytes, mSize - (size_t)band * mBandBytes);
+    // The pages move with their page tables; where they cannot, the band
+    // before gives its memory back and this one is faulted in afresh.
+    if (mremap(from, bytes, bytes, MREMAP_MAYMOVE | MREMAP_FIXED, to) == MAP_FAILED)
+        return madvise(from, mBandBytes, MADV_DONTNEED) == 0;
+    // What moved away reads as zeros again.
+    return reserve(from, bytes) != MAP_FAILED;
 }
 
 KivRowStore::~KivRowStore() {
@@ -349,7 +386,7 @@ KivRowStore::~KivRowStore() {
 }
 
 void KivRowStore::discardRowsBelow(int y) {
-    const size_t page = (size_t)sysconf(_SC_PAGESIZE);
+    const size_t page = pageSize();
     const size_t end = (size_t)y * mPitch / page * page;
     if (end <= mDiscarded) return;
     madvise(mRows + mDiscarded, end - mDiscarded, MADV_DONTNEED);

@@ -154,6 +154,8 @@ private:
 
 // Picture-sized RGBA rows in CPU memory of which only the rows written and
 // not yet discarded hold pages: the source and target of tiled pictures.
+// With a ring, a band's pages move on to the band that takes its slot, so a
+// large picture is not faulted in and zeroed band after band.
 class KivRowStore : public EglSharedPicture {
 public:
     // Reserves the address space; false when it cannot.
@@ -163,12 +165,17 @@ public:
     unsigned char* row(int y) const override { return mRows + (size_t)y * mPitch; }
     size_t pitch() const override { return mPitch; }
     void discardRowsBelow(int y) override;
+    // Bands of whole pages only.
+    bool useBandRing(int bandRows, int slots) override;
+    bool takeBand(int band) override;
 
 private:
     unsigned char* mRows = nullptr;
     size_t mPitch = 0;
-    size_t mSize = 0;
+    size_t mSize = 0;  // whole pages
     size_t mDiscarded = 0;
+    size_t mBandBytes = 0;  // with a ring
+    int mSlots = 0;
 };
 
 #endif

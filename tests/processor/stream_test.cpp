@@ -3,7 +3,9 @@
 // kiv-test-labels: threads
 #include <gtest/gtest.h>
 #include <stdlib.h>
+#include <string.h>
 
+#include <algorithm>
 #include <functional>
 #include <numeric>
 #include <string>
@@ -179,7 +181,7 @@ TEST_P(StreamTest, NeighbourReadingEffectsKeepTheirReach) {
 // effects that use the position (Vignette, Rainbow, Ripple) may round the
 // odd pixel to the next level.
 TEST_P(StreamTest, TilesGiveTheUntiledPixels) {
-    for (auto size : {std::make_pair(256, 64), std::make_pair(64, 256), std::make_pair(200, 150)}) {
+    for (auto size : {std::make_pair(256, 64), std::make_pair(64, 448), std::make_pair(200, 150)}) {
         const Bytes input = pictureFile(size.first, size.second);
         const KivPixelReach reach = KivFilter_pixelReach(effect(), size.first, size.second);
         const bool near = reach.kind == KivPixelReach::NEIGHBOURS;
@@ -218,6 +220,50 @@ INSTANTIATE_TEST_SUITE_P(Factory, StreamTest, ::testing::ValuesIn(factoryIds()),
 // stops every stage and says why. A sink gets the stream as it is made, the
 // same bytes; one that refuses stops every stage (no hang) with the
 // encoder's failure.
+// A tiled picture's rows in CPU memory taking turns in a ring of two: a band
+// takes over the pages of the band two before it (their rows still there,
+// not faulted in afresh as zeros), which reads as zeros after; the band
+// before keeps its rows; the last band may be short. Bands that are not
+// whole pages have no ring.
+TEST(RowStore, BandsTakeTurnsInARing) {
+    const int w = 64, bandRows = 64, bands = 5, h = bandRows * bands - 8;
+    const size_t rowBytes = w * 4;
+    KivRowStore rows;
+    ASSERT_TRUE(rows.make(w, h));
+    EXPECT_FALSE(rows.takeBand(0));
+    EXPECT_FALSE(rows.useBandRing(3, 2));
+    ASSERT_TRUE(rows.useBandRing(bandRows, 2));
+    EXPECT_FALSE(rows.useBandRing(bandRows, 2));
+    auto rowsIn = [&](int band) { return std::min(bandRows, h - band * bandRows); };
+    auto fill = [&](int band, int seed) {
+        for (int y = 0; y < rowsIn(band); ++y)
+            memset(rows.row(band * bandRows + y), seed + y, rowBytes);
+    };
+    // Whether every byte of the band's rows is `seed` + its row (0: zeros).
+    auto holds = [&](int band, int seed) {
+        for (int y = 0; y < rowsIn(band); ++y) {
+            const unsigned char* row = rows.row(band * bandRows + y);
+            const unsigned char want = seed == 0 ? 0 : (unsigned char)(seed + y);
+            for (size_t i = 0; i < rowBytes; ++i)
+                if (row[i] != want) return false;
+        }
+        return true;
+    };
+    for (int band = 0; band < bands; ++band) {
+        SCOPED_TRACE(band);
+        ASSERT_TRUE(rows.takeBand(band));
+        EXPECT_TRUE(holds(band, band < 2 ? 0 : 10 * (band - 1)));
+        fill(band, 10 * (band + 1));
+        if (band >= 1) {
+            EXPECT_TRUE(holds(band - 1, 10 * band));
+        }
+        if (band >= 2) {
+            EXPECT_TRUE(holds(band - 2, 0));
+        }
+    }
+    EXPECT_FALSE(rows.takeBand(bands));
+}
+
 TEST(StreamRefusal, StatusReasonAndSinks) {
     Bands bands;
     bands.processor.setEffect(401);
