@@ -4,6 +4,7 @@
 #include <string.h>
 #include <turbojpeg.h>
 
+#include <algorithm>
 #include <cmath>
 #include <set>
 #include <thread>
@@ -497,4 +498,80 @@ TEST(VcStream, RowsLandWhereTheCallerPlacesThem) {
             }
         }
     }
+}
+
+// A stream pulled from a source, in pieces of any size, decodes to the rows
+// of the same bytes held whole (a JPEG with large segments to skip, a PNG);
+// a source that ends early is a truncated picture, one that fails a read
+// failure, and a source of anything else no reader at all.
+TEST(VcStream, PulledBytesDecodeAsTheWholeOnes) {
+    REQUIRE_GENERAL_CODECS();
+    const int w = 50, h = 40;
+    ImagePtr source = makeRgba(w, h);
+    Bytes jpeg = encodeJpeg(source.get(), 90);
+    // Two application segments no decoder keeps, skipped across many pulls.
+    for (int i = 0; i < 2; ++i) {
+        Bytes segment = {0xFF, 0xE9, 0xEA, 0x60};
+        segment.resize(2 + 0xEA60, (unsigned char)(0x20 + i));
+        jpeg.insert(jpeg.begin() + 2, segment.begin(), segment.end());
+    }
+    struct Pulling {
+        const Bytes* bytes;
+        size_t at;
+        size_t piece;    // bytes per pull at most
+        size_t failAt;  // a read failure from here
+        size_t end;     // the stream ends here
+    };
+    auto pull = [](void* user, unsigned char* to, size_t count) -> long {
+        Pulling* p = static_cast<Pulling*>(user);
+        if (p->at >= p->failAt) return -1;
+        const size_t n = std::min({count, p->piece, p->end - p->at, p->failAt - p->at});
+        if (n > 0) memcpy(to, p->bytes->data() + p->at, n);
+        p->at += n;
+        return (long)n;
+    };
+    auto copy = [](void* user, const unsigned char* rgba, int first, int rows) {
+        memcpy(static_cast<unsigned char*>(user) + first * w * 4, rgba, rows * w * 4);
+        return 0;
+    };
+    for (const Bytes& input : {jpeg, encodePng(source.get())}) {
+        Bytes whole(w * h * 4);
+        VCStreamReader* reader = VCStreamReader_open(input.data(), input.size());
+        int width = 0, height = 0;
+        ASSERT_EQ(0, VCStreamReader_readHeader(reader, &width, &height));
+        ASSERT_EQ(0, VCStreamReader_readBands(reader, 16, copy, whole.data()));
+        VCStreamReader_close(reader);
+        const size_t all = input.size(), none = SIZE_MAX;
+        const struct {
+            size_t piece, failAt, end;
+            int status;
+            VCDecodeFailure why;
+        } cases[] = {{7, none, all, 0, VC_DECODE_OK},
+                     {100000, none, all, 0, VC_DECODE_OK},
+                     {1000, none, all - 300, VC_ERROR_CODEC_FAILED, VC_DECODE_TRUNCATED},
+                     {1000, all - 300, all, VC_ERROR_CODEC_FAILED, VC_DECODE_READ_FAILED}};
+        for (const auto& c : cases) {
+            SCOPED_TRACE(testing::Message() << input.size() << " bytes, pieces of " << c.piece
+                                            << ", ending at " << c.end << ", failing at "
+                                            << c.failAt);
+            Pulling pulling{&input, 0, c.piece, c.failAt, c.end};
+            reader = VCStreamReader_openSource(pull, &pulling);
+            ASSERT_NE(reader, nullptr);
+            ASSERT_EQ(0, VCStreamReader_readHeader(reader, &width, &height));
+            EXPECT_EQ(w, width);
+            Bytes pulled(w * h * 4);
+            EXPECT_EQ(c.status, VCStreamReader_readBands(reader, 16, copy, pulled.data()));
+            EXPECT_EQ(c.why, VCStreamReader_failure(reader));
+            VCStreamReader_close(reader);
+            EXPECT_EQ(c.status == 0, pulled == whole);
+        }
+    }
+    const char garbage[] = "hello, this is not a picture";
+    const Bytes notPictures[] = {Bytes(garbage, garbage + sizeof(garbage)), Bytes{0xFF}, Bytes{}};
+    for (const Bytes& input : notPictures) {
+        Pulling pulling{&input, 0, 3, SIZE_MAX, input.size()};
+        EXPECT_EQ(VCStreamReader_openSource(pull, &pulling), nullptr);
+        EXPECT_EQ(VCPicture_lastFailure(), VC_DECODE_NOT_A_PICTURE);
+    }
+    EXPECT_EQ(VCStreamReader_openSource(nullptr, nullptr), nullptr);
 }

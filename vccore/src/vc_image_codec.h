@@ -10,6 +10,7 @@
 
 #include "vccore/vc_image.h"
 #include "vccore/vc_picture.h"
+#include "vccore/vc_stream.h"
 
 // The platform's fast JPEG codec, opened at run time when installed.
 #define VC_FAST_JPEG_LIBRARY "libkivjpeginterface.so"
@@ -78,10 +79,30 @@ inline bool VCPictureReader_forEachBand(int height, int rows,
     return true;
 }
 
-// A reader for JPEG or PNG data, null for anything else.
+// Encoded bytes as a reader takes them: a whole buffer, or pulled from a
+// source as the decoding goes (the first bytes, read to tell the format,
+// given back first).
+struct VCByteInput {
+    const unsigned char* bytes = nullptr;
+    size_t length = 0;
+    VCStreamSource source = nullptr;
+    void* user = nullptr;
+    unsigned char head[8] = {};
+    size_t headLength = 0;
+    size_t headUsed = 0;
+    bool failed = false;  // the source could not be read
+
+    bool pulled() const { return source != nullptr; }
+    // From a source: up to `count` bytes, fewer only at its end or failure.
+    size_t pull(unsigned char* to, size_t count);
+};
+
+// A reader for JPEG or PNG data, null for anything else (a source's first
+// bytes are read to tell).
 std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length);
-std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length);
-std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, size_t length);
+std::unique_ptr<VCPictureReader> VCPictureReader_create(VCByteInput input);
+std::unique_ptr<VCPictureReader> VCJpegReader_create(const VCByteInput& input);
+std::unique_ptr<VCPictureReader> VCPngReader_create(const VCByteInput& input);
 
 // Sets what VCPicture_lastFailure reports on this thread (the file loader's
 // own failures happen before any decoding).

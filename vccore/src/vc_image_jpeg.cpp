@@ -246,11 +246,36 @@ const unsigned char kPngSignature[] = {0x89, 'P', 'N', 'G', '\r', '\n', 0x1A, '\
 
 }  // namespace
 
+size_t VCByteInput::pull(unsigned char* to, size_t count) {
+    size_t got = 0;
+    for (; got < count && headUsed < headLength; ++got) to[got] = head[headUsed++];
+    while (got < count && !failed) {
+        const long n = source(user, to + got, count - got);
+        if (n < 0 || (size_t)n > count - got) failed = true;
+        if (n <= 0 || failed) break;
+        got += (size_t)n;
+    }
+    return got;
+}
+
 std::unique_ptr<VCPictureReader> VCPictureReader_create(const unsigned char* bytes, size_t length) {
-    if (startsWith(bytes, length, kJpegStart, sizeof(kJpegStart)))
-        return VCJpegReader_create(bytes, length);
-    if (startsWith(bytes, length, kPngSignature, sizeof(kPngSignature)))
-        return VCPngReader_create(bytes, length);
+    VCByteInput input;
+    input.bytes = bytes;
+    input.length = length;
+    return VCPictureReader_create(input);
+}
+
+std::unique_ptr<VCPictureReader> VCPictureReader_create(VCByteInput input) {
+    if (input.pulled()) {
+        input.headLength = input.pull(input.head, sizeof(input.head));
+        input.headUsed = 0;
+    }
+    const unsigned char* start = input.pulled() ? input.head : input.bytes;
+    const size_t length = input.pulled() ? input.headLength : input.length;
+    if (startsWith(start, length, kJpegStart, sizeof(kJpegStart)))
+        return VCJpegReader_create(input);
+    if (startsWith(start, length, kPngSignature, sizeof(kPngSignature)))
+        return VCPngReader_create(input);
     return nullptr;
 }
 

@@ -19,6 +19,7 @@ namespace {
 VCDecodeFailure failureOf(const char* message) {
     if (message == nullptr) return VC_DECODE_CORRUPT;
     if (strcmp(message, "truncated") == 0) return VC_DECODE_TRUNCATED;
+    if (strcmp(message, "read failed") == 0) return VC_DECODE_READ_FAILED;
     if (strstr(message, "exceeds user limit") != nullptr || strstr(message, "too large") != nullptr)
         return VC_DECODE_TOO_LARGE;
     if (strstr(message, "memory") != nullptr) return VC_DECODE_NO_MEMORY;
@@ -40,23 +41,29 @@ void onPngWarning(png_structp png, png_const_charp message) {
         *failure = VC_DECODE_TOO_LARGE;
 }
 
-struct MemorySource {
-    const unsigned char* bytes;
-    size_t length;
-    size_t position;
+struct Source {
+    VCByteInput input;
+    size_t position;  // in a whole buffer
 };
 
-void readFromMemory(png_structp png, png_bytep out, png_size_t count) {
-    MemorySource* source = static_cast<MemorySource*>(png_get_io_ptr(png));
-    if (count > source->length - source->position) png_error(png, "truncated");
-    const unsigned char* from = source->bytes + source->position;
+void readFromSource(png_structp png, png_bytep out, png_size_t count) {
+    Source* source = static_cast<Source*>(png_get_io_ptr(png));
+    VCByteInput& input = source->input;
+    if (input.pulled()) {
+        const size_t got = input.pull(out, count);
+        if (input.failed) png_error(png, "read failed");
+        if (got < count) png_error(png, "truncated");
+        return;
+    }
+    if (count > input.length - source->position) png_error(png, "truncated");
+    const unsigned char* from = input.bytes + source->position;
     for (png_size_t i = 0; i < count; ++i) out[i] = from[i];
     source->position += count;
 }
 
 class PngReader : public VCPictureReader {
 public:
-    PngReader(const unsigned char* bytes, size_t length) : mSource{bytes, length, 0} {
+    explicit PngReader(const VCByteInput& input) : mSource{input, 0} {
         mPng = png_create_read_struct(PNG_LIBPNG_VER_STRING, &mFailure, onPngError, onPngWarning);
         if (mPng != nullptr) mInfo = png_create_info_struct(mPng);
     }
@@ -69,7 +76,7 @@ public:
     bool readHeader(int* width, int* height) override {
         if (mPng == nullptr || mInfo == nullptr) return fail(VC_DECODE_NO_MEMORY);
         if (setjmp(png_jmpbuf(mPng))) return false;
-        png_set_read_fn(mPng, &mSource, readFromMemory);
+        png_set_read_fn(mPng, &mSource, readFromSource);
         png_read_info(mPng, mInfo);
         // Every colour type and depth is brought to 8-bit straight-alpha RGBA.
         int colorType = png_get_color_type(mPng, mInfo);
@@ -151,7 +158,7 @@ private:
         return true;
     }
 
-    MemorySource mSource;
+    Source mSource;
     png_structp mPng = nullptr;
     png_infop mInfo = nullptr;
     png_bytep* mRows = nullptr;
@@ -307,8 +314,8 @@ private:
 
 }  // namespace
 
-std::unique_ptr<VCPictureReader> VCPngReader_create(const unsigned char* bytes, size_t length) {
-    return std::unique_ptr<VCPictureReader>(new PngReader(bytes, length));
+std::unique_ptr<VCPictureReader> VCPngReader_create(const VCByteInput& input) {
+    return std::unique_ptr<VCPictureReader>(new PngReader(input));
 }
 
 std::unique_ptr<VCStreamEncoder> VCPngEncoder_create(int width, int height) {

@@ -51,6 +51,20 @@ extern "C" VCStreamReader* VCStreamReader_open(const unsigned char* bytes, size_
     return stream;
 }
 
+extern "C" VCStreamReader* VCStreamReader_openSource(VCStreamSource source, void* user) {
+    VCPicture_setLastFailure(VC_DECODE_NOT_A_PICTURE);
+    if (source == nullptr) return nullptr;
+    VCByteInput input;
+    input.source = source;
+    input.user = user;
+    std::unique_ptr<VCPictureReader> reader = VCPictureReader_create(input);
+    if (reader == nullptr) return nullptr;
+    VCPicture_setLastFailure(VC_DECODE_OK);
+    VCStreamReader* stream = new VCStreamReader();
+    stream->reader = std::move(reader);
+    return stream;
+}
+
 extern "C" int VCStreamReader_readHeader(VCStreamReader* stream, int* width, int* height) {
     if (stream == nullptr || width == nullptr || height == nullptr) return VC_ERROR_NULL_PARAM;
     if (!stream->reader->readHeader(&stream->width, &stream->height)) return readerFailed(stream);

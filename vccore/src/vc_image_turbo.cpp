@@ -28,7 +28,7 @@ namespace {
 // destructors of their own.
 class JpegReader : public VCPictureReader {
 public:
-    JpegReader(const unsigned char* bytes, size_t length) : mBytes(bytes), mLength(length) {
+    explicit JpegReader(const VCByteInput& input) : mInput(input) {
         mInfo.err = jpeg_std_error(&mError.base);
         mError.base.error_exit = onError;
         mError.base.emit_message = onMessage;
@@ -43,8 +43,21 @@ public:
         if (setjmp(mError.jump)) return false;
         jpeg_create_decompress(&mInfo);
         mCreated = true;
+        mInfo.client_data = this;
         mInfo.progress = &mProgress;
-        jpeg_mem_src(&mInfo, mBytes, static_cast<unsigned long>(mLength));
+        if (mInput.pulled()) {
+            mPulled.resize(kPullBytes);
+            mSource.init_source = [](j_decompress_ptr) {};
+            mSource.fill_input_buffer = fill;
+            mSource.skip_input_data = skip;
+            mSource.resync_to_restart = jpeg_resync_to_restart;
+            mSource.term_source = [](j_decompress_ptr) {};
+            mSource.bytes_in_buffer = 0;
+            mSource.next_input_byte = nullptr;
+            mInfo.src = &mSource;
+        } else {
+            jpeg_mem_src(&mInfo, mInput.bytes, static_cast<unsigned long>(mInput.length));
+        }
         jpeg_read_header(&mInfo, TRUE);
         if (mInfo.image_width < 1 || mInfo.image_height < 1) return fail(VC_DECODE_CORRUPT);
         if (mInfo.image_width > static_cast<JDIMENSION>(INT32_MAX / 4) ||
@@ -145,6 +158,8 @@ private:
                 return VC_DECODE_TOO_LARGE;
             case JERR_OUT_OF_MEMORY:
                 return VC_DECODE_NO_MEMORY;
+            case JERR_FILE_READ:
+                return VC_DECODE_READ_FAILED;
             default:
                 return VC_DECODE_CORRUPT;
         }
@@ -208,8 +223,45 @@ private:
         return true;
     }
 
-    const unsigned char* mBytes;
-    size_t mLength;
+    // A pulled stream arrives through a buffer of this many bytes.
+    static constexpr size_t kPullBytes = 64 << 10;
+    static JpegReader* of(j_decompress_ptr info) {
+        return static_cast<JpegReader*>(info->client_data);
+    }
+    // As libjpeg's own sources do at the end of the data: a warning (which
+    // stops the picture as truncated) and an end marker to read.
+    static boolean fill(j_decompress_ptr info) {
+        JpegReader* self = of(info);
+        const size_t got = self->mInput.pull(self->mPulled.data(), self->mPulled.size());
+        // Bytes read before a failure are still decoded.
+        if (got == 0 && self->mInput.failed) ERREXIT(info, JERR_FILE_READ);
+        if (got == 0) {
+            static const JOCTET kEnd[] = {0xFF, JPEG_EOI};
+            WARNMS(info, JWRN_JPEG_EOF);
+            self->mSource.next_input_byte = kEnd;
+            self->mSource.bytes_in_buffer = sizeof(kEnd);
+            return TRUE;
+        }
+        self->mSource.next_input_byte = self->mPulled.data();
+        self->mSource.bytes_in_buffer = got;
+        return TRUE;
+    }
+    static void skip(j_decompress_ptr info, long count) {
+        jpeg_source_mgr* source = info->src;
+        while (count > 0 && (size_t)count > source->bytes_in_buffer) {
+            count -= (long)source->bytes_in_buffer;
+            source->bytes_in_buffer = 0;
+            fill(info);
+        }
+        if (count > 0) {
+            source->next_input_byte += count;
+            source->bytes_in_buffer -= (size_t)count;
+        }
+    }
+
+    VCByteInput mInput;
+    std::vector<JOCTET> mPulled;
+    jpeg_source_mgr mSource{};
     jpeg_decompress_struct mInfo{};
     ErrorManager mError{};
     jpeg_progress_mgr mProgress{};
@@ -462,8 +514,8 @@ int encode422(tjhandle turbo, const VCImage* image, int quality, Output* out) {
 
 }  // namespace
 
-std::unique_ptr<VCPictureReader> VCJpegReader_create(const unsigned char* bytes, size_t length) {
-    return std::unique_ptr<VCPictureReader>(new JpegReader(bytes, length));
+std::unique_ptr<VCPictureReader> VCJpegReader_create(const VCByteInput& input) {
+    return std::unique_ptr<VCPictureReader>(new JpegReader(input));
 }
 
 std::unique_ptr<VCStreamEncoder> VCJpegEncoder_create(int width, int height, int quality) {

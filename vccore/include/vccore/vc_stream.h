@@ -25,6 +25,14 @@ typedef struct VCStreamWriter VCStreamWriter;
 // A reader over `length` bytes of JPEG or PNG data, which must outlive it;
 // null for other data (VCPicture_lastFailure says why).
 VCStreamReader* VCStreamReader_open(const unsigned char* bytes, size_t length);
+// Copies up to `count` of a stream's next bytes to `to`: how many (0 at its
+// end), or -1 when they cannot be read.
+typedef long (*VCStreamSource)(void* user, unsigned char* to, size_t count);
+// The same over bytes pulled from `source` as the decoding goes, so that the
+// encoded stream is never whole in memory either (the source must outlive
+// the reader). Bytes that end early are VC_DECODE_TRUNCATED, a source that
+// fails VC_DECODE_READ_FAILED.
+VCStreamReader* VCStreamReader_openSource(VCStreamSource source, void* user);
 // 0 with the picture's size, or VC_ERROR_CODEC_FAILED (reason in VCPicture_lastFailure).
 int VCStreamReader_readHeader(VCStreamReader* reader, int* width, int* height);
 // Receives rows [firstRow, firstRow + rows) of the picture, width * 4 bytes
