@@ -29,8 +29,11 @@ size_t keptPitch(int width) {
 }  // namespace
 
 KivDecodeAhead::KivDecodeAhead(const unsigned char* bytes, size_t length, size_t budget)
-    : mBytes(bytes) {
-    VCStreamReader* reader = VCStreamReader_open(bytes, length);
+    : KivDecodeAhead(VCStreamReader_open(bytes, length), budget) {
+    mBytes = ok() ? bytes : nullptr;
+}
+
+KivDecodeAhead::KivDecodeAhead(VCStreamReader* reader, size_t budget) {
     if (reader == nullptr || VCStreamReader_readHeader(reader, &mWidth, &mHeight) != 0) {
         VCStreamReader_close(reader);
         return;

@@ -23,10 +23,14 @@ public:
     // rows; ok() is false, with nothing started, when the header does not
     // read.
     KivDecodeAhead(const unsigned char* bytes, size_t length, size_t budget);
+    // The same for a reader opened on its bytes (taken over; its header not
+    // read yet), such as one pulling them from a file as it decodes.
+    KivDecodeAhead(VCStreamReader* reader, size_t budget);
     // Stops a decoding nobody took over and waits for its thread.
     ~KivDecodeAhead();
 
     bool ok() const { return mReader != nullptr; }
+    // The bytes it was made from; null for a reader.
     const unsigned char* bytes() const { return mBytes; }
     int width() const { return mWidth; }
     int height() const { return mHeight; }
@@ -54,7 +58,7 @@ private:
     unsigned char* place(int first, int rows);
     int placed(const unsigned char* rgba, int first, int rows);
 
-    const unsigned char* mBytes;
+    const unsigned char* mBytes = nullptr;
     VCStreamReader* mReader = nullptr;
     int mWidth = 0;
     int mHeight = 0;

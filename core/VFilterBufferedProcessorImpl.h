@@ -110,6 +110,14 @@ public:
     int processStream(const unsigned char* bytes, size_t length, bool throughNv21,
                       const StreamOutput& output, unsigned char** stream, size_t* streamLength,
                       VCDecodeFailure* why, KivDecodeAhead* ahead = nullptr);
+    // The same for a picture whose bytes come from a source as it decodes
+    // (VCStreamReader_openSource), so that the file is never whole in memory
+    // either: `reader` (taken over, its header not read yet) or, instead,
+    // `ahead` already decoding it. A picture that cannot stream here has had
+    // its header read: the whole-picture path opens the bytes anew.
+    int processStream(VCStreamReader* reader, bool throughNv21, const StreamOutput& output,
+                      unsigned char** stream, size_t* streamLength, VCDecodeFailure* why,
+                      KivDecodeAhead* ahead = nullptr);
 
     // Makes the context current and builds the program with the current effect
     // (and, on msm8974, enables 8K textures). 0 or -7.

@@ -133,13 +133,25 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
                                                 VCDecodeFailure* why, KivDecodeAhead* ahead) {
     if (bytes == nullptr || stream == nullptr || streamLength == nullptr || why == nullptr)
         return VC_ERROR_NULL_PARAM;
+    if (ahead != nullptr && (throughNv21 || !ahead->ok() || ahead->bytes() != bytes))
+        ahead = nullptr;
+    // Where the platform's fast codec is installed, JPEG goes through it.
+    const bool open = ahead == nullptr && !VCStream_fastJpegCodecInstalled();
+    return processStream(open ? VCStreamReader_open(bytes, length) : nullptr, throughNv21, output,
+                         stream, streamLength, why, ahead);
+}
+
+int VFilterBufferedProcessorImpl::processStream(VCStreamReader* opened, bool throughNv21,
+                                                const StreamOutput& output,
+                                                unsigned char** stream, size_t* streamLength,
+                                                VCDecodeFailure* why, KivDecodeAhead* ahead) {
+    std::unique_ptr<VCStreamReader, ReaderCloser> reader(opened);
+    if (stream == nullptr || streamLength == nullptr || why == nullptr) return VC_ERROR_NULL_PARAM;
     *why = VC_DECODE_OK;
     // Where the platform's fast codec is installed, JPEG goes through it.
     if (VCStream_fastJpegCodecInstalled()) return unstreamable("the fast JPEG codec is installed");
-    if (ahead != nullptr && (throughNv21 || !ahead->ok() || ahead->bytes() != bytes))
-        ahead = nullptr;
-    std::unique_ptr<VCStreamReader, ReaderCloser> reader(
-        ahead != nullptr ? nullptr : VCStreamReader_open(bytes, length));
+    if (ahead != nullptr && (throughNv21 || !ahead->ok())) ahead = nullptr;
+    if (ahead != nullptr) reader.reset();
     int width = ahead != nullptr ? ahead->width() : 0;
     int height = ahead != nullptr ? ahead->height() : 0;
     if (ahead == nullptr &&
