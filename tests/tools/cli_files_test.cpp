@@ -166,6 +166,46 @@ TEST_F(CliFiles, StreamedInputsAreRead) {
     EXPECT_EQ(48 * 100 + 32, out->width * 100 + out->height);
 }
 
+// Files larger than the first bytes read at once (256 KB) are decoded as
+// they are read: the same bytes as a picture read whole (through a FIFO),
+// turned pictures still turned, EXIF beyond those first bytes still found
+// (the file is then read whole), and a file that ends early truncated.
+TEST_F(CliFiles, LargeFilesAreDecodedAsTheyAreRead) {
+    const int w = 640, h = 480;
+    Bytes noise(w * h * 3);
+    uint32_t seed = 7;
+    for (unsigned char& b : noise) b = (unsigned char)((seed = seed * 1664525u + 1013904223u) >> 24);
+    const Bytes big = kivtest::makeJpeg(w, h, JCS_RGB, 3, JCS_YCbCr, noise);
+    ASSERT_GT(big.size(), 300u << 10);
+    Bytes far = withOrientation(big, 6);
+    for (int i = 0; i < 5; ++i) {  // 300 KB of segments no decoder keeps, before the EXIF
+        Bytes segment = {0xFF, 0xE9, 0xEA, 0x60};
+        segment.resize(2 + 0xEA60, 0x20);
+        far.insert(far.begin() + 2, segment.begin(), segment.end());
+    }
+    ASSERT_TRUE(kivtest::writeFile(path("big.jpg"), big));
+    ASSERT_TRUE(kivtest::writeFile(path("turned.jpg"), withOrientation(big, 6)));
+    ASSERT_TRUE(kivtest::writeFile(path("far.jpg"), far));
+    ASSERT_TRUE(kivtest::writeFile(path("short.jpg"), Bytes(big.begin(), big.end() - 1000)));
+    CliResult r = run({"apply", "-e", "401", path("big.jpg"), path("turned.jpg"), path("far.jpg"),
+                       path("short.jpg"), "-o", path("out")});
+    EXPECT_EQ(1, r.status);
+    EXPECT_NE(std::string::npos, r.err.find("'" + path("short.jpg") + "': the data is truncated"))
+        << r.err;
+    for (const char* name : {"big.jpg", "turned.jpg", "far.jpg"}) {
+        ImagePtr out = loadPicture(path(std::string("out/") + name));
+        ASSERT_NE(nullptr, out) << name;
+        const bool turned = std::string(name) != "big.jpg";
+        EXPECT_EQ(turned ? h : w, out->width) << name;
+    }
+    ASSERT_EQ(0, mkfifo(path("pipe.jpg").c_str(), 0644));
+    r = run({"apply", "-e", "401", path("pipe.jpg"), "-o", path("piped.jpg")},
+            "timeout 20 sh -c \"cat '" + path("big.jpg") + "' >'" + path("pipe.jpg") +
+                "'\" </dev/null >/dev/null 2>&1 & ");
+    ASSERT_EQ(0, r.status) << r.err;
+    EXPECT_TRUE(kivtest::readFile(path("piped.jpg")) == kivtest::readFile(path("out/big.jpg")));
+}
+
 TEST_F(CliFiles, JpegsAreTurnedUprightAsTheirExifSays) {
     const int w = 64, h = 32;
     const Bytes plain = quadrantsJpeg(w, h);

@@ -111,6 +111,17 @@ int planJobs(const std::vector<std::string>& inputs, const std::string& output,
 // when the GPU side takes memory of its own).
 constexpr size_t kDecodeAheadBytes = 20 << 20;
 
+// Whether a picture streams straight from its file: a regular file that
+// starts like a picture and is upright as far as its first bytes tell.
+bool streamsFromFile(const PictureFile& file) {
+    const FileBytes& head = file.head();
+    int orientation = 1;
+    return file.regular() && head.size() >= 2 &&
+           ((head[0] == 0xFF && head[1] == 0xD8) || (head[0] == 0x89 && head[1] == 'P')) &&
+           orientationFromHead(head.data(), head.size(), file.headIsWhole(), &orientation) &&
+           orientation == 1;
+}
+
 }  // namespace
 
 int cmdApply(int argc, char** argv) {
@@ -152,12 +163,12 @@ int cmdApply(int argc, char** argv) {
 
     // The first picture starts decoding while the GPU side starts (loading
     // the driver, the context, the program), with its kept rows bounded.
-    FileBytes firstBytes;
+    PictureFile firstFile;
     std::string firstError;
-    const bool firstRead = fileReadPicture(jobs[0].input, &firstBytes, &firstError);
+    const bool firstOpened = firstFile.open(jobs[0].input, &firstError);
     std::unique_ptr<KivDecodeAhead> ahead;
-    if (firstRead && orientationOfJpeg(firstBytes.data(), firstBytes.size()) == 1) {
-        ahead.reset(new KivDecodeAhead(firstBytes.data(), firstBytes.size(), kDecodeAheadBytes));
+    if (firstOpened && streamsFromFile(firstFile)) {
+        ahead.reset(new KivDecodeAhead(firstFile.openReader(), kDecodeAheadBytes));
         if (!ahead->ok()) ahead.reset();
     }
 
@@ -179,30 +190,37 @@ int cmdApply(int argc, char** argv) {
     for (size_t i = 0; i < jobs.size(); i++) {
         const Job& job = jobs[i];
         bar.update(static_cast<int>(i), baseName(job.input).c_str());
-        if (i == 1) {
-            // The first picture's decoder (if it was not taken over) goes
-            // before its bytes.
-            ahead.reset();
-            FileBytes().swap(firstBytes);
-        }
-        FileBytes otherBytes;
-        FileBytes& bytes = i == 0 ? firstBytes : otherBytes;
-        if (i == 0 ? !firstRead : !fileReadPicture(job.input, &bytes, &error)) {
+        // The first picture's decoder, if nothing took it over.
+        if (i == 1) ahead.reset();
+        PictureFile otherFile;
+        PictureFile& file = i == 0 ? firstFile : otherFile;
+        if (i == 0 ? !firstOpened : !otherFile.open(job.input, &error)) {
             bar.finish();
             failure(i == 0 ? firstError : error);
             continue;
         }
-        // Upright pictures stream band by band; a turned one is turned whole.
-        if (orientationOfJpeg(bytes.data(), bytes.size()) == 1) {
+        // Upright pictures stream band by band (regular files read as they
+        // decode); a turned one is turned whole.
+        const bool fromFile = streamsFromFile(file);
+        FileBytes bytes;
+        if (!fromFile && !fileReadPicture(job.input, &bytes, &error)) {
+            bar.finish();
+            failure(error);
+            continue;
+        }
+        if (fromFile || orientationOfJpeg(bytes.data(), bytes.size()) == 1) {
             AtomicFile output;
             if (!output.open(job.output, &error)) {
                 bar.finish();
                 failure(error);
                 continue;
             }
-            EffectRunner::StreamResult streamed = runner.runStream(
-                bytes, job.input, imageFileFormat(job.output) == ImageFileFormat::kPng, quality,
-                &output, &error, i == 0 ? ahead.get() : nullptr);
+            const bool png = imageFileFormat(job.output) == ImageFileFormat::kPng;
+            KivDecodeAhead* decoding = i == 0 ? ahead.get() : nullptr;
+            EffectRunner::StreamResult streamed =
+                fromFile ? runner.runStream(decoding != nullptr ? nullptr : file.openReader(),
+                                            job.input, png, quality, &output, &error, decoding)
+                         : runner.runStream(bytes, job.input, png, quality, &output, &error);
             // Done with, or unused when the picture takes the whole-picture way.
             ahead.reset();
             if (streamed == EffectRunner::STREAM_DONE && !output.commit(&error)) {
@@ -217,6 +235,12 @@ int cmdApply(int argc, char** argv) {
                 }
                 continue;
             }
+        }
+        // The whole-picture way reads the whole file.
+        if (fromFile && !fileReadPicture(job.input, &bytes, &error)) {
+            bar.finish();
+            failure(error);
+            continue;
         }
         if (maxSide < 0) maxSide = runner.maxPictureSide();
         ImageHolder input(imageDecodeRgba(bytes, job.input, &error, maxSide));

@@ -8,6 +8,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
+
 namespace kivcli {
 namespace {
 
@@ -85,6 +87,78 @@ bool fileReadPicture(const std::string& path, FileBytes* bytes, std::string* err
         return false;
     }
     return true;
+}
+
+namespace {
+
+// Enough for the markers before a JPEG's frame, EXIF included (a segment
+// holds at most 64 KB), in nearly every file.
+constexpr size_t kHeadBytes = 256 << 10;
+
+}  // namespace
+
+PictureFile::~PictureFile() {
+    if (mFd >= 0) close(mFd);
+}
+
+bool PictureFile::open(const std::string& path, std::string* error) {
+    struct stat st;
+    if (stat(path.c_str(), &st) == 0 && !S_ISREG(st.st_mode)) return true;
+    int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd < 0 || fstat(fd, &st) != 0) {
+        *error = failed("read", path, strerror(errno));
+        if (fd >= 0) close(fd);
+        return false;
+    }
+    if (!S_ISREG(st.st_mode)) {
+        close(fd);
+        return true;
+    }
+    if (st.st_size == 0) {
+        close(fd);
+        *error = failed("read", path, "the file is empty");
+        return false;
+    }
+    mHead.resize(std::min((size_t)st.st_size, kHeadBytes));
+    size_t got = 0;
+    while (got < mHead.size()) {
+        ssize_t n = pread(fd, mHead.data() + got, mHead.size() - got, (off_t)got);
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) break;
+        got += (size_t)n;
+    }
+    if (got < mHead.size()) {
+        *error = failed("read", path, got == 0 && errno != 0 ? strerror(errno) : "it ended early");
+        close(fd);
+        return false;
+    }
+    mFd = fd;
+    mSize = st.st_size;
+    return true;
+}
+
+VCStreamReader* PictureFile::openReader() {
+    if (mFd < 0) return nullptr;
+    mCursors.push_back(std::unique_ptr<Cursor>(new Cursor{this, 0}));
+    return VCStreamReader_openSource(pull, mCursors.back().get());
+}
+
+long PictureFile::pull(void* user, unsigned char* to, size_t count) {
+    Cursor* cursor = static_cast<Cursor*>(user);
+    const FileBytes& head = cursor->file->mHead;
+    if (cursor->at < head.size()) {
+        const size_t n = std::min(count, head.size() - cursor->at);
+        memcpy(to, head.data() + cursor->at, n);
+        cursor->at += n;
+        return (long)n;
+    }
+    for (;;) {
+        ssize_t n = pread(cursor->file->mFd, to, count, (off_t)cursor->at);
+        if (n < 0 && errno == EINTR) continue;
+        if (n < 0) return -1;
+        cursor->at += (size_t)n;
+        return (long)n;
+    }
 }
 
 bool AtomicFile::open(const std::string& path, std::string* error) {

@@ -5,8 +5,11 @@
 
 #include <stddef.h>
 
+#include <memory>
 #include <string>
 #include <vector>
+
+#include "vccore/vc_stream.h"
 
 namespace kivcli {
 
@@ -16,6 +19,41 @@ using FileBytes = std::vector<unsigned char>;
 // substitution). Stops early on a stream that cannot be a picture: it must
 // start like a JPEG or a PNG. False with "cannot read '<path>': <reason>".
 bool fileReadPicture(const std::string& path, FileBytes* bytes, std::string* error);
+
+// A picture file its decoder reads as it goes, so that a large file is never
+// whole in memory: regular files only (a FIFO cannot be read twice, and the
+// whole-picture path may need the bytes again). Its first bytes, enough for
+// its format and its EXIF, are read at once.
+class PictureFile {
+public:
+    PictureFile() = default;
+    ~PictureFile();
+    // False with "cannot read '<path>': <reason>"; true with regular() false
+    // (and nothing opened) for anything but a regular file.
+    bool open(const std::string& path, std::string* error);
+    bool regular() const { return mFd >= 0; }
+    // The first bytes (all of a small file).
+    const FileBytes& head() const { return mHead; }
+    bool headIsWhole() const { return (long long)mHead.size() == mSize; }
+    // A reader of the file from its start (VCStreamReader_openSource); each
+    // reads on its own.
+    VCStreamReader* openReader();
+
+    PictureFile(const PictureFile&) = delete;
+    PictureFile& operator=(const PictureFile&) = delete;
+
+private:
+    struct Cursor {
+        PictureFile* file;
+        size_t at;
+    };
+    static long pull(void* cursor, unsigned char* to, size_t count);
+
+    int mFd = -1;
+    long long mSize = 0;
+    FileBytes mHead;
+    std::vector<std::unique_ptr<Cursor>> mCursors;
+};
 
 // Replaces `path` with `length` bytes through a temporary file beside it:
 // every write, the flush to disk and the close are checked before it is

@@ -22,6 +22,32 @@ int orientationOfJpeg(const unsigned char* bytes, size_t length) {
     return orientation;
 }
 
+bool orientationFromHead(const unsigned char* bytes, size_t length, bool whole,
+                         int* orientation) {
+    *orientation = 1;
+    if (whole || length < 2 || bytes[0] != 0xFF || bytes[1] != 0xD8) {
+        *orientation = orientationOfJpeg(bytes, length);
+        return true;
+    }
+    // The markers before the frame or the scan, EXIF among them.
+    for (size_t at = 2; at + 4 <= length;) {
+        if (bytes[at] != 0xFF) return false;
+        const unsigned char marker = bytes[at + 1];
+        if (marker == 0xFF) {
+            at++;
+            continue;
+        }
+        const bool frame = marker >= 0xC0 && marker <= 0xCF && marker != 0xC4 && marker != 0xC8 &&
+                           marker != 0xCC;
+        if (frame || marker == 0xDA) {
+            *orientation = orientationOfJpeg(bytes, at);
+            return true;
+        }
+        at += 2 + ((size_t)bytes[at + 2] << 8 | bytes[at + 3]);
+    }
+    return false;
+}
+
 namespace {
 
 // How each orientation finds the stored pixel that shows at (x, y) once

@@ -12,6 +12,10 @@ namespace kivcli {
 // The EXIF orientation (1-8) of a JPEG stream; 1 (as stored) when it has
 // none or an invalid one.
 int orientationOfJpeg(const unsigned char* bytes, size_t length);
+// The same from a stream's first `length` bytes (all of it when `whole`):
+// false when they end before a JPEG's frame starts, where the EXIF block
+// could still come.
+bool orientationFromHead(const unsigned char* bytes, size_t length, bool whole, int* orientation);
 
 // A new "RGBA" image: `image` ("RGBA") turned upright for `orientation`
 // (1 as stored, 2 mirrored, 3 turned half round, 4 flipped, 5 transposed,

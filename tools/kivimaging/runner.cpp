@@ -134,6 +134,35 @@ EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned ch
                                                    const std::string& path, bool png, int quality,
                                                    AtomicFile* output, std::string* error,
                                                    KivDecodeAhead* ahead) {
+    return stream(
+        [&](const VFilterBufferedProcessorImpl::StreamOutput& out, unsigned char** unused,
+            size_t* length, VCDecodeFailure* why) {
+            return mProcessor->processStream(bytes.data(), bytes.size(), false, out, unused,
+                                             length, why, ahead);
+        },
+        path, png, quality, output, error);
+}
+
+EffectRunner::StreamResult EffectRunner::runStream(VCStreamReader* reader,
+                                                   const std::string& path, bool png, int quality,
+                                                   AtomicFile* output, std::string* error,
+                                                   KivDecodeAhead* ahead) {
+    if (mProcessor == nullptr) {
+        VCStreamReader_close(reader);
+        return STREAM_UNSUITED;
+    }
+    return stream(
+        [&](const VFilterBufferedProcessorImpl::StreamOutput& out, unsigned char** unused,
+            size_t* length, VCDecodeFailure* why) {
+            return mProcessor->processStream(reader, false, out, unused, length, why, ahead);
+        },
+        path, png, quality, output, error);
+}
+
+template <typename Process>
+EffectRunner::StreamResult EffectRunner::stream(const Process& process, const std::string& path,
+                                                bool png, int quality, AtomicFile* output,
+                                                std::string* error) {
     if (mProcessor == nullptr) return STREAM_UNSUITED;
     int errorsBefore = cliLogErrorCount();
     unsigned char* unused = nullptr;
@@ -145,8 +174,7 @@ EffectRunner::StreamResult EffectRunner::runStream(const std::vector<unsigned ch
         return static_cast<AtomicFile*>(file)->write(bytes, n) ? 0 : -1;
     };
     out.sinkUser = output;
-    int rc = mProcessor->processStream(bytes.data(), bytes.size(), false, out, &unused, &length,
-                                       &why, ahead);
+    int rc = process(out, &unused, &length, &why);
     if (rc == VC_ERROR_UNSUPPORTED) return STREAM_UNSUITED;
     if (rc == 0 && cliLogErrorCount() == errorsBefore) return STREAM_DONE;
     if (why != VC_DECODE_OK) {

@@ -48,11 +48,22 @@ public:
     StreamResult runStream(const std::vector<unsigned char>& bytes, const std::string& path,
                            bool png, int quality, AtomicFile* output, std::string* error,
                            KivDecodeAhead* ahead = nullptr);
+    // The same for a picture read as it decodes: `reader` (taken over, its
+    // header not read) or, instead, `ahead` already decoding it.
+    StreamResult runStream(VCStreamReader* reader, const std::string& path, bool png,
+                           int quality, AtomicFile* output, std::string* error,
+                           KivDecodeAhead* ahead = nullptr);
 
     EffectRunner(const EffectRunner&) = delete;
     EffectRunner& operator=(const EffectRunner&) = delete;
 
 private:
+    // Runs `process` (one of the processor's processStream calls) into
+    // `output` and tells what came of it.
+    template <typename Process>
+    StreamResult stream(const Process& process, const std::string& path, bool png, int quality,
+                        AtomicFile* output, std::string* error);
+
     VFilterBufferedProcessorImpl* mProcessor = nullptr;
 };
 
