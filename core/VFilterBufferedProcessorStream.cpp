@@ -135,10 +135,8 @@ int VFilterBufferedProcessorImpl::processStream(const unsigned char* bytes, size
         return VC_ERROR_NULL_PARAM;
     if (ahead != nullptr && (throughNv21 || !ahead->ok() || ahead->bytes() != bytes))
         ahead = nullptr;
-    // Where the platform's fast codec is installed, JPEG goes through it.
-    const bool open = ahead == nullptr && !VCStream_fastJpegCodecInstalled();
-    return processStream(open ? VCStreamReader_open(bytes, length) : nullptr, throughNv21, output,
-                         stream, streamLength, why, ahead);
+    return processStream(ahead == nullptr ? VCStreamReader_open(bytes, length) : nullptr,
+                         throughNv21, output, stream, streamLength, why, ahead);
 }
 
 int VFilterBufferedProcessorImpl::processStream(VCStreamReader* opened, bool throughNv21,

@@ -95,6 +95,14 @@ namespace {
 // holds at most 64 KB), in nearly every file.
 constexpr size_t kHeadBytes = 256 << 10;
 
+// Up to `count` bytes at `offset`: how many (0 at the end), -1 on an error.
+ssize_t readAt(int fd, unsigned char* to, size_t count, size_t offset) {
+    for (;;) {
+        ssize_t n = pread(fd, to, count, (off_t)offset);
+        if (n >= 0 || errno != EINTR) return n;
+    }
+}
+
 }  // namespace
 
 PictureFile::~PictureFile() {
@@ -121,14 +129,11 @@ bool PictureFile::open(const std::string& path, std::string* error) {
     }
     mHead.resize(std::min((size_t)st.st_size, kHeadBytes));
     size_t got = 0;
-    while (got < mHead.size()) {
-        ssize_t n = pread(fd, mHead.data() + got, mHead.size() - got, (off_t)got);
-        if (n < 0 && errno == EINTR) continue;
-        if (n <= 0) break;
+    ssize_t n = 0;
+    while (got < mHead.size() && (n = readAt(fd, mHead.data() + got, mHead.size() - got, got)) > 0)
         got += (size_t)n;
-    }
     if (got < mHead.size()) {
-        *error = failed("read", path, got == 0 && errno != 0 ? strerror(errno) : "it ended early");
+        *error = failed("read", path, n < 0 ? strerror(errno) : "it ended early");
         close(fd);
         return false;
     }
@@ -152,13 +157,9 @@ long PictureFile::pull(void* user, unsigned char* to, size_t count) {
         cursor->at += n;
         return (long)n;
     }
-    for (;;) {
-        ssize_t n = pread(cursor->file->mFd, to, count, (off_t)cursor->at);
-        if (n < 0 && errno == EINTR) continue;
-        if (n < 0) return -1;
-        cursor->at += (size_t)n;
-        return (long)n;
-    }
+    const ssize_t n = readAt(cursor->file->mFd, to, count, cursor->at);
+    if (n > 0) cursor->at += (size_t)n;
+    return n < 0 ? -1 : (long)n;
 }
 
 bool AtomicFile::open(const std::string& path, std::string* error) {

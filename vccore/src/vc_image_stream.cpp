@@ -38,12 +38,11 @@ VCStreamWriter* wrap(std::unique_ptr<VCStreamEncoder> encoder) {
     return writer;
 }
 
-}  // namespace
-
-extern "C" VCStreamReader* VCStreamReader_open(const unsigned char* bytes, size_t length) {
+// A reader for the given input, or null (with the reason set) for no picture.
+VCStreamReader* open(const VCByteInput& input) {
     VCPicture_setLastFailure(VC_DECODE_NOT_A_PICTURE);
-    if (bytes == nullptr) return nullptr;
-    std::unique_ptr<VCPictureReader> reader = VCPictureReader_create(bytes, length);
+    if (input.bytes == nullptr && input.source == nullptr) return nullptr;
+    std::unique_ptr<VCPictureReader> reader = VCPictureReader_create(input);
     if (reader == nullptr) return nullptr;
     VCPicture_setLastFailure(VC_DECODE_OK);
     VCStreamReader* stream = new VCStreamReader();
@@ -51,18 +50,20 @@ extern "C" VCStreamReader* VCStreamReader_open(const unsigned char* bytes, size_
     return stream;
 }
 
+}  // namespace
+
+extern "C" VCStreamReader* VCStreamReader_open(const unsigned char* bytes, size_t length) {
+    VCByteInput input;
+    input.bytes = bytes;
+    input.length = length;
+    return open(input);
+}
+
 extern "C" VCStreamReader* VCStreamReader_openSource(VCStreamSource source, void* user) {
-    VCPicture_setLastFailure(VC_DECODE_NOT_A_PICTURE);
-    if (source == nullptr) return nullptr;
     VCByteInput input;
     input.source = source;
     input.user = user;
-    std::unique_ptr<VCPictureReader> reader = VCPictureReader_create(input);
-    if (reader == nullptr) return nullptr;
-    VCPicture_setLastFailure(VC_DECODE_OK);
-    VCStreamReader* stream = new VCStreamReader();
-    stream->reader = std::move(reader);
-    return stream;
+    return open(input);
 }
 
 extern "C" int VCStreamReader_readHeader(VCStreamReader* stream, int* width, int* height) {
